@@ -1,0 +1,33 @@
+#pragma once
+
+#include <string_view>
+
+namespace platform {
+
+enum class LogLevel { debug, info, warning, error };
+
+/// Where in the code a line comes from. Empty or 0 means not known.
+struct CodePlace {
+    std::string_view file = {};
+    int line = 0;
+    std::string_view function = {};
+};
+
+/// The system's log.
+///
+/// One call writes one line. One newline at the end of the text is dropped; every other control
+/// character is shown as an escape (\n, \t, \xNN), so that a text from outside can neither break
+/// nor forge a line. Writing never fails as far as the caller can see.
+///
+/// May be called from any thread.
+class SystemLog {
+  public:
+    SystemLog() = default;
+    SystemLog(const SystemLog&) = delete;
+    SystemLog& operator=(const SystemLog&) = delete;
+    virtual ~SystemLog() = default;
+
+    virtual void write(LogLevel level, std::string_view text, const CodePlace& place) = 0;
+};
+
+} // namespace platform
