@@ -1,0 +1,135 @@
+#include "KSTLib/Channel.h"
+
+#include "KSTLib/LibraryLogging.h"
+#include "KSTLib/Platform.h"
+#include "common/Allocation.h"
+#include "common/Command.h"
+#include "common/CommandHeader.h"
+
+#include <cstring>
+#include <limits>
+
+namespace kst {
+
+namespace {
+
+constexpr const char* kServiceClass = "Keystrand";
+constexpr std::uint32_t kConnectionType = 0;
+
+/// Steps of `performCommand` once the frame is complete.
+KSTStatus sendFrame(const AllocatedMemory& frame, void* outData, std::size_t* outSize) {
+    const LibraryPlatform* platform = installedPlatform();
+    if (platform == nullptr) {
+        return fail(libraryContext(), "service", 0, kKSTErrorUnexpected);
+    }
+    const std::size_t offeredSize = outSize != nullptr ? *outSize : 0;
+    std::size_t replySize = offeredSize;
+    const KSTStatus err = platform->channel.structCall(
+        gConnection, kKSTSelectorCommand, frame.bytes(), frame.size(), outData, &replySize);
+    if (err != kKSTErrorSuccess) {
+        return failCall(libraryContext(), err);
+    }
+    if (replySize > offeredSize) {
+        return fail(libraryContext(), "replySize <= offeredSize", 0, kKSTErrorUnexpected);
+    }
+    if (outSize != nullptr) {
+        *outSize = replySize;
+    }
+    return kKSTErrorSuccess;
+}
+
+KSTStatus readLogLevel(platform::KernelChannel& channel) {
+    std::uint64_t output = 0;
+    std::uint32_t outputCount = 1;
+    const KSTStatus err =
+        channel.scalarCall(gConnection, kKSTSelectorLogLevel, nullptr, 0, &output, &outputCount);
+    if (err != kKSTErrorSuccess) {
+        return failCall(libraryContext(), err);
+    }
+    if (outputCount != 1) {
+        return fail(libraryContext(), "outputCount == 1", 0, kKSTErrorUnexpected);
+    }
+    gLogLevel = static_cast<std::uint8_t>(output & 0xffU);
+    return kKSTErrorSuccess;
+}
+
+} // namespace
+
+bool gChannelOpen = false;
+platform::ConnectionHandle gConnection = platform::kNoConnection;
+
+KSTStatus init() noexcept {
+    if (gChannelOpen) {
+        return kKSTErrorSuccess;
+    }
+    const LibraryPlatform* platform = installedPlatform();
+    const platform::ServiceHandle service = platform != nullptr
+                                                ? platform->registry.findByClassName(kServiceClass)
+                                                : platform::kNoService;
+    if (service == platform::kNoService) {
+        return fail(libraryContext(), "service", 0, kKSTErrorUnexpected);
+    }
+    platform::ConnectionHandle connection = platform::kNoConnection;
+    const KSTStatus err = platform->channel.open(service, kConnectionType, &connection);
+    if (err != kKSTErrorSuccess) {
+        return failCall(libraryContext(), err);
+    }
+    platform->registry.release(service);
+    gConnection = connection;
+    gChannelOpen = true;
+    return kKSTErrorSuccess;
+}
+
+KSTStatus buildCommand(std::uint8_t* frame, std::uint8_t code, std::uint8_t thirdByte) noexcept {
+    if (frame == nullptr) {
+        return fail(libraryContext(), "cmd", 0, kKSTErrorBadParameter);
+    }
+    writeCommandHeader(frame, code, 0, thirdByte);
+    return kKSTErrorSuccess;
+}
+
+KSTStatus performCommand(std::uint8_t code, std::uint8_t thirdByte, const void* inData,
+                         std::size_t inSize, void* outData, std::size_t* outSize) noexcept {
+    if (outSize != nullptr && *outSize != 0 && outData == nullptr) {
+        return fail(libraryContext(), "outData", 0, kKSTErrorBadParameter);
+    }
+    if (inSize > std::numeric_limits<std::size_t>::max() - kKSTCommandHeaderSize) {
+        return fail(libraryContext(), "cmd", 0, kKSTErrorOutOfMemory);
+    }
+    const AllocatedMemory cmd(kKSTCommandHeaderSize + inSize);
+    if (cmd.bytes() == nullptr) {
+        return fail(libraryContext(), "cmd", 0, kKSTErrorOutOfMemory);
+    }
+    const KSTStatus err = buildCommand(cmd.bytes(), code, thirdByte);
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    if (inSize > 0) {
+        if (inData == nullptr) {
+            return fail(libraryContext(), "inData", 0, kKSTErrorBadParameter);
+        }
+        std::memcpy(cmd.bytes() + kKSTCommandHeaderSize, inData, inSize);
+    }
+    return sendFrame(cmd, outData, outSize);
+}
+
+KSTStatus channelTransport(void* /*transportContext*/, std::uint32_t code, std::uint32_t thirdByte,
+                           const void* inData, std::size_t inSize, void* outData,
+                           std::size_t* outSize) noexcept {
+    const KSTStatus err = init();
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    return performCommand(static_cast<std::uint8_t>(code), static_cast<std::uint8_t>(thirdByte),
+                          inData, inSize, outData, outSize);
+}
+
+void updateLogLevel() noexcept {
+    const LibraryPlatform* platform = installedPlatform();
+    if (platform != nullptr && readLogLevel(platform->channel) == kKSTErrorSuccess) {
+        logLevelSet(__func__);
+    }
+    logReturning(__func__);
+}
+
+} // namespace kst

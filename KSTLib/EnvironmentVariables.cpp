@@ -1,0 +1,18 @@
+#include "KSTLib/Channel.h"
+#include "KSTLib/KSTLib.h"
+#include "KSTLib/LibraryLogging.h"
+
+KSTStatus KSTSetEnvironmentVariable(std::uint32_t variable, const void* data,
+                                    std::size_t dataLength) noexcept {
+    kst::logCalled(__func__);
+    return kst::logReturning(__func__,
+                             LibCall_KSTSetEnvironmentVariable(kst::channelTransport, nullptr,
+                                                               variable, data, dataLength));
+}
+
+KSTStatus KSTGetEnvironmentVariable(std::uint32_t variable, KSTDataBlock processVariable) noexcept {
+    kst::logCalled(__func__);
+    return kst::logReturning(__func__,
+                             LibCall_KSTGetEnvironmentVariable_Block(kst::channelTransport, nullptr,
+                                                                     variable, processVariable));
+}

@@ -1,0 +1,44 @@
+#pragma once
+
+#include "common/AssertLine.h"
+#include "common/LibraryLog.h"
+#include "common/Status.h"
+
+#include <cstdint>
+
+/// What the public functions of the library write: a line on entry and one on exit, each shown only
+/// when its severity is not below the library's log level, and the lines of failed checks, shown
+/// always.
+namespace kst {
+
+inline constexpr std::uint8_t kInitialLogLevel = 40;
+
+/// The severity of entries and successful returns, and of failed returns.
+inline constexpr std::uint8_t kTraceSeverity = 30;
+inline constexpr std::uint8_t kFailureSeverity = 70;
+
+/// The library's log level.
+extern std::uint8_t gLogLevel;
+
+[[nodiscard]] inline bool isShown(std::uint8_t severity) noexcept {
+    return severity >= gLogLevel;
+}
+
+/// "KSTLib: <function>: called."
+void logCalled(const char* function) noexcept;
+
+/// "KSTLib: <function>: returning, err = <status>." Hands `status` back.
+KSTStatus logReturning(const char* function, KSTStatus status) noexcept;
+
+/// "KSTLib: <function>: returning.", for a function without a result.
+void logReturning(const char* function) noexcept;
+
+/// "KSTLib: <function>: log level set to <level>."
+void logLevelSet(const char* function) noexcept;
+
+/// The context of the library's failed checks.
+[[nodiscard]] inline AssertionContext libraryContext() noexcept {
+    return {libraryLog(), "KSTLib", "KSTLib/KSTLib"};
+}
+
+} // namespace kst

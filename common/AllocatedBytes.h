@@ -1,0 +1,22 @@
+#ifndef KST_COMMON_ALLOCATED_BYTES_H
+#define KST_COMMON_ALLOCATED_BYTES_H
+
+#include <stdint.h>
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+/** Bytes that the library holds allocated: every allocation adds its size, every release subtracts
+ *  it. Initially 0. Not synchronised: read it while no call is under way. */
+extern int64_t gAllocatedBytes;
+
+/** Room for a caller that wants to keep a former value of gAllocatedBytes. The library never writes
+ *  it. Initially 0. */
+extern int64_t gLastAllocatedBytes;
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif

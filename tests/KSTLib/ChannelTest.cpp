@@ -1,0 +1,295 @@
+#include "common/LibCall.h"
+#include "tests/KSTLib/ChannelFixture.h"
+#include "tests/support/ScriptedGate.h"
+
+#include <gtest/gtest.h>
+
+#include <array>
+#include <limits>
+
+namespace {
+
+using support::Bytes;
+using support::Lines;
+using support::ScriptedChannel;
+using support::ScriptedGate;
+using support::ScriptedRegistry;
+
+using Open = support::ChannelFixture;
+
+/// The channel is open already.
+class PerformCommand : public support::ChannelFixture {
+  protected:
+    void SetUp() override {
+        ChannelFixture::SetUp();
+        ASSERT_EQ(kst::init(), 0);
+    }
+
+    KSTStatus perform(const Bytes& payload, void* outData, std::size_t* sizeOfOut) {
+        return kst::performCommand(26, 0, payload.data(), payload.size(), outData, sizeOfOut);
+    }
+
+    std::array<std::uint8_t, 16> out{};
+    std::size_t outSize = out.size();
+};
+
+} // namespace
+
+TEST_F(Open, LooksForTheClassAndOpensType0) {
+    EXPECT_EQ(kst::init(), 0);
+    EXPECT_EQ(registry.classesAsked, std::vector<std::string>{"Keystrand"});
+    EXPECT_TRUE(registry.pathsAsked.empty());
+    ASSERT_EQ(channel.opens.size(), 1U);
+    EXPECT_EQ(channel.opens.front().service, ScriptedRegistry::kEntry);
+    EXPECT_EQ(channel.opens.front().connectionType, 0U);
+    EXPECT_TRUE(kst::gChannelOpen);
+    EXPECT_EQ(kst::gConnection, ScriptedChannel::kConnection);
+    EXPECT_EQ(registry.held, 0);
+    EXPECT_EQ(registry.releases, 1);
+    EXPECT_TRUE(logged().empty());
+}
+
+TEST_F(Open, HappensOnce) {
+    for (int call = 0; call < 100; ++call) {
+        EXPECT_EQ(kst::channelTransport(nullptr, 26, 0, nullptr, 0, nullptr, nullptr), 0);
+    }
+    EXPECT_EQ(registry.classesAsked.size(), 1U);
+    EXPECT_EQ(channel.opens.size(), 1U);
+    EXPECT_EQ(channel.structCalls.size(), 100U);
+}
+
+TEST_F(Open, WithoutAServiceIsTriedAgain) {
+    registry.present = false;
+    EXPECT_EQ(kst::init(), kKSTErrorUnexpected);
+    EXPECT_EQ(kst::init(), kKSTErrorUnexpected);
+    EXPECT_EQ(logged(), (Lines{failedCheck("service"), failedCheck("service")}));
+    EXPECT_TRUE(channel.opens.empty());
+    EXPECT_EQ(registry.releases, 0);
+    EXPECT_FALSE(kst::gChannelOpen);
+
+    registry.present = true;
+    EXPECT_EQ(kst::init(), 0);
+    EXPECT_EQ(registry.classesAsked.size(), 3U);
+    EXPECT_TRUE(kst::gChannelOpen);
+}
+
+TEST_F(Open, RefusedKeepsTheServiceAndIsTriedAgain) {
+    channel.openStatus = -1013;
+    EXPECT_EQ(kst::init(), -1013);
+    EXPECT_EQ(logged(), Lines{failedCheck("err == 0 ", "0xfffffffffffffc0b")});
+    EXPECT_EQ(registry.held, 1);
+    EXPECT_EQ(registry.releases, 0);
+    EXPECT_FALSE(kst::gChannelOpen);
+    EXPECT_EQ(kst::gConnection, platform::kNoConnection);
+
+    channel.openStatus = 0;
+    EXPECT_EQ(kst::init(), 0);
+    EXPECT_EQ(channel.opens.size(), 2U);
+    EXPECT_EQ(registry.releases, 1);
+}
+
+TEST_F(Open, FailureIsTheTransportsStatus) {
+    channel.openStatus = std::numeric_limits<std::int32_t>::min();
+    EXPECT_EQ(kst::channelTransport(nullptr, 26, 0, nullptr, 0, nullptr, nullptr),
+              std::numeric_limits<std::int32_t>::min());
+    EXPECT_TRUE(channel.structCalls.empty());
+    EXPECT_EQ(logged(), Lines{failedCheck("err == 0 ", "0xffffffff80000000")});
+}
+
+TEST_F(Open, WithoutAPlatformThereIsNoServiceAndNoLog) {
+    kst::removePlatform();
+    EXPECT_EQ(kst::init(), kKSTErrorUnexpected);
+    EXPECT_EQ(kst::performCommand(1, 0, nullptr, 0, nullptr, nullptr), kKSTErrorUnexpected);
+    kst::updateLogLevel();
+    EXPECT_TRUE(logged().empty());
+    EXPECT_TRUE(registry.classesAsked.empty());
+    EXPECT_TRUE(channel.scalarCalls.empty());
+}
+
+TEST_F(Open, InstallingAPlatformStartsAnew) {
+    ASSERT_EQ(kst::init(), 0);
+    kst::gLogLevel = 10;
+    kst::installPlatform({log, registry, channel});
+    EXPECT_FALSE(kst::gChannelOpen);
+    EXPECT_EQ(kst::gConnection, 0U);
+    EXPECT_EQ(kst::gLogLevel, 40);
+    EXPECT_EQ(kst::init(), 0);
+    EXPECT_EQ(channel.opens.size(), 2U);
+
+    kst::gLogLevel = 10;
+    kst::removePlatform();
+    EXPECT_FALSE(kst::gChannelOpen);
+    EXPECT_EQ(kst::gConnection, 0U);
+    EXPECT_EQ(kst::gLogLevel, 40);
+    EXPECT_EQ(kst::installedPlatform(), nullptr);
+}
+
+TEST(LibraryCommand, WritesSevenBytesAndNoMore) {
+    std::array<std::uint8_t, 9> frame{};
+    frame.fill(0xaa);
+    EXPECT_EQ(kst::buildCommand(frame.data(), 26, 3), 0);
+    EXPECT_EQ(frame, (std::array<std::uint8_t, 9>{'D', 'R', 'C', 'S', 26, 0, 3, 0xaa, 0xaa}));
+}
+
+TEST_F(Open, CommandWithoutAFrame) {
+    EXPECT_EQ(kst::buildCommand(nullptr, 26, 0), kKSTErrorBadParameter);
+    EXPECT_EQ(logged(), Lines{failedCheck("cmd")});
+}
+
+TEST_F(PerformCommand, WithoutPayloadSendsTheHeaderOnly) {
+    EXPECT_EQ(kst::performCommand(1, 0, nullptr, 0, nullptr, nullptr), 0);
+    ASSERT_EQ(channel.structCalls.size(), 1U);
+    const auto& call = channel.structCalls.front();
+    EXPECT_EQ(call.connection, ScriptedChannel::kConnection);
+    EXPECT_EQ(call.selector, 0U);
+    EXPECT_EQ(call.input, (Bytes{'D', 'R', 'C', 'S', 1, 0, 0, 0}));
+    EXPECT_EQ(call.output, nullptr);
+    EXPECT_EQ(call.offeredSize.value_or(0), 0U);
+    EXPECT_TRUE(logged().empty());
+}
+
+TEST_F(PerformCommand, FramesThePayload) {
+    channel.reply = {1, 2, 3};
+    EXPECT_EQ(kst::performCommand(255, 7, "ab", 2, out.data(), &outSize), 0);
+    const auto& call = channel.structCalls.front();
+    EXPECT_EQ(call.input, (Bytes{'D', 'R', 'C', 'S', 255, 0, 7, 0, 'a', 'b'}));
+    EXPECT_EQ(call.output, out.data());
+    EXPECT_EQ(call.offeredSize, 16U);
+    EXPECT_EQ(outSize, 3U);
+    EXPECT_EQ(Bytes(out.begin(), out.begin() + 4), (Bytes{1, 2, 3, 0}));
+}
+
+TEST_F(PerformCommand, LargePayload) {
+    const Bytes payload(100000, 0x42);
+    EXPECT_EQ(perform(payload, nullptr, nullptr), 0);
+    EXPECT_EQ(channel.structCalls.front().input.size(), 100008U);
+    EXPECT_EQ(channel.structCalls.front().input.back(), 0x42);
+}
+
+TEST_F(PerformCommand, OutputSizeZeroNeedsNoBuffer) {
+    outSize = 0;
+    EXPECT_EQ(perform({1}, nullptr, &outSize), 0);
+    EXPECT_EQ(outSize, 0U);
+    EXPECT_TRUE(logged().empty());
+}
+
+TEST_F(PerformCommand, BufferWithoutASizeOffersNothing) {
+    EXPECT_EQ(perform({1}, out.data(), nullptr), 0);
+    EXPECT_EQ(channel.structCalls.front().offeredSize.value_or(0), 0U);
+}
+
+TEST_F(PerformCommand, OutputSizeWithoutABufferFailsBeforeAllocating) {
+    const ScriptedGate gate;
+    outSize = 1;
+    EXPECT_EQ(perform({1}, nullptr, &outSize), kKSTErrorBadParameter);
+    EXPECT_EQ(outSize, 1U);
+    EXPECT_TRUE(gate.asked.empty());
+    EXPECT_TRUE(channel.structCalls.empty());
+    EXPECT_EQ(logged(), Lines{failedCheck("outData")});
+}
+
+TEST_F(PerformCommand, InputSizeWithoutInputFailsAfterAllocating) {
+    const ScriptedGate gate;
+    EXPECT_EQ(kst::performCommand(26, 0, nullptr, 3, nullptr, nullptr), kKSTErrorBadParameter);
+    EXPECT_EQ(gate.asked, std::vector<std::size_t>{11});
+    EXPECT_EQ(gate.freed, std::vector<std::size_t>{11});
+    EXPECT_TRUE(gate.everyFreeWasWiped);
+    EXPECT_TRUE(channel.structCalls.empty());
+    EXPECT_EQ(logged(), Lines{failedCheck("inData")});
+}
+
+TEST_F(PerformCommand, MissingOutputBufferIsFoundBeforeMissingInput) {
+    EXPECT_EQ(kst::performCommand(26, 0, nullptr, 3, nullptr, &outSize), kKSTErrorBadParameter);
+    EXPECT_EQ(logged(), Lines{failedCheck("outData")});
+}
+
+TEST_F(PerformCommand, FailedAllocation) {
+    {
+        const ScriptedGate gate(0);
+        EXPECT_EQ(perform({1}, out.data(), &outSize), kKSTErrorOutOfMemory);
+        EXPECT_TRUE(gate.freed.empty());
+    }
+    EXPECT_EQ(outSize, 16U);
+    EXPECT_TRUE(channel.structCalls.empty());
+    EXPECT_EQ(logged(), Lines{failedCheck("cmd")});
+    EXPECT_EQ(perform({1}, out.data(), &outSize), 0);
+}
+
+TEST_F(PerformCommand, SizesThatWrapOrThatNoMemoryHas) {
+    const std::uint8_t byte = 0;
+    Lines expected;
+    for (const std::size_t size : {SIZE_MAX, SIZE_MAX - 7, SIZE_MAX - 8, SIZE_MAX / 2}) {
+        EXPECT_EQ(kst::performCommand(26, 0, &byte, size, nullptr, nullptr), kKSTErrorOutOfMemory);
+        expected.push_back(failedCheck("cmd"));
+    }
+    EXPECT_EQ(logged(), expected);
+    EXPECT_TRUE(channel.structCalls.empty());
+}
+
+TEST_F(PerformCommand, FrameIsCountedDuringTheCallAndWipedAfter) {
+    const std::int64_t before = gAllocatedBytes;
+    std::int64_t during = 0;
+    channel.duringStructCall = [&] {
+        during = gAllocatedBytes;
+    };
+    const ScriptedGate gate;
+    EXPECT_EQ(perform(Bytes(20, 0x55), nullptr, nullptr), 0);
+    EXPECT_EQ(during, before + 28);
+    EXPECT_EQ(gAllocatedBytes, before);
+    EXPECT_EQ(gate.asked, std::vector<std::size_t>{28});
+    EXPECT_EQ(gate.freed, std::vector<std::size_t>{28});
+    EXPECT_TRUE(gate.everyFreeWasWiped);
+}
+
+TEST_F(PerformCommand, FailureWipesTheFrameToo) {
+    const ScriptedGate gate;
+    channel.structStatus = -1104;
+    EXPECT_EQ(perform(Bytes(20, 0x55), nullptr, nullptr), -1104);
+    EXPECT_EQ(gate.freed, std::vector<std::size_t>{28});
+    EXPECT_TRUE(gate.everyFreeWasWiped);
+}
+
+TEST_F(PerformCommand, StatusesPassThroughAndLeaveTheSize) {
+    const std::vector<std::pair<KSTStatus, std::string>> statuses{
+        {std::numeric_limits<KSTStatus>::min(), "0xffffffff80000000"},
+        {-6006, "0xffffffffffffe88a"},
+        {-1110, "0xfffffffffffffbaa"},
+        {-1, "0xffffffffffffffff"},
+        {1, "0x1"},
+        {std::numeric_limits<KSTStatus>::max(), "0x7fffffff"}};
+    Lines expected;
+    for (const auto& [status, text] : statuses) {
+        channel.structStatus = status;
+        EXPECT_EQ(perform({1}, out.data(), &outSize), status);
+        EXPECT_EQ(outSize, 16U);
+        expected.push_back(failedCheck("err == 0 ", text));
+    }
+    EXPECT_EQ(logged(), expected);
+}
+
+TEST_F(PerformCommand, ReplySizes) {
+    for (const std::size_t size : {0U, 1U, 15U, 16U}) {
+        channel.reply = Bytes(size, 0x66);
+        outSize = out.size();
+        EXPECT_EQ(perform({1}, out.data(), &outSize), 0);
+        EXPECT_EQ(outSize, size);
+    }
+}
+
+TEST_F(PerformCommand, ReplyBeyondWhatWasOfferedIsRefused) {
+    channel.reportedSize = 17;
+    EXPECT_EQ(perform({1}, out.data(), &outSize), kKSTErrorUnexpected);
+    EXPECT_EQ(outSize, 16U);
+    EXPECT_EQ(perform({1}, nullptr, nullptr), kKSTErrorUnexpected);
+    EXPECT_EQ(logged(), (Lines{failedCheck("replySize <= offeredSize"),
+                               failedCheck("replySize <= offeredSize")}));
+}
+
+TEST_F(PerformCommand, TransportSendsTheLowBytesAndIgnoresItsContext) {
+    EXPECT_EQ(kst::channelTransport(&outSize, 26, 9, "a", 1, out.data(), &outSize), 0);
+    EXPECT_EQ(channel.structCalls.front().input, (Bytes{'D', 'R', 'C', 'S', 26, 0, 9, 0, 'a'}));
+    EXPECT_EQ(outSize, 0U);
+    const KSTTransport transport = kst::channelTransport;
+    EXPECT_EQ(transport(nullptr, 0xffffff19, 0x100, nullptr, 0, nullptr, nullptr), 0);
+    EXPECT_EQ(channel.structCalls.back().input, (Bytes{'D', 'R', 'C', 'S', 0x19, 0, 0, 0}));
+}

@@ -1,0 +1,44 @@
+#pragma once
+
+#include "platform/SystemLog.h"
+
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace support {
+
+/// A log that keeps what it is given, byte for byte.
+class RecordingLog : public platform::SystemLog {
+  public:
+    struct Line {
+        platform::LogLevel level;
+        std::string text;
+        std::string file;
+        int line;
+        std::string function;
+    };
+
+    void write(platform::LogLevel level, std::string_view text,
+               const platform::CodePlace& place) override {
+        lines_.push_back({level, std::string(text), std::string(place.file), place.line,
+                          std::string(place.function)});
+    }
+
+    [[nodiscard]] const std::vector<Line>& lines() const { return lines_; }
+
+    [[nodiscard]] std::vector<std::string> texts() const {
+        std::vector<std::string> texts;
+        for (const Line& line : lines_) {
+            texts.push_back(line.text);
+        }
+        return texts;
+    }
+
+    void clear() { lines_.clear(); }
+
+  private:
+    std::vector<Line> lines_;
+};
+
+} // namespace support

@@ -1,0 +1,47 @@
+#pragma once
+
+#include <cstdio>
+#include <stdexcept>
+#include <string>
+#include <sys/mman.h>
+#include <unistd.h>
+
+namespace support {
+
+/// Takes what the process prints to standard output from here to the end of the scope. `text` shows
+/// only what has really left the process: what is not flushed yet is not in it.
+class StandardOutputCapture {
+  public:
+    StandardOutputCapture()
+        : file_(::memfd_create("standard-output", MFD_CLOEXEC)), saved_(::dup(STDOUT_FILENO)) {
+        std::fflush(stdout);
+        if (file_ < 0 || saved_ < 0 || ::dup2(file_, STDOUT_FILENO) < 0) {
+            throw std::runtime_error("cannot capture standard output");
+        }
+    }
+    StandardOutputCapture(const StandardOutputCapture&) = delete;
+    StandardOutputCapture& operator=(const StandardOutputCapture&) = delete;
+    ~StandardOutputCapture() {
+        std::fflush(stdout);
+        ::dup2(saved_, STDOUT_FILENO);
+        ::close(saved_);
+        ::close(file_);
+    }
+
+    [[nodiscard]] std::string text() const {
+        std::string text;
+        char buffer[512];
+        ssize_t count = 0;
+        while ((count = ::pread(file_, buffer, sizeof buffer, static_cast<off_t>(text.size()))) >
+               0) {
+            text.append(buffer, static_cast<std::size_t>(count));
+        }
+        return text;
+    }
+
+  private:
+    int file_;
+    int saved_;
+};
+
+} // namespace support
