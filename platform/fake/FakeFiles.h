@@ -1,0 +1,75 @@
+#pragma once
+
+#include "platform/Files.h"
+#include "platform/fake/FakeDisk.h"
+
+#include <cstddef>
+#include <map>
+#include <memory>
+#include <optional>
+#include <set>
+#include <string>
+#include <vector>
+
+namespace platform {
+
+/// What the next operation of a kind shall do instead of working. Each happens once.
+struct FakeFileFailures {
+    bool open = false;
+    bool attach = false;
+    /// The next write takes at most this many bytes.
+    std::optional<std::size_t> writeAtMost;
+    /// The next sync leaves everything unsynced and gives this error.
+    int sync = 0;
+    /// The next close of an open stream closes it and gives this error.
+    int close = 0;
+    bool load = false;
+};
+
+/// Files of one process on a FakeDisk. As on a real system the lowest free descriptor number is
+/// given out next, and a file's name is synced with the first sync of the process.
+///
+/// The streams must not outlive it.
+class FakeFiles final : public Files {
+  public:
+    explicit FakeFiles(FakeDisk& disk) : disk_(disk) {}
+
+    [[nodiscard]] OpenFile openForWriting(const std::string& path, ProtectionClass protection,
+                                          int classOptions, unsigned mode) override;
+    [[nodiscard]] std::unique_ptr<FileStream> attachStream(const OpenFile& file) override;
+    [[nodiscard]] std::optional<std::vector<std::uint8_t>> load(const std::string& path) override;
+
+    /// What was called, in order: "open /var/root/x", "attach", "write 13" (the bytes asked for),
+    /// "sync", "close", "load /var/root/x". A stream that is destroyed open closes itself.
+    [[nodiscard]] const std::vector<std::string>& calls() const { return calls_; }
+    void clearCalls() { calls_.clear(); }
+
+    FakeFileFailures failures;
+
+    [[nodiscard]] std::size_t openDescriptors() const { return descriptors_.size(); }
+    [[nodiscard]] std::size_t openStreams() const { return openStreams_; }
+
+    /// The protection class that a file was last opened with.
+    [[nodiscard]] std::optional<ProtectionClass> protectionOf(const std::string& path) const;
+
+    /// Closes a descriptor to which no stream was attached.
+    void closeDescriptor(int descriptor) { descriptors_.erase(descriptor); }
+
+    /// What was not synced is thrown away.
+    void crash() { disk_.crash(); }
+
+  private:
+    friend class FakeFileStream;
+
+    [[nodiscard]] int lowestFreeDescriptor() const;
+    [[nodiscard]] int sync(FakeFile& file, const std::string& path);
+
+    FakeDisk& disk_;
+    std::vector<std::string> calls_;
+    std::map<int, std::shared_ptr<FakeFile>> descriptors_;
+    std::map<std::string, ProtectionClass> protections_;
+    std::set<std::string> syncedNames_;
+    std::size_t openStreams_ = 0;
+};
+
+} // namespace platform

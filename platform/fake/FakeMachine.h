@@ -1,0 +1,20 @@
+#pragma once
+
+#include "platform/fake/FakeAlarmStore.h"
+#include "platform/fake/FakeClock.h"
+#include "platform/fake/FakeDisk.h"
+#include "platform/fake/FakeKernel.h"
+
+namespace platform {
+
+/// What outlives a process. It begins with an empty state directory, as an installed system does.
+struct FakeMachine {
+    FakeMachine() { disk.makeDirectory("/var/root"); }
+
+    FakeClock clock;
+    FakeAlarmStore alarms;
+    FakeDisk disk;
+    FakeKernel kernel;
+};
+
+} // namespace platform

@@ -1,0 +1,42 @@
+#pragma once
+
+#include "platform/MainRunLoop.h"
+#include "platform/fake/FakeAlarmEvent.h"
+#include "platform/fake/FakeClock.h"
+#include "platform/shared/EventQueue.h"
+
+#include <functional>
+#include <utility>
+
+namespace platform {
+
+/// A run loop that delivers one queued event a turn and, with none queued, lets the clock jump to
+/// the next alarm or the deadline, whichever comes first.
+///
+/// With no event, no alarm and no deadline to wait for, it calls the idle hook, which must post an
+/// event, set an alarm or close the sources. Without a hook that is an error in the test.
+class FakeMainRunLoop final : public MainRunLoop {
+  public:
+    FakeMainRunLoop(EventQueue& queue, FakeAlarmEvent& alarms, FakeClock& clock);
+
+    [[nodiscard]] bool runOnce(Date deadline) override;
+
+    /// The loop has no source from now on: it delivers nothing any more.
+    void closeSources() { closed_ = true; }
+
+    void onIdle(std::function<void()> hook) { idle_ = std::move(hook); }
+
+  private:
+    void wait(Date deadline);
+    void idle();
+    [[nodiscard]] bool hasReasonToRun() const;
+    void deliverOne();
+
+    EventQueue& queue_;
+    FakeAlarmEvent& alarms_;
+    FakeClock& clock_;
+    std::function<void()> idle_;
+    bool closed_ = false;
+};
+
+} // namespace platform

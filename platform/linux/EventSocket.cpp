@@ -1,0 +1,155 @@
+#include "platform/linux/EventSocket.h"
+
+#include "base/Concat.h"
+#include "platform/linux/UnixAddress.h"
+
+#include <systemd/sd-daemon.h>
+
+#include <cerrno>
+#include <cstring>
+#include <fcntl.h>
+#include <memory>
+#include <optional>
+#include <string_view>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+#include <utility>
+
+namespace platform {
+
+namespace {
+
+constexpr char kActivationName[] = "events";
+constexpr mode_t kSocketMode = 0600;
+
+/// The owner of the socket's file, or of the socket itself when it has no file that can be seen.
+uid_t ownerOf(int socket) {
+    sockaddr_un address{};
+    socklen_t length = sizeof address;
+    struct stat status {};
+    if (::getsockname(socket, reinterpret_cast<sockaddr*>(&address), &length) == 0 &&
+        address.sun_path[0] == '/' && ::lstat(address.sun_path, &status) == 0) {
+        return status.st_uid;
+    }
+    return ::fstat(socket, &status) == 0 ? status.st_uid : 0;
+}
+
+void acceptCredentials(int socket) {
+    const int on = 1;
+    ::setsockopt(socket, SOL_SOCKET, SO_PASSCRED, &on, sizeof on);
+}
+
+std::optional<uid_t> senderOf(const msghdr& message) {
+    const cmsghdr* const control = CMSG_FIRSTHDR(&message);
+    if (control == nullptr || control->cmsg_level != SOL_SOCKET ||
+        control->cmsg_type != SCM_CREDENTIALS || control->cmsg_len < CMSG_LEN(sizeof(ucred))) {
+        return std::nullopt;
+    }
+    ucred credentials{};
+    std::memcpy(&credentials, CMSG_DATA(control), sizeof credentials);
+    return credentials.uid;
+}
+
+} // namespace
+
+EventSocket::EventSocket(FileDescriptor socket, LinuxRunLoop& loop, SystemLog& log,
+                         Receiver receiver)
+    : socket_(std::move(socket)),
+      log_(log),
+      receiver_(std::move(receiver)),
+      owner_(ownerOf(socket_.get())) {
+    acceptCredentials(socket_.get());
+    source_ = loop.addReadable(socket_.get(), [this] { receiveOne(); });
+}
+
+bool EventSocket::mayServe(uid_t sender) const {
+    return sender == 0 || sender == owner_;
+}
+
+void EventSocket::receiveOne() {
+    iovec data{buffer_.data(), buffer_.size()};
+    // Room for the credentials and nothing else: descriptors that come along are closed by the
+    // system.
+    alignas(cmsghdr) std::array<std::uint8_t, CMSG_SPACE(sizeof(ucred))> control{};
+    msghdr message{};
+    message.msg_iov = &data;
+    message.msg_iovlen = 1;
+    message.msg_control = control.data();
+    message.msg_controllen = control.size();
+    const ssize_t length =
+        ::recvmsg(socket_.get(), &message, MSG_DONTWAIT | MSG_TRUNC | MSG_CMSG_CLOEXEC);
+    if (length < 0) {
+        if (errno != EAGAIN && errno != EINTR) {
+            log_.write(LogLevel::warning,
+                       base::concat("kstd: EventSocket: cannot receive, error ", errno, ".\n"), {});
+        }
+        return;
+    }
+    const std::optional<uid_t> sender = senderOf(message);
+    if (!sender || !mayServe(*sender)) {
+        log_.write(
+            LogLevel::warning,
+            sender ? base::concat("kstd: EventSocket: dropped datagram of user ", *sender, ".\n")
+                   : "kstd: EventSocket: dropped datagram of unknown sender.\n",
+            {});
+        return;
+    }
+    handOn(buffer_.data(), static_cast<std::size_t>(length));
+}
+
+void EventSocket::handOn(const std::uint8_t* data, std::size_t length) {
+    if (length > buffer_.size()) {
+        log_.write(
+            LogLevel::warning,
+            base::concat("kstd: EventSocket: dropped oversized datagram, ", length, " bytes.\n"),
+            {});
+        return;
+    }
+    const auto event = wire::decodeEvent({data, length});
+    if (!event) {
+        log_.write(
+            LogLevel::warning,
+            base::concat("kstd: EventSocket: dropped malformed datagram, ", length, " bytes.\n"),
+            {});
+        return;
+    }
+    receiver_(*event);
+}
+
+FileDescriptor takeActivatedEventSocket() {
+    char** names = nullptr;
+    const int count = sd_listen_fds_with_names(1, &names);
+    FileDescriptor found;
+    for (int i = 0; i < count; ++i) {
+        FileDescriptor candidate(SD_LISTEN_FDS_START + i);
+        const bool isEvents = std::string_view(names[i]) == kActivationName &&
+                              sd_is_socket(candidate.get(), AF_UNIX, SOCK_DGRAM, -1) > 0;
+        if (isEvents && !found.isOpen()) {
+            found = std::move(candidate);
+        }
+        std::free(names[i]);
+    }
+    std::free(names);
+    return found;
+}
+
+FileDescriptor makeEventSocket(const std::string& path) {
+    const auto address = unixAddress(path);
+    FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+    if (!address || !socket.isOpen()) {
+        return FileDescriptor();
+    }
+    acceptCredentials(socket.get());
+    ::unlink(path.c_str());
+    // The mode of the socket's file is that of the descriptor less the umask; the change afterwards
+    // makes it exact.
+    ::fchmod(socket.get(), kSocketMode);
+    if (::bind(socket.get(), reinterpret_cast<const sockaddr*>(&*address), sizeof *address) != 0 ||
+        ::chmod(path.c_str(), kSocketMode) != 0) {
+        return FileDescriptor();
+    }
+    return socket;
+}
+
+} // namespace platform

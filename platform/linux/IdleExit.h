@@ -1,0 +1,33 @@
+#pragma once
+
+#include "platform/linux/LinuxRunLoop.h"
+
+#include <chrono>
+#include <functional>
+#include <memory>
+
+namespace platform {
+
+/// Ends an idle process: once nothing was in hand for a whole `idleTime`, it calls `closeStreams`,
+/// once, and the run loop is left without sources.
+class IdleExit {
+  public:
+    using Busy = std::function<bool()>;
+    using Close = std::function<void()>;
+
+    IdleExit(LinuxRunLoop& loop, std::chrono::microseconds idleTime, Busy busy, Close closeStreams);
+
+    /// Something happened: the idle time starts anew.
+    void touch() { touched_ = true; }
+
+  private:
+    void timeIsUp();
+
+    std::chrono::microseconds idleTime_;
+    Busy busy_;
+    Close closeStreams_;
+    bool touched_ = false;
+    std::unique_ptr<RunLoopSource> timer_;
+};
+
+} // namespace platform

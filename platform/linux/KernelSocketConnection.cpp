@@ -1,0 +1,196 @@
+#include "platform/linux/KernelSocketConnection.h"
+
+#include "base/Concat.h"
+#include "platform/linux/UnixAddress.h"
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <sys/socket.h>
+#include <sys/time.h>
+#include <sys/uio.h>
+#include <unistd.h>
+#include <utility>
+
+namespace platform {
+
+namespace {
+
+constexpr std::size_t kMaxParts = 4;
+
+timeval toTimeval(std::chrono::milliseconds time) {
+    const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(time);
+    const auto rest = std::chrono::duration_cast<std::chrono::microseconds>(time - seconds);
+    return {static_cast<time_t>(seconds.count()), static_cast<suseconds_t>(rest.count())};
+}
+
+/// What a timeout of the socket shows as.
+int asTimeout(int error) {
+    return error == EAGAIN ? ETIMEDOUT : error;
+}
+
+bool isPeerGone(Status status) {
+    return status == statusFromErrno(EPIPE) || status == statusFromErrno(ECONNRESET) ||
+           status == statusFromErrno(ENOTCONN);
+}
+
+iovec asVector(std::span<const std::uint8_t> part) {
+    // The system only reads from it.
+    return {const_cast<std::uint8_t*>(part.data()), part.size()};
+}
+
+} // namespace
+
+KernelSocketConnection::Reply::~Reply() {
+    if (!received_.empty()) {
+        ::explicit_bzero(received_.data(), received_.size());
+    }
+}
+
+KernelSocketConnection::KernelSocketConnection(std::string path, SystemLog& log,
+                                               std::chrono::milliseconds timeout, Greeting greeting)
+    : path_(std::move(path)),
+      log_(log),
+      timeout_(timeout),
+      greeting_(std::move(greeting)),
+      buffer_(new std::uint8_t[wire::kKernelMessageMaxSize]) {}
+
+Status KernelSocketConnection::fail(int error) {
+    disconnect();
+    return statusFromErrno(error);
+}
+
+Status KernelSocketConnection::connect() {
+    if (socket_.isOpen()) {
+        return kSuccess;
+    }
+    const Status opened = openSocket();
+    if (opened != kSuccess || !greeting_) {
+        return opened;
+    }
+    const Status greeted = greeting_(*this);
+    if (greeted != kSuccess) {
+        disconnect();
+    }
+    return greeted;
+}
+
+Status KernelSocketConnection::openSocket() {
+    const auto address = unixAddress(path_);
+    if (!address) {
+        return statusFromErrno(ENAMETOOLONG);
+    }
+    FileDescriptor socket(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
+    if (!socket.isOpen()) {
+        return statusFromErrno(errno);
+    }
+    const timeval timeout = toTimeval(timeout_);
+    ::setsockopt(socket.get(), SOL_SOCKET, SO_SNDTIMEO, &timeout, sizeof timeout);
+    ::setsockopt(socket.get(), SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof timeout);
+    int result = -1;
+    do {
+        result =
+            ::connect(socket.get(), reinterpret_cast<const sockaddr*>(&*address), sizeof *address);
+    } while (result != 0 && errno == EINTR);
+    if (result != 0) {
+        return statusFromErrno(asTimeout(errno));
+    }
+    const Status trusted = checkPeer(socket.get());
+    if (trusted == kSuccess) {
+        socket_ = std::move(socket);
+    }
+    return trusted;
+}
+
+Status KernelSocketConnection::checkPeer(int socket) const {
+    ucred peer{};
+    socklen_t length = sizeof peer;
+    if (::getsockopt(socket, SOL_SOCKET, SO_PEERCRED, &peer, &length) != 0) {
+        return statusFromErrno(errno);
+    }
+    if (peer.uid == 0 || peer.uid == ::geteuid()) {
+        return kSuccess;
+    }
+    log_.write(LogLevel::warning,
+               base::concat("kstd: KernelSocket: ", path_, " is served by user ", peer.uid,
+                            ", refused.\n"),
+               {});
+    return statusFromErrno(EPERM);
+}
+
+Status KernelSocketConnection::exchange(wire::KernelOperation operation, Parts body, Reply& reply) {
+    const bool wasConnected = socket_.isOpen();
+    Status status = connect();
+    if (status == kSuccess) {
+        status = send(operation, body);
+    }
+    if (wasConnected && isPeerGone(status)) {
+        // The peer had gone before; nothing of this request reached anybody.
+        status = connect();
+        if (status == kSuccess) {
+            status = send(operation, body);
+        }
+    }
+    return status == kSuccess ? receive(operation, reply) : status;
+}
+
+Status KernelSocketConnection::exchangeOnce(wire::KernelOperation operation, Parts body,
+                                            Reply& reply) {
+    const Status status = send(operation, body);
+    return status == kSuccess ? receive(operation, reply) : status;
+}
+
+Status KernelSocketConnection::send(wire::KernelOperation operation, Parts body) {
+    const auto header = wire::encodeKernelRequestHeader({operation, ++sequence_});
+    std::array<iovec, 1 + kMaxParts> vectors{asVector(header)};
+    std::size_t count = 1;
+    std::size_t size = header.size();
+    for (const auto part : body) {
+        if (part.size() > wire::kKernelMessageMaxSize - size) {
+            return statusFromErrno(EMSGSIZE);
+        }
+        vectors[count++] = asVector(part);
+        size += part.size();
+    }
+    msghdr message{};
+    message.msg_iov = vectors.data();
+    message.msg_iovlen = count;
+    ssize_t sent = -1;
+    do {
+        sent = ::sendmsg(socket_.get(), &message, MSG_NOSIGNAL);
+    } while (sent < 0 && errno == EINTR);
+    if (sent >= 0) {
+        return kSuccess;
+    }
+    // Too large for the system's buffers: nothing was sent and the connection is as it was.
+    return errno == EMSGSIZE ? statusFromErrno(EMSGSIZE) : fail(asTimeout(errno));
+}
+
+Status KernelSocketConnection::receive(wire::KernelOperation operation, Reply& reply) {
+    ssize_t length = -1;
+    do {
+        length = ::recv(socket_.get(), buffer_.get(), wire::kKernelMessageMaxSize, MSG_TRUNC);
+    } while (length < 0 && errno == EINTR);
+    if (length < 0) {
+        return fail(asTimeout(errno));
+    }
+    if (length == 0) {
+        return fail(ECONNRESET);
+    }
+    const auto size = static_cast<std::size_t>(length);
+    reply.received_ = {buffer_.get(), std::min(size, wire::kKernelMessageMaxSize)};
+    if (size > wire::kKernelMessageMaxSize) {
+        return fail(EMSGSIZE);
+    }
+    const auto header = wire::decodeKernelReplyHeader(reply.received_);
+    if (!header || header->operation != operation || header->sequence != sequence_) {
+        return fail(EPROTO);
+    }
+    reply.status = header->status;
+    reply.reported = header->reported;
+    reply.body = reply.received_.subspan(wire::kKernelReplyHeaderSize);
+    return kSuccess;
+}
+
+} // namespace platform

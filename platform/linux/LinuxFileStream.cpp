@@ -1,0 +1,57 @@
+#include "platform/linux/LinuxFileStream.h"
+
+#include "platform/linux/LinuxFiles.h"
+#include "platform/linux/Sync.h"
+
+#include <cerrno>
+#include <unistd.h>
+#include <utility>
+
+namespace platform {
+
+LinuxFileStream::LinuxFileStream(LinuxFiles& files, FileDescriptor descriptor, std::string path)
+    : files_(files), descriptor_(std::move(descriptor)), path_(std::move(path)) {}
+
+std::size_t LinuxFileStream::write(const void* data, std::size_t elementSize, std::size_t count) {
+    std::size_t size = 0;
+    if (!descriptor_.isOpen() || elementSize == 0 ||
+        __builtin_mul_overflow(elementSize, count, &size)) {
+        return 0;
+    }
+    const char* const bytes = static_cast<const char*>(data);
+    std::size_t done = 0;
+    while (done < size) {
+        const ssize_t written = ::pwrite(descriptor_.get(), bytes + done, size - done, position_);
+        if (written < 0 && errno == EINTR) {
+            continue;
+        }
+        if (written <= 0) {
+            break;
+        }
+        done += static_cast<std::size_t>(written);
+        position_ += written;
+    }
+    return done / elementSize;
+}
+
+int LinuxFileStream::fullSync() {
+    if (!descriptor_.isOpen()) {
+        return EBADF;
+    }
+    if (const int error = syncDescriptor(descriptor_.get()); error != 0) {
+        return error;
+    }
+    return files_.syncNameOnce(path_);
+}
+
+int LinuxFileStream::close() {
+    if (!descriptor_.isOpen()) {
+        return EBADF;
+    }
+    // Linux gives the number free whatever close answers, so it is never closed again. Interrupted
+    // is no failure: the number is free all the same.
+    const int result = ::close(descriptor_.release());
+    return result == 0 || errno == EINTR ? 0 : errno;
+}
+
+} // namespace platform

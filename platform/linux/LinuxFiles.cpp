@@ -1,0 +1,113 @@
+#include "platform/linux/LinuxFiles.h"
+
+#include "platform/linux/FileDescriptor.h"
+#include "platform/linux/LinuxFileStream.h"
+#include "platform/linux/RegularFile.h"
+#include "platform/linux/Sync.h"
+
+#include <cerrno>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+#include <utility>
+
+namespace platform {
+
+namespace {
+
+constexpr int kOpenFlags = O_RDWR | O_CLOEXEC | O_NOCTTY | O_NOFOLLOW;
+
+/// How often the file may vanish or appear between two looks before opening it is given up.
+constexpr int kOpenAttempts = 8;
+
+/// Makes the file, with exactly the permission bits `mode` whatever the umask is. None when it is
+/// there already (errno EEXIST) or cannot be made.
+FileDescriptor makeFile(const std::string& path, mode_t mode) {
+    FileDescriptor descriptor(::open(path.c_str(), kOpenFlags | O_CREAT | O_EXCL, mode));
+    if (descriptor.isOpen() && ::fchmod(descriptor.get(), mode) != 0) {
+        descriptor.reset();
+        ::unlink(path.c_str());
+        errno = EPERM;
+    }
+    return descriptor;
+}
+
+struct Opened {
+    FileDescriptor descriptor;
+    bool isNew = false;
+};
+
+Opened openOrMake(const std::string& path, mode_t mode) {
+    for (int attempt = 0; attempt < kOpenAttempts; ++attempt) {
+        FileDescriptor made = makeFile(path, mode);
+        if (made.isOpen() || errno != EEXIST) {
+            return {std::move(made), true};
+        }
+        FileDescriptor existing(::open(path.c_str(), kOpenFlags));
+        if (existing.isOpen() || errno != ENOENT) {
+            return {std::move(existing), false};
+        }
+    }
+    return {};
+}
+
+bool isWritable(int descriptor) {
+    const int flags = ::fcntl(descriptor, F_GETFL);
+    if (flags < 0 || (flags & O_PATH) != 0) {
+        return false;
+    }
+    const int access = flags & O_ACCMODE;
+    return access == O_WRONLY || access == O_RDWR;
+}
+
+std::string directoryOf(const std::string& path) {
+    const std::size_t slash = path.rfind('/');
+    return slash == 0 ? "/" : path.substr(0, slash);
+}
+
+} // namespace
+
+LinuxFiles::LinuxFiles(Paths paths) : paths_(std::move(paths)) {}
+
+OpenFile LinuxFiles::openForWriting(const std::string& path, ProtectionClass /*protection*/,
+                                    int /*classOptions*/, unsigned mode) {
+    Opened opened = openOrMake(paths_.under(path), static_cast<mode_t>(mode));
+    if (opened.descriptor.isOpen() && opened.isNew) {
+        syncedNames_.erase(path);
+    }
+    return {opened.descriptor.release(), path};
+}
+
+std::unique_ptr<FileStream> LinuxFiles::attachStream(const OpenFile& file) {
+    if (!isWritable(file.descriptor)) {
+        return nullptr;
+    }
+    return std::make_unique<LinuxFileStream>(*this, FileDescriptor(file.descriptor), file.path);
+}
+
+std::optional<std::vector<std::uint8_t>> LinuxFiles::load(const std::string& path) {
+    RegularFile file = readRegularFile(paths_.under(path), kMaxLoadSize);
+    if (file.failure != ReadFailure::none) {
+        return std::nullopt;
+    }
+    return std::move(file.bytes);
+}
+
+int LinuxFiles::syncNameOnce(const std::string& path) {
+    if (syncedNames_.contains(path)) {
+        return 0;
+    }
+    const std::string directory = directoryOf(paths_.under(path));
+    const FileDescriptor descriptor(
+        ::open(directory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC | O_NOCTTY));
+    if (!descriptor.isOpen()) {
+        return errno;
+    }
+    if (const int error = syncDescriptor(descriptor.get()); error != 0) {
+        return error;
+    }
+    syncedNames_.insert(path);
+    return 0;
+}
+
+} // namespace platform

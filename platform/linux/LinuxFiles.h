@@ -1,0 +1,44 @@
+#pragma once
+
+#include "platform/Files.h"
+#include "platform/linux/Paths.h"
+
+#include <set>
+#include <string>
+
+namespace platform {
+
+/// Files on POSIX, under a root directory.
+///
+/// Paths are the ones that the programs know ("/var/root/x"); where they lie under the root is
+/// added here and nowhere else. Protection classes have no meaning on Linux and are ignored.
+/// Directories are never made: a file in a missing one cannot be opened.
+///
+/// A symbolic link in the place of the file itself is not followed for writing. The daemon's own
+/// files are never links, and a link there could aim root's writing at any other file.
+///
+/// The streams must not outlive the LinuxFiles that they come from.
+class LinuxFiles final : public Files {
+  public:
+    explicit LinuxFiles(Paths paths);
+
+    [[nodiscard]] OpenFile openForWriting(const std::string& path, ProtectionClass protection,
+                                          int classOptions, unsigned mode) override;
+    [[nodiscard]] std::unique_ptr<FileStream> attachStream(const OpenFile& file) override;
+    [[nodiscard]] std::optional<std::vector<std::uint8_t>> load(const std::string& path) override;
+
+  private:
+    friend class LinuxFileStream;
+
+    /// Syncs the directory that holds `path` unless that was done since the file was made. 0 or
+    /// the error's number.
+    [[nodiscard]] int syncNameOnce(const std::string& path);
+
+    Paths paths_;
+    /// Files whose names are on permanent storage as far as this process has seen to it. A file
+    /// that was there before it may have been made by a process that was killed before its sync,
+    /// so existing files are not in here from the start.
+    std::set<std::string, std::less<>> syncedNames_;
+};
+
+} // namespace platform

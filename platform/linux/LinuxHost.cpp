@@ -1,0 +1,102 @@
+#include "platform/linux/LinuxHost.h"
+
+#include "base/Concat.h"
+#include "platform/linux/EventSocket.h"
+#include "platform/linux/IdleExit.h"
+#include "platform/linux/LinuxAlarm.h"
+#include "platform/linux/LinuxEventStream.h"
+#include "platform/linux/LinuxFiles.h"
+#include "platform/linux/LinuxKernelChannel.h"
+#include "platform/linux/LinuxManagedSettings.h"
+#include "platform/linux/LinuxProcessTransactions.h"
+#include "platform/linux/LinuxRunLoop.h"
+#include "platform/linux/LinuxServiceRegistry.h"
+#include "platform/linux/LinuxSystemLog.h"
+#include "platform/linux/SettingsWatch.h"
+
+#include <systemd/sd-daemon.h>
+
+#include <string>
+#include <utility>
+
+namespace platform {
+
+/// In the order of construction: what stands below uses what stands above, and goes first.
+struct LinuxHost::Parts {
+    explicit Parts(LinuxHostOptions options)
+        : log(options.paths),
+          files(options.paths),
+          settings(options.paths, log),
+          registry(options.paths.kernelSocket(), log),
+          channel(options.paths.kernelSocket(), registry, log),
+          runLoop(log),
+          events(runLoop, log),
+          alarm(events, runLoop, AlarmStore(options.paths.alarmDirectory(), log), transactions) {
+        settingsWatch.emplace(options.paths.managedSettings(), runLoop, log, [this] {
+            events.post({wire::kNotifydMatchingStream, kSettingsChangedEvent});
+        });
+        if (options.eventSocket.isOpen()) {
+            eventSocket = std::make_unique<EventSocket>(
+                std::move(options.eventSocket), runLoop, log,
+                [this](const wire::EventDatagram& event) { arrived(event); });
+        } else {
+            log.write(LogLevel::warning,
+                      "kstd: EventSocket: no socket was handed over; no events will arrive.\n", {});
+        }
+        if (options.idleTime) {
+            idleExit = std::make_unique<IdleExit>(
+                runLoop, *options.idleTime, [this] { return events.busy() || transactions.busy(); },
+                [this] { closeStreams(); });
+        }
+    }
+
+    void arrived(const wire::EventDatagram& event) {
+        if (idleExit) {
+            idleExit->touch();
+        }
+        if (event.stream != wire::kAlarmStream) {
+            events.post({std::string(event.stream), std::string(event.name)});
+        } else if (!alarm.arrived(event.stream, event.name, event.payload)) {
+            log.write(
+                LogLevel::warning,
+                base::concat("kstd: EventSocket: dropped alarm ", event.name, " without a date.\n"),
+                {});
+        }
+    }
+
+    void closeStreams() {
+        sd_notify(0, "STOPPING=1");
+        eventSocket.reset();
+        settingsWatch.reset();
+        alarm.close();
+    }
+
+    LinuxSystemLog log;
+    LinuxFiles files;
+    LinuxManagedSettings settings;
+    LinuxServiceRegistry registry;
+    LinuxKernelChannel channel;
+    LinuxProcessTransactions transactions;
+    LinuxRunLoop runLoop;
+    LinuxEventStream events;
+    LinuxAlarm alarm;
+    std::optional<SettingsWatch> settingsWatch;
+    std::unique_ptr<EventSocket> eventSocket;
+    std::unique_ptr<IdleExit> idleExit;
+};
+
+LinuxHost::LinuxHost(LinuxHostOptions options)
+    : parts_(std::make_unique<Parts>(std::move(options))) {}
+
+LinuxHost::~LinuxHost() = default;
+
+void LinuxHost::closeStreams() {
+    parts_->closeStreams();
+}
+
+Host LinuxHost::interfaces() {
+    return {parts_->log,          parts_->registry, parts_->channel,  parts_->events, parts_->alarm,
+            parts_->transactions, parts_->runLoop,  parts_->settings, parts_->files};
+}
+
+} // namespace platform

@@ -1,0 +1,46 @@
+#pragma once
+
+#include "platform/Host.h"
+#include "platform/linux/FileDescriptor.h"
+#include "platform/linux/Paths.h"
+
+#include <chrono>
+#include <memory>
+#include <optional>
+
+namespace platform {
+
+/// How a program wants its host to be.
+struct LinuxHostOptions {
+    /// Where the system's paths begin.
+    Paths paths{"/"};
+    /// Where events come from; without one the host has no event socket.
+    FileDescriptor eventSocket{};
+    /// How long the process stays idle before the host closes its streams; none is for ever.
+    std::optional<std::chrono::milliseconds> idleTime = std::nullopt;
+};
+
+/// All interfaces of the platform on this machine, made and owned in one place.
+///
+/// Handlers and what they hold are destroyed first when the host goes, while every interface that
+/// they use is still there.
+class LinuxHost {
+  public:
+    explicit LinuxHost(LinuxHostOptions options);
+    LinuxHost(const LinuxHost&) = delete;
+    LinuxHost& operator=(const LinuxHost&) = delete;
+    ~LinuxHost();
+
+    [[nodiscard]] Host interfaces();
+
+    /// Takes the run loop's sources away, as the end of an idle process does: no event is received
+    /// any more, and the loop cannot be run once what was received is delivered. What waits in the
+    /// event socket stays there and launches the next process.
+    void closeStreams();
+
+  private:
+    struct Parts;
+    std::unique_ptr<Parts> parts_;
+};
+
+} // namespace platform

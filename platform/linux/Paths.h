@@ -1,0 +1,35 @@
+#pragma once
+
+#include <string>
+#include <string_view>
+
+namespace platform {
+
+/// The absolute paths of the system, all under one root directory: "/" in the installed programs,
+/// a private directory in development and tests.
+class Paths {
+  public:
+    /// `root` is absolute; slashes at its end do not matter.
+    explicit Paths(std::string_view root);
+
+    /// `absolutePath`, a path as the programs know it, where it lies under the root.
+    [[nodiscard]] std::string under(std::string_view absolutePath) const;
+
+    [[nodiscard]] bool isSystemRoot() const { return prefix_.empty(); }
+
+    [[nodiscard]] std::string eventSocket() const { return under("/run/kstd/events.sock"); }
+    [[nodiscard]] std::string kernelSocket() const { return under("/run/keystrand/service.sock"); }
+    [[nodiscard]] std::string managedSettingsDirectory() const { return under("/etc/kstd"); }
+    [[nodiscard]] std::string managedSettings() const {
+        return under("/etc/kstd/managed-settings.conf");
+    }
+    [[nodiscard]] std::string alarmDirectory() const { return under("/var/lib/kstd/alarms"); }
+    [[nodiscard]] std::string journalSocket() const { return under("/run/systemd/journal/socket"); }
+    [[nodiscard]] std::string stateDirectory() const { return under("/var/root"); }
+
+  private:
+    /// The root without a slash at its end; empty for "/".
+    std::string prefix_;
+};
+
+} // namespace platform

@@ -1,0 +1,29 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <string>
+#include <sys/stat.h>
+#include <vector>
+
+namespace platform {
+
+/// Why a file was not read.
+enum class ReadFailure { none, missing, notRegular, tooLarge, unreadable };
+
+/// What reading a file gave.
+struct RegularFile {
+    ReadFailure failure = ReadFailure::none;
+    /// The error's number when the failure is `missing` or `unreadable`.
+    int error = 0;
+    /// All of its bytes when there was no failure, else empty.
+    std::vector<std::uint8_t> bytes;
+    /// Owner, mode and so on of the very file that was read. Only without a failure.
+    struct stat status {};
+};
+
+/// Reads the whole file at `path`, at most `limit` bytes of it: a larger file is a failure, also
+/// one that grows while it is read. Never waits, whatever stands at the path.
+[[nodiscard]] RegularFile readRegularFile(const std::string& path, std::size_t limit);
+
+} // namespace platform

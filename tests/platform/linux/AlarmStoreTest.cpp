@@ -1,0 +1,145 @@
+#include "platform/linux/AlarmStore.h"
+
+#include "platform/fake/FakeSystemLog.h"
+#include "tests/support/TemporaryDirectory.h"
+
+#include <gmock/gmock.h>
+
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <limits>
+#include <sys/stat.h>
+
+namespace platform {
+namespace {
+
+using testing::ElementsAre;
+using testing::Pair;
+using testing::UnorderedElementsAre;
+
+constexpr std::int64_t kLatest = std::numeric_limits<std::int64_t>::max();
+
+class AlarmStoreTest : public testing::Test {
+  protected:
+    [[nodiscard]] std::string fileOf(const std::string& event) const {
+        return path + "/stream/" + event;
+    }
+
+    [[nodiscard]] std::string contents(const std::string& event) const {
+        std::ifstream file(fileOf(event), std::ios::binary);
+        return {std::istreambuf_iterator<char>(file), {}};
+    }
+
+    void put(const std::string& event, const std::string& text) const {
+        std::filesystem::create_directories(path + "/stream");
+        std::ofstream(fileOf(event), std::ios::binary) << text;
+    }
+
+    support::TemporaryDirectory directory;
+    std::string path = directory.file("var/lib/alarms");
+    FakeSystemLog log;
+    AlarmStore store{path, log};
+};
+
+TEST_F(AlarmStoreTest, NothingIsRegisteredAtFirst) {
+    EXPECT_THAT(store.load("stream"), ElementsAre());
+    EXPECT_THAT(log.texts(), ElementsAre());
+}
+
+TEST_F(AlarmStoreTest, RegistrationsAreReadBackByStream) {
+    store.save("stream", "a", {1700000000000000000});
+    store.save("stream", "b", {1});
+    store.save("other", "a", {2});
+    EXPECT_THAT(store.load("stream"),
+                UnorderedElementsAre(Pair("a", Date{1700000000000000000}), Pair("b", Date{1})));
+    EXPECT_THAT(store.load("other"), ElementsAre(Pair("a", Date{2})));
+    EXPECT_THAT(log.texts(), ElementsAre());
+}
+
+TEST_F(AlarmStoreTest, FileHoldsTwentyDigitsAndANewlineForItsOwnerAlone) {
+    store.save("stream", "a", {1700000000000000000});
+    EXPECT_EQ(contents("a"), "01700000000000000000\n");
+    struct stat status {};
+    ASSERT_EQ(::stat(fileOf("a").c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 0777U, 0600U);
+}
+
+TEST_F(AlarmStoreTest, EndsOfTheRangeAreKept) {
+    store.save("stream", "a", {0});
+    store.save("stream", "b", {kLatest});
+    store.save("stream", "c", {std::numeric_limits<std::int64_t>::min()});
+    EXPECT_THAT(
+        store.load("stream"),
+        UnorderedElementsAre(Pair("a", Date{0}), Pair("b", Date{kLatest}), Pair("c", Date{0})));
+}
+
+TEST_F(AlarmStoreTest, LaterRegistrationReplacesTheEarlier) {
+    store.save("stream", "a", {kLatest});
+    store.save("stream", "a", {5});
+    EXPECT_THAT(store.load("stream"), ElementsAre(Pair("a", Date{5})));
+}
+
+TEST_F(AlarmStoreTest, ClearedRegistrationIsNotReadBackAndMayBeMadeAnew) {
+    store.save("stream", "a", {5});
+    store.clear("stream", "a");
+    EXPECT_EQ(contents("a"), "none                \n");
+    EXPECT_THAT(store.load("stream"), ElementsAre());
+    store.save("stream", "a", {6});
+    EXPECT_THAT(store.load("stream"), ElementsAre(Pair("a", Date{6})));
+}
+
+TEST_F(AlarmStoreTest, ClearingWhatIsNotThereIsSilent) {
+    store.clear("stream", "a");
+    EXPECT_THAT(log.texts(), ElementsAre());
+    EXPECT_FALSE(std::filesystem::exists(path));
+}
+
+class BrokenFileTest : public AlarmStoreTest, public testing::WithParamInterface<std::string> {};
+
+TEST_P(BrokenFileTest, StandsForAnAlarmThatIsDue) {
+    put("a", GetParam());
+    EXPECT_THAT(store.load("stream"), ElementsAre(Pair("a", Date{0})));
+    EXPECT_THAT(log.texts(), ElementsAre("kstd: AlarmStore: unreadable alarm, taken as due: " +
+                                         fileOf("a") + "."));
+}
+
+INSTANTIATE_TEST_SUITE_P(Contents, BrokenFileTest,
+                         testing::Values("", "0170000000000000000\n", "01700000000000000000",
+                                         "017000000000000000000\n", "0170000000000000000x\n",
+                                         "99999999999999999999\n", "-1700000000000000000\n",
+                                         "none\n", std::string(21, '\0')));
+
+TEST_F(AlarmStoreTest, BrokenFileIsWholeAgainAfterTheNextRegistration) {
+    put("a", std::string(100, 'x'));
+    store.save("stream", "a", {7});
+    EXPECT_EQ(contents("a"), "00000000000000000007\n");
+}
+
+TEST_F(AlarmStoreTest, NamesThatCannotBeFilesAreNotKeptAndSaidSo) {
+    for (const std::string name : {"", ".", "..", "a/b", "../../escape"}) {
+        log.clear();
+        store.save("stream", name, {1});
+        EXPECT_THAT(log.texts(),
+                    ElementsAre("kstd: AlarmStore: alarm whose name cannot be kept on disk: " +
+                                name + "."));
+    }
+    EXPECT_THAT(store.load("stream"), ElementsAre());
+}
+
+TEST_F(AlarmStoreTest, LongestNameIsKept) {
+    const std::string longest(200, 'n');
+    store.save("stream", longest, {1});
+    store.save("stream", longest + "n", {1});
+    EXPECT_THAT(store.load("stream"), ElementsAre(Pair(longest, Date{1})));
+}
+
+TEST_F(AlarmStoreTest, DirectoryThatCannotBeMadeIsSaid) {
+    std::ofstream(directory.file("var")) << "a file";
+    store.save("stream", "a", {1});
+    EXPECT_THAT(log.texts(), ElementsAre("kstd: AlarmStore: cannot keep the alarm on disk: " +
+                                         fileOf("a") + ", error 20."));
+}
+
+} // namespace
+} // namespace platform

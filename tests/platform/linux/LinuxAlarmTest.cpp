@@ -1,0 +1,206 @@
+#include "platform/linux/LinuxAlarm.h"
+
+#include "platform/fake/FakeProcessTransactions.h"
+#include "platform/fake/FakeSystemLog.h"
+#include "platform/linux/RealTime.h"
+#include "tests/support/TemporaryDirectory.h"
+
+#include <gmock/gmock.h>
+
+#include <memory>
+#include <string>
+#include <time.h>
+#include <unistd.h>
+#include <vector>
+
+namespace platform {
+namespace {
+
+using testing::ElementsAre;
+using testing::Pair;
+
+constexpr std::int64_t kMillisecond = 1'000'000;
+constexpr std::int64_t kFarAway = 4'102'444'800'000'000'000;
+
+/// One process's alarms on a directory.
+struct AlarmProcess {
+    explicit AlarmProcess(const std::string& directory)
+        : alarm(events, loop, AlarmStore(directory, log), transactions) {}
+
+    void subscribe() {
+        events.setHandler("stream",
+                          [this](const Event& event) { delivered.push_back(event.name); });
+    }
+
+    void set(const std::string& event, std::int64_t date) {
+        const EventDictionary dictionary{{kAlarmDateKey, {date}}};
+        alarm.set("stream", event, &dictionary);
+    }
+
+    FakeSystemLog log;
+    LinuxRunLoop loop{log};
+    LinuxEventStream events{loop, log};
+    FakeProcessTransactions transactions;
+    LinuxAlarm alarm;
+    std::vector<std::string> delivered;
+};
+
+class LinuxAlarmTest : public testing::Test {
+  protected:
+    void SetUp() override { start(); }
+
+    void start() {
+        process.reset();
+        process = std::make_unique<AlarmProcess>(path);
+        process->subscribe();
+    }
+
+    static std::vector<std::uint8_t> dateBytes(std::int64_t date) {
+        std::vector<std::uint8_t> bytes;
+        for (int i = 0; i < 8; ++i) {
+            bytes.push_back(static_cast<std::uint8_t>(static_cast<std::uint64_t>(date) >> (8 * i)));
+        }
+        return bytes;
+    }
+
+    [[nodiscard]] std::vector<std::pair<std::string, Date>> registered() {
+        return AlarmStore(path, process->log).load("stream");
+    }
+
+    support::TemporaryDirectory directory;
+    std::string path = directory.file("alarms");
+    std::unique_ptr<AlarmProcess> process;
+};
+
+TEST_F(LinuxAlarmTest, ArmedAlarmHoldsATransactionAndKeepsTheLoopRunning) {
+    EXPECT_FALSE(process->loop.runOnce({0}));
+    process->set("a", kFarAway);
+    EXPECT_THAT(process->transactions.open(), ElementsAre("alarm armed"));
+    EXPECT_TRUE(process->loop.runOnce({0}));
+    process->set("b", kFarAway);
+    EXPECT_EQ(process->transactions.count(), 1U);
+    process->alarm.set("stream", "a", nullptr);
+    EXPECT_EQ(process->transactions.count(), 1U);
+    process->alarm.set("stream", "b", nullptr);
+    EXPECT_EQ(process->transactions.count(), 0U);
+    EXPECT_FALSE(process->loop.runOnce({0}));
+}
+
+TEST_F(LinuxAlarmTest, TimerWakesTheLoopAtTheDateAndNotBefore) {
+    const Date date{realTimeNow().nanosecondsSince1970 + 5 * kMillisecond};
+    process->set("a", date.nanosecondsSince1970);
+    while (process->delivered.empty() && process->loop.runOnce(kDistantFuture)) {
+    }
+    EXPECT_THAT(process->delivered, ElementsAre("a"));
+    EXPECT_GE(realTimeNow(), date);
+    EXPECT_EQ(process->transactions.count(), 0U);
+    EXPECT_THAT(registered(), ElementsAre());
+}
+
+TEST_F(LinuxAlarmTest, EarliestAlarmComesFirst) {
+    const std::int64_t now = realTimeNow().nanosecondsSince1970;
+    process->set("sooner", now + 4 * kMillisecond);
+    process->set("later", now + 8 * kMillisecond);
+    while (process->delivered.size() < 2 && process->loop.runOnce(kDistantFuture)) {
+    }
+    EXPECT_THAT(process->delivered, ElementsAre("sooner", "later"));
+}
+
+TEST_F(LinuxAlarmTest, LatestDateIsHeldAndDoesNotFire) {
+    process->set("a", kDistantFuture.nanosecondsSince1970);
+    EXPECT_TRUE(process->loop.runOnce({realTimeNow().nanosecondsSince1970 + 2 * kMillisecond}));
+    EXPECT_THAT(process->delivered, ElementsAre());
+    EXPECT_THAT(registered(), ElementsAre(Pair("a", kDistantFuture)));
+}
+
+TEST_F(LinuxAlarmTest, SurvivesAStepOfTheClock) {
+    const Date date{realTimeNow().nanosecondsSince1970 + 5 * kMillisecond};
+    process->set("a", date.nanosecondsSince1970);
+    // Setting the clock to what it shows is a step like any other for the timer.
+    timespec now{};
+    ::clock_gettime(CLOCK_REALTIME, &now);
+    if (::clock_settime(CLOCK_REALTIME, &now) != 0) {
+        GTEST_SKIP() << "needs the right to set the clock";
+    }
+    while (process->delivered.empty() && process->loop.runOnce(kDistantFuture)) {
+    }
+    EXPECT_THAT(process->delivered, ElementsAre("a"));
+    EXPECT_GE(realTimeNow(), date);
+}
+
+TEST_F(LinuxAlarmTest, TimerSaysThatTheClockWasSet) {
+    RealTimeTimer timer;
+    timer.arm({kFarAway});
+    EXPECT_EQ(timer.acknowledge(), RealTimeTimer::Wake::nothing);
+    timespec now{};
+    ::clock_gettime(CLOCK_REALTIME, &now);
+    if (::clock_settime(CLOCK_REALTIME, &now) != 0) {
+        GTEST_SKIP() << "needs the right to set the clock";
+    }
+    EXPECT_EQ(timer.acknowledge(), RealTimeTimer::Wake::clockWasSet);
+}
+
+TEST_F(LinuxAlarmTest, LaterProcessFiresWhatBecameDueWhileNobodyRan) {
+    const Date date{realTimeNow().nanosecondsSince1970 + kMillisecond};
+    process->set("a", date.nanosecondsSince1970);
+    process->set("b", kFarAway);
+    process.reset();
+    while (realTimeNow() < date) {
+    }
+    start();
+    while (process->delivered.empty() && process->loop.runOnce(kDistantFuture)) {
+    }
+    EXPECT_THAT(process->delivered, ElementsAre("a"));
+    EXPECT_THAT(registered(), ElementsAre(Pair("b", Date{kFarAway})));
+}
+
+TEST_F(LinuxAlarmTest, ProcessThatEndsBeforeTheDeliveryLeavesTheAlarm) {
+    process->set("a", 1);
+    EXPECT_TRUE(process->events.busy());
+    start();
+    while (process->delivered.empty() && process->loop.runOnce(kDistantFuture)) {
+    }
+    EXPECT_THAT(process->delivered, ElementsAre("a"));
+    EXPECT_THAT(registered(), ElementsAre());
+}
+
+TEST_F(LinuxAlarmTest, AlarmSetAnewByItsOwnHandlerStays) {
+    process->events.setHandler("stream", [this](const Event&) { process->set("a", kFarAway); });
+    process->set("a", 1);
+    EXPECT_TRUE(process->loop.runOnce(kDistantFuture));
+    EXPECT_THAT(registered(), ElementsAre(Pair("a", Date{kFarAway})));
+    EXPECT_EQ(process->transactions.count(), 1U);
+}
+
+TEST_F(LinuxAlarmTest, ArrivedAlarmCountsForThePresentRegistrationOnly) {
+    process->set("a", kFarAway);
+    EXPECT_TRUE(process->alarm.arrived("stream", "a", dateBytes(kFarAway - 1)));
+    EXPECT_TRUE(process->alarm.arrived("stream", "unknown", dateBytes(kFarAway)));
+    EXPECT_FALSE(process->events.busy());
+    EXPECT_TRUE(process->alarm.arrived("stream", "a", dateBytes(kFarAway)));
+    EXPECT_TRUE(process->alarm.arrived("stream", "a", dateBytes(kFarAway)));
+    while (process->loop.runOnce({0})) {
+    }
+    EXPECT_THAT(process->delivered, ElementsAre("a"));
+    EXPECT_THAT(registered(), ElementsAre());
+}
+
+TEST_F(LinuxAlarmTest, ArrivedAlarmWithoutADateIsMalformed) {
+    process->set("a", kFarAway);
+    auto longer = dateBytes(kFarAway);
+    longer.push_back(0);
+    EXPECT_FALSE(process->alarm.arrived("stream", "a", {}));
+    EXPECT_FALSE(process->alarm.arrived("stream", "a", std::vector<std::uint8_t>(7)));
+    EXPECT_FALSE(process->alarm.arrived("stream", "a", longer));
+    EXPECT_FALSE(process->events.busy());
+}
+
+TEST_F(LinuxAlarmTest, AfterCloseRegistrationsAreStillKept) {
+    process->alarm.close();
+    process->set("a", kFarAway);
+    EXPECT_THAT(registered(), ElementsAre(Pair("a", Date{kFarAway})));
+    EXPECT_EQ(process->transactions.count(), 0U);
+}
+
+} // namespace
+} // namespace platform

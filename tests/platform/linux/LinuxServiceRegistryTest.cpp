@@ -1,0 +1,123 @@
+#include "platform/linux/LinuxServiceRegistry.h"
+
+#include "platform/fake/FakeSystemLog.h"
+#include "tests/platform/linux/KernelReplies.h"
+#include "tests/support/SeqpacketServer.h"
+#include "tests/support/TemporaryDirectory.h"
+
+#include <gtest/gtest.h>
+
+#include <optional>
+#include <string>
+
+namespace platform {
+namespace {
+
+using support::Packet;
+using support::SeqpacketServer;
+
+class LinuxServiceRegistryTest : public testing::Test {
+  protected:
+    /// Answers every request with what `answer` makes of it.
+    void serve(std::function<Packet(const Packet& request)> answer) {
+        server.emplace(path, [answer = std::move(answer)](const SeqpacketServer::Peer& peer) {
+            for (Packet request = peer.receive(); !request.empty(); request = peer.receive()) {
+                peer.send(answer(request));
+            }
+        });
+    }
+
+    support::TemporaryDirectory directory;
+    std::string path = directory.file("service.sock");
+    FakeSystemLog log;
+    LinuxServiceRegistry registry{path, log, std::chrono::milliseconds(5000)};
+    std::optional<SeqpacketServer> server;
+};
+
+TEST_F(LinuxServiceRegistryTest, RequestBytesOfEachOperation) {
+    std::vector<Packet> requests;
+    serve([&](const Packet& request) {
+        requests.push_back(request);
+        return support::reply(request, 0, 1, "/a");
+    });
+    const ServiceHandle entry = registry.findByPath("/p");
+    EXPECT_NE(registry.findByClassName("C"), kNoService);
+    EXPECT_EQ(registry.copyProperty(entry, "N"), (std::vector<std::uint8_t>{'/', 'a'}));
+    server.reset();
+    ASSERT_EQ(requests.size(), 3U);
+    EXPECT_EQ(requests[0],
+              (Packet{'K', 'S', 'T', 'Q', 1, 1, 0, 0, 1, 0, 0, 0, 0, 0, 0, 0, '/', 'p'}));
+    EXPECT_EQ(requests[1], (Packet{'K', 'S', 'T', 'Q', 1, 2, 0, 0, 2, 0, 0, 0, 0, 0, 0, 0, 'C'}));
+    EXPECT_EQ(requests[2], (Packet{'K', 'S', 'T', 'Q', 1, 3, 0, 0,   3,   0,  0,
+                                   0,   0,   0,   0,   0, 2, 0, '/', 'a', 'N'}));
+}
+
+TEST_F(LinuxServiceRegistryTest, SameEntryHasOneHandleAndCountedReferences) {
+    serve([](const Packet& request) { return support::reply(request, 0, 1, "/a"); });
+    const ServiceHandle first = registry.findByPath("/a");
+    const ServiceHandle second = registry.findByClassName("A");
+    EXPECT_EQ(first, second);
+    registry.release(first);
+    EXPECT_EQ(registry.pathOf(second), "/a");
+    registry.release(second);
+    EXPECT_EQ(registry.pathOf(second), "");
+    registry.release(second);
+    registry.release(kNoService);
+}
+
+TEST_F(LinuxServiceRegistryTest, PropertyOfAnEntryThatIsNotHeldIsNone) {
+    int requests = 0;
+    serve([&](const Packet& request) {
+        ++requests;
+        return support::reply(request, 0, 1, "x");
+    });
+    EXPECT_EQ(registry.copyProperty(7, "N"), std::nullopt);
+    server.reset();
+    EXPECT_EQ(requests, 0);
+}
+
+TEST_F(LinuxServiceRegistryTest, AbsentAndEmptyPropertiesAreDifferent) {
+    serve([](const Packet& request) {
+        if (request[5] != 3) {
+            return support::reply(request, 0, 1, "/a");
+        }
+        return support::reply(request, 0, request.back() == 'E' ? 1 : 0, "");
+    });
+    const ServiceHandle entry = registry.findByPath("/a");
+    EXPECT_EQ(registry.copyProperty(entry, "E"), std::vector<std::uint8_t>{});
+    EXPECT_EQ(registry.copyProperty(entry, "A"), std::nullopt);
+}
+
+TEST_F(LinuxServiceRegistryTest, TextsBeyondTheLimitsAreNotAskedFor) {
+    int requests = 0;
+    serve([&](const Packet& request) {
+        ++requests;
+        return support::reply(request, 0, 1, "/a");
+    });
+    const ServiceHandle entry = registry.findByPath(std::string(1024, 'p'));
+    EXPECT_NE(entry, kNoService);
+    EXPECT_EQ(registry.findByPath(std::string(1025, 'p')), kNoService);
+    EXPECT_NE(registry.findByClassName(std::string(255, 'c')), kNoService);
+    EXPECT_EQ(registry.findByClassName(std::string(256, 'c')), kNoService);
+    EXPECT_TRUE(registry.copyProperty(entry, std::string(255, 'n')));
+    EXPECT_FALSE(registry.copyProperty(entry, std::string(256, 'n')));
+    EXPECT_FALSE(registry.copyProperty(entry, ""));
+    server.reset();
+    EXPECT_EQ(requests, 3);
+}
+
+TEST_F(LinuxServiceRegistryTest, ServiceThatRefusesOrIsMissingHasNoEntries) {
+    EXPECT_EQ(registry.findByPath("/a"), kNoService);
+    serve([](const Packet& request) { return support::reply(request, -6002, 1, ""); });
+    EXPECT_EQ(registry.findByPath("/a"), kNoService);
+    server.reset();
+    EXPECT_EQ(registry.findByPath("/a"), kNoService);
+    serve([](const Packet& request) { return support::reply(request, 0, 1, ""); });
+    EXPECT_EQ(registry.findByPath("/a"), kNoService);
+    server.reset();
+    serve([](const Packet& request) { return support::reply(request, 0, 1, "/a"); });
+    EXPECT_NE(registry.findByPath("/a"), kNoService);
+}
+
+} // namespace
+} // namespace platform
