@@ -1,0 +1,71 @@
+#include "kstd/Daemon.h"
+
+#include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
+#include "kstd/LogLines.h"
+#include "platform/EventStream.h"
+#include "platform/MainRunLoop.h"
+#include "platform/ProcessTransaction.h"
+#include "wire/EventDatagram.h"
+
+#include <utility>
+
+namespace kstd {
+
+namespace {
+
+constexpr char kMain[] = "main";
+constexpr char kMainBlock[] = "main_block_invoke";
+
+} // namespace
+
+struct Daemon::MatchingStream {
+    const char* name;
+    const char* transactionLabel;
+    const char* shortName;
+};
+
+Daemon::Daemon(const platform::Host& host, Services services)
+    : host_(host), services_(std::make_shared<const Services>(std::move(services))) {}
+
+int Daemon::run() {
+    startServices();
+    subscribe({wire::kNotifydMatchingStream, "processing notifyd.matching", "notifyd"});
+    subscribe({wire::kCorvidMatchingStream, "processing corvid.matching", "corvid"});
+    logLine(host_.log, kMain, "Entering the main runloop.");
+    while (host_.runLoop.runOnce(platform::kDistantFuture)) {
+    }
+    stopServices();
+    services_.reset();
+    return 0;
+}
+
+void Daemon::startServices() {
+    for (const auto& service : *services_) {
+        logLine(host_.log, kMain, "Started service - ", service->description(), ".");
+        service->start();
+    }
+}
+
+void Daemon::subscribe(const MatchingStream& stream) {
+    host_.events.setHandler(stream.name, [host = host_, services = services_,
+                                          stream](const platform::Event& event) {
+        const platform::ProcessTransaction transaction(host.transactions, stream.transactionLabel);
+        logLine(host.log, kMainBlock, "Wisp Event: ", event.name, " (", stream.shortName, ").");
+        for (const auto& service : *services) {
+            service->handleWispEventWithName(event.name);
+        }
+    });
+}
+
+void Daemon::stopServices() {
+    for (const auto& service : *services_) {
+        logLine(host_.log, kMain, "Stoping service - ", service->description(), ".");
+        service->stop();
+    }
+}
+
+Daemon::Services makeServices(const platform::Host& host) {
+    return {DeviceRestrictedModeService::make(host)};
+}
+
+} // namespace kstd
