@@ -1,0 +1,45 @@
+#pragma once
+
+#include "keystrand-sim/KernelStatus.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <span>
+#include <vector>
+
+namespace sim {
+
+/// What a command did. `output` is empty unless `status` is 0.
+struct CommandResult {
+    KernelStatus status = kKernelSuccess;
+    std::vector<std::uint8_t> output;
+};
+
+/// Commands by number, each with the payload lengths that it takes. The command codes of a frame
+/// are one such table, the control codes inside the kernel-control command another.
+class DispatchTable {
+  public:
+    using Handler = std::function<CommandResult(std::span<const std::uint8_t> payload)>;
+    struct Lengths {
+        std::size_t min = 0;
+        std::size_t max = 0;
+    };
+
+    void add(std::uint32_t code, Lengths lengths, Handler handler);
+
+    /// kKernelUnknownCommand for a number that is not in the table, kKernelBadPayload for a length
+    /// that the command does not take; otherwise what its handler says.
+    [[nodiscard]] CommandResult run(std::uint32_t code,
+                                    std::span<const std::uint8_t> payload) const;
+
+  private:
+    struct Entry {
+        Lengths lengths;
+        Handler handler;
+    };
+    std::map<std::uint32_t, Entry> entries_;
+};
+
+} // namespace sim

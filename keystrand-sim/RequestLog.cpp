@@ -1,0 +1,50 @@
+#include "keystrand-sim/RequestLog.h"
+
+#include <utility>
+
+namespace sim {
+
+void RequestLog::setObserver(Observer observer) {
+    observer_ = std::move(observer);
+}
+
+void RequestLog::record(LoggedRequest request) {
+    request.index = ++count_;
+    countIn(request);
+    payloadBytes_ += request.payload.size();
+    entries_.push_back(std::move(request));
+    while (entries_.size() > kMaxEntries || payloadBytes_ > kMaxPayloadBytes) {
+        dropOldest();
+    }
+    observer_();
+}
+
+void RequestLog::clear() {
+    entries_.clear();
+    payloadBytes_ = 0;
+    count_ = 0;
+    acknowledgements_ = 0;
+    controlCounts_.clear();
+}
+
+std::uint64_t RequestLog::controlCount(std::uint32_t control) const {
+    const auto found = controlCounts_.find(control);
+    return found == controlCounts_.end() ? 0 : found->second;
+}
+
+void RequestLog::countIn(const LoggedRequest& request) {
+    if (request.acknowledged) {
+        ++acknowledgements_;
+    }
+    if (request.control && (controlCounts_.size() < kMaxCountedControls ||
+                            controlCounts_.contains(*request.control))) {
+        ++controlCounts_[*request.control];
+    }
+}
+
+void RequestLog::dropOldest() {
+    payloadBytes_ -= entries_.front().payload.size();
+    entries_.pop_front();
+}
+
+} // namespace sim

@@ -1,0 +1,108 @@
+#include "keystrand-sim/Simulator.h"
+
+#include "base/Concat.h"
+
+#include <cerrno>
+#include <csignal>
+#include <ctime>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <system_error>
+#include <utility>
+
+namespace sim {
+
+namespace {
+
+constexpr mode_t kDirectoryMode = 0755;
+constexpr std::uint64_t kMicrosecondsPerSecond = 1'000'000;
+
+/// Makes the directory with exactly that mode; one that is there is left as it is.
+bool makeDirectory(const std::string& path, std::string& error) {
+    const bool made = ::mkdir(path.c_str(), kDirectoryMode) == 0;
+    if (made ? ::chmod(path.c_str(), kDirectoryMode) == 0 : errno == EEXIST) {
+        return true;
+    }
+    error =
+        base::concat(path, ": cannot make the directory: ", std::generic_category().message(errno));
+    return false;
+}
+
+} // namespace
+
+std::unique_ptr<Simulator> Simulator::create(const Settings& settings, std::string& error) {
+    const Paths paths(settings.root);
+    if (!makeDirectory(paths.runDirectory, error) ||
+        !makeDirectory(paths.serviceDirectory, error)) {
+        return nullptr;
+    }
+    auto loop = EventLoop::create();
+    if (!loop) {
+        error = "cannot make an event loop";
+        return nullptr;
+    }
+    auto service = ListeningSocket::open(paths.serviceSocket, SOCK_SEQPACKET, error);
+    if (!service) {
+        return nullptr;
+    }
+    auto control = ListeningSocket::open(paths.controlSocket, SOCK_STREAM, error);
+    if (!control) {
+        return nullptr;
+    }
+    std::unique_ptr<Simulator> simulator(
+        new Simulator(settings, paths, std::move(loop), std::move(*service), std::move(*control)));
+    if (!simulator->deadline_ || !simulator->terminate_ || !simulator->interrupt_) {
+        error = "cannot watch for signals and time";
+        return nullptr;
+    }
+    return simulator;
+}
+
+Simulator::Simulator(const Settings& settings, const Paths& paths, std::unique_ptr<EventLoop> loop,
+                     ListeningSocket service, ListeningSocket control)
+    : loop_(std::move(loop)),
+      events_(*loop_, paths.eventSocket),
+      publisher_(kernel_.registry, events_),
+      restrictedMode_(settings.periods, Clock(settings.clock), kernel_.registry, publisher_),
+      kernelControls_(makeKernelControls(restrictedMode_, kernel_.registry)),
+      commands_(makeCommands(kernel_.environment, kernelControls_)),
+      handler_({.registry = kernel_.registry,
+                .commands = commands_,
+                .logLevel = kernel_.logLevel,
+                .faults = faults_,
+                .log = requests_}),
+      server_(*loop_, std::move(service), handler_, faults_),
+      control_(*loop_, std::move(control),
+               {.kernel = kernel_,
+                .restrictedMode = restrictedMode_,
+                .publisher = publisher_,
+                .events = events_,
+                .faults = faults_,
+                .requests = requests_,
+                .server = server_}),
+      deadline_(loop_->timer(CLOCK_REALTIME, [this] { restrictedMode_.catchUp(); })),
+      terminate_(loop_->signal(SIGTERM, [this] { loop_->stop(); })),
+      interrupt_(loop_->signal(SIGINT, [this] { loop_->stop(); })) {
+    kernel_.logLevel = settings.logLevel;
+    restrictedMode_.setRearm([this] { armDeadline(); });
+}
+
+bool Simulator::run() {
+    return loop_->run();
+}
+
+void Simulator::armDeadline() {
+    if (restrictedMode_.clock().isManual()) {
+        deadline_.disable();
+        return;
+    }
+    // A deadline that the system's clock cannot express never comes.
+    const std::uint64_t seconds = restrictedMode_.timer().nextDeadline();
+    if (seconds > RestrictedModeTimer::kLatestTime / kMicrosecondsPerSecond) {
+        deadline_.disable();
+        return;
+    }
+    deadline_.expireAt(seconds * kMicrosecondsPerSecond);
+}
+
+} // namespace sim

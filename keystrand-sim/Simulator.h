@@ -1,0 +1,66 @@
+#pragma once
+
+#include "keystrand-sim/Commands.h"
+#include "keystrand-sim/ControlSocket.h"
+#include "keystrand-sim/EventLoop.h"
+#include "keystrand-sim/EventSender.h"
+#include "keystrand-sim/FaultScript.h"
+#include "keystrand-sim/KernelControls.h"
+#include "keystrand-sim/KernelSocketServer.h"
+#include "keystrand-sim/KernelState.h"
+#include "keystrand-sim/ListeningSocket.h"
+#include "keystrand-sim/NotificationPublisher.h"
+#include "keystrand-sim/Paths.h"
+#include "keystrand-sim/RequestHandler.h"
+#include "keystrand-sim/RequestLog.h"
+#include "keystrand-sim/RestrictedModeController.h"
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+
+namespace sim {
+
+/// The kernel side as a whole, under one root directory.
+class Simulator {
+  public:
+    struct Settings {
+        std::string root = "/";
+        RestrictedModeTimer::Periods periods;
+        /// Where a manual clock stands; none for the real one.
+        std::optional<RestrictedModeTimer::Seconds> clock;
+        std::uint8_t logLevel = 40;
+    };
+
+    /// A simulator whose sockets listen, or none with a reason for people in `error`.
+    [[nodiscard]] static std::unique_ptr<Simulator> create(const Settings& settings,
+                                                           std::string& error);
+
+    /// Serves until SIGTERM, SIGINT or the control command that ends it. False when the loop
+    /// failed.
+    [[nodiscard]] bool run();
+
+  private:
+    Simulator(const Settings& settings, const Paths& paths, std::unique_ptr<EventLoop> loop,
+              ListeningSocket service, ListeningSocket control);
+    void armDeadline();
+
+    std::unique_ptr<EventLoop> loop_;
+    KernelState kernel_;
+    FaultScript faults_;
+    RequestLog requests_;
+    EventSender events_;
+    NotificationPublisher publisher_;
+    RestrictedModeController restrictedMode_;
+    DispatchTable kernelControls_;
+    DispatchTable commands_;
+    RequestHandler handler_;
+    KernelSocketServer server_;
+    ControlSocket control_;
+    EventSource deadline_;
+    EventSource terminate_;
+    EventSource interrupt_;
+};
+
+} // namespace sim
