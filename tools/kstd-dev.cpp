@@ -1,0 +1,76 @@
+// The daemon's own code under a root directory of one's choice, for development, tests and the
+// demonstration. The installed daemon takes no options.
+
+#include "KSTLib/Platform.h"
+#include "kstd/Daemon.h"
+#include "platform/linux/EventSocket.h"
+#include "platform/linux/LinuxHost.h"
+
+#include <CLI/CLI.hpp>
+
+#include <chrono>
+#include <csignal>
+#include <exception>
+#include <filesystem>
+#include <iostream>
+#include <string>
+
+namespace {
+
+struct Options {
+    std::string root;
+    int idleMilliseconds = 0;
+};
+
+/// What the package makes on a real system.
+void makeDirectories(const platform::Paths& paths) {
+    using std::filesystem::perms;
+    for (const auto& path : {paths.under("/run/kstd"), paths.under("/run/keystrand"),
+                             paths.managedSettingsDirectory(), paths.alarmDirectory()}) {
+        std::filesystem::create_directories(path);
+    }
+    std::filesystem::create_directories(paths.stateDirectory());
+    std::filesystem::permissions(paths.stateDirectory(), perms::owner_all);
+}
+
+platform::FileDescriptor eventSocket(const platform::Paths& paths) {
+    platform::FileDescriptor activated = platform::takeActivatedEventSocket();
+    return activated.isOpen() ? std::move(activated)
+                              : platform::makeEventSocket(paths.eventSocket());
+}
+
+int runDaemon(const Options& options) {
+    const platform::Paths paths(options.root);
+    makeDirectories(paths);
+    platform::LinuxHostOptions hostOptions{.paths = paths, .eventSocket = eventSocket(paths)};
+    if (!hostOptions.eventSocket.isOpen()) {
+        std::cerr << "kstd-dev: cannot make the event socket " << paths.eventSocket() << '\n';
+        return 1;
+    }
+    if (options.idleMilliseconds > 0) {
+        hostOptions.idleTime = std::chrono::milliseconds(options.idleMilliseconds);
+    }
+    platform::LinuxHost host(std::move(hostOptions));
+    const platform::Host interfaces = host.interfaces();
+    kst::installPlatform({interfaces.log, interfaces.registry, interfaces.channel});
+    return kstd::Daemon(interfaces, kstd::makeServices(interfaces)).run();
+}
+
+} // namespace
+
+int main(int argc, char** argv) {
+    std::signal(SIGPIPE, SIG_IGN);
+    CLI::App app("Runs the daemon with all its paths under a root directory of its own.");
+    Options options;
+    app.add_option("--root", options.root, "The directory in which /run, /etc and /var lie")
+        ->required();
+    app.add_option("--idle-exit", options.idleMilliseconds,
+                   "End after this many milliseconds without work; 0 is never");
+    CLI11_PARSE(app, argc, argv);
+    try {
+        return runDaemon(options);
+    } catch (const std::exception& error) {
+        std::cerr << "kstd-dev: " << error.what() << '\n';
+        return 1;
+    }
+}
