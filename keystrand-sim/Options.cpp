@@ -29,6 +29,8 @@ std::optional<Options> parseOptions(int argc, const char* const* argv, int& exit
         ->check(CLI::Range(0U, 255U))
         ->capture_default_str();
 
+    app.add_flag("--quiet", settings.quiet, "Publish nothing but what a command asks for");
+
     std::vector<std::string> words;
     CLI::App* control = app.add_subcommand("ctl", "Send one command to a running simulator");
     control->add_option("--root", settings.root, "The running simulator's root directory")

@@ -81,8 +81,10 @@ void RestrictedModeController::catchUp() {
 }
 
 void RestrictedModeController::publish(const RestrictedModeTimer::Notifications& notifications) {
-    for (const Notification& notification : notifications) {
-        publisher_.publish(notification);
+    if (!quiet_) {
+        for (const Notification& notification : notifications) {
+            publisher_.publish(notification);
+        }
     }
     rearm_();
 }

@@ -28,6 +28,10 @@ class RestrictedModeController {
     void setPasscodeSet(bool passcodeSet);
     void setBootArg(bool bootArg);
 
+    /// A quiet model goes on as it does, but what it would publish on its own is dropped.
+    void setQuiet(bool quiet) { quiet_ = quiet; }
+    [[nodiscard]] bool quiet() const { return quiet_; }
+
     /// The daemon hands back what it kept. That is news only when it differs from what was last
     /// published and nothing newer is waiting to be read; otherwise what is known here stays. A
     /// state of zeros means that the daemon has none.
@@ -51,6 +55,7 @@ class RestrictedModeController {
     RestrictedModeTimer timer_;
     const Registry& registry_;
     NotificationPublisher& publisher_;
+    bool quiet_ = false;
     Rearm rearm_ = [] {
     };
 };

@@ -84,6 +84,7 @@ Simulator::Simulator(const Settings& settings, const Paths& paths, std::unique_p
       terminate_(loop_->signal(SIGTERM, [this] { loop_->stop(); })),
       interrupt_(loop_->signal(SIGINT, [this] { loop_->stop(); })) {
     kernel_.logLevel = settings.logLevel;
+    restrictedMode_.setQuiet(settings.quiet);
     restrictedMode_.setRearm([this] { armDeadline(); });
 }
 

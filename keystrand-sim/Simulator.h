@@ -31,6 +31,7 @@ class Simulator {
         /// Where a manual clock stands; none for the real one.
         std::optional<RestrictedModeTimer::Seconds> clock;
         std::uint8_t logLevel = 40;
+        bool quiet = false;
     };
 
     /// A simulator whose sockets listen, or none with a reason for people in `error`.

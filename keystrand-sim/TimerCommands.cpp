@@ -37,6 +37,11 @@ ControlOutcome bootArg(ControlContext& context, ControlArguments& arguments) {
     return actUnlessProblem(arguments, [&] { context.restrictedMode.setBootArg(isSet); });
 }
 
+ControlOutcome quiet(ControlContext& context, ControlArguments& arguments) {
+    const bool isQuiet = arguments.onOrOff();
+    return actUnlessProblem(arguments, [&] { context.restrictedMode.setQuiet(isQuiet); });
+}
+
 ControlOutcome clockReal(ControlContext& context, ControlArguments& arguments) {
     return actUnlessProblem(arguments, [&] { context.restrictedMode.setRealClock(); });
 }
@@ -74,6 +79,7 @@ std::vector<std::string> timerStatus(const RestrictedModeController& controller)
             concat("allowed ", onOff(timer.policy().allowed)),
             concat("passcode ", onOff(timer.policy().passcodeSet)),
             concat("boot-arg ", onOff(timer.policy().bootArg)),
+            concat("quiet ", onOff(controller.quiet())),
             concat("period ", timer.periods().untilRestricted),
             concat("analytics-period ", timer.periods().analytics),
             concat("alarm ", record.alarm),
@@ -113,6 +119,7 @@ constexpr std::array kCommands = {
     ControlCommand{"unlock", "", unlock},
     ControlCommand{"passcode", "on|off", passcode},
     ControlCommand{"boot-arg", "on|off", bootArg},
+    ControlCommand{"quiet", "on|off", quiet},
     ControlCommand{"clock real", "", clockReal},
     ControlCommand{"clock set", "SECONDS", clockSet},
     ControlCommand{"clock advance", "SECONDS", clockAdvance},

@@ -51,6 +51,18 @@ class RestrictedModeControllerTest : public testing::Test {
         {.untilRestricted = 100, .analytics = 86400}, Clock(kStart), registry_, publisher_};
 };
 
+TEST_F(RestrictedModeControllerTest, QuietModelGoesOnWithoutPublishing) {
+    controller_.setQuiet(true);
+    controller_.lock();
+    controller_.setManualClock(kStart + 100);
+    EXPECT_TRUE(controller_.timer().restricted());
+    EXPECT_THAT(poster_.events, IsEmpty());
+    EXPECT_EQ(registry_.count(), 0U);
+    controller_.setQuiet(false);
+    controller_.unlock();
+    EXPECT_FALSE(poster_.events.empty());
+}
+
 TEST_F(RestrictedModeControllerTest, LockPutsTheRecordIntoItsPropertyAndPostsItsEvent) {
     controller_.lock();
     EXPECT_EQ(property("KSTRMTimerRestarted"), timerRestarted(kStart + 100, 1, kStart, 0));
