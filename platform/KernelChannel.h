@@ -36,7 +36,8 @@ class KernelChannel {
     /// Sends `inputSize` bytes to `selector` and stores the reply in `output`, at most
     /// `*outputSize` bytes (0 when `outputSize` is null). On success `*outputSize` becomes the size
     /// that the kernel side reported. A reported size above the offered one gives the status of
-    /// EMSGSIZE, as does an input beyond what the channel can carry.
+    /// EMSGSIZE, as does an input beyond what the channel can carry; a size offered without an
+    /// `output` gives the status of EINVAL, and nothing is sent.
     [[nodiscard]] virtual Status structCall(ConnectionHandle connection, std::uint32_t selector,
                                             const void* input, std::size_t inputSize, void* output,
                                             std::size_t* outputSize) = 0;

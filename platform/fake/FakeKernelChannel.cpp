@@ -41,6 +41,9 @@ Status FakeKernelChannel::structCall(ConnectionHandle connection, std::uint32_t 
         return status;
     }
     const std::size_t offered = outputSize == nullptr ? 0 : *outputSize;
+    if (offered > 0 && output == nullptr) {
+        return statusFromErrno(EINVAL);
+    }
     FakeStructCall call{connection, selector, {}, offered};
     const auto* const bytes = static_cast<const std::uint8_t*>(input);
     call.input.assign(bytes, bytes + inputSize);

@@ -21,6 +21,7 @@ constexpr std::size_t kDigits = 20;
 constexpr std::size_t kLineSize = kDigits + 1;
 constexpr std::string_view kCancelled = "none                \n";
 static_assert(kCancelled.size() == kLineSize);
+constexpr int kWriteFlags = O_WRONLY | O_CLOEXEC | O_NOFOLLOW;
 constexpr mode_t kFileMode = 0600;
 constexpr mode_t kDirectoryMode = 0700;
 constexpr std::size_t kMaxNameLength = 200;
@@ -81,6 +82,17 @@ bool writeAt0(int descriptor, std::string_view bytes) {
     return true;
 }
 
+/// Makes the file hold just the line, on permanent storage.
+bool writeLine(int descriptor, std::string_view line) {
+    struct stat status {};
+    if (!writeAt0(descriptor, line) || ::fstat(descriptor, &status) != 0) {
+        return false;
+    }
+    const bool isLonger = status.st_size > static_cast<off_t>(line.size());
+    return (!isLonger || ::ftruncate(descriptor, static_cast<off_t>(line.size())) == 0) &&
+           ::fdatasync(descriptor) == 0;
+}
+
 bool syncDirectory(const std::string& path) {
     const FileDescriptor directory(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     return directory.isOpen() && ::fsync(directory.get()) == 0;
@@ -88,6 +100,17 @@ bool syncDirectory(const std::string& path) {
 
 std::string parentOf(const std::string& path) {
     return std::filesystem::path(path).parent_path().string();
+}
+
+/// Fails with ENOENT when there is no such file.
+bool overwrite(const std::string& path, std::string_view line) {
+    const FileDescriptor file(::open(path.c_str(), kWriteFlags));
+    return file.isOpen() && writeLine(file.get(), line);
+}
+
+bool make(const std::string& path, std::string_view line) {
+    const FileDescriptor file(::open(path.c_str(), kWriteFlags | O_CREAT, kFileMode));
+    return file.isOpen() && writeLine(file.get(), line) && syncDirectory(parentOf(path));
 }
 
 } // namespace
@@ -111,16 +134,20 @@ std::vector<std::pair<std::string, Date>> AlarmStore::load(std::string_view stre
     return alarms;
 }
 
-void AlarmStore::save(std::string_view stream, std::string_view event, Date date) {
+bool AlarmStore::save(std::string_view stream, std::string_view event, Date date) {
     if (!isFileName(stream) || !isFileName(event)) {
         report("alarm whose name cannot be kept on disk", event, 0);
-        return;
+        return false;
     }
     const std::string directory = base::concat(directory_, '/', stream);
     const std::string path = base::concat(directory, '/', event);
-    if (!makeDirectory(directory) || !write(path, lineFor(date))) {
-        report("cannot keep the alarm on disk", path, errno);
+    const std::string line = lineFor(date);
+    if (overwrite(path, line) ||
+        (errno == ENOENT && makeDirectory(directory) && make(path, line))) {
+        return true;
     }
+    report("cannot keep the alarm on disk", path, errno);
+    return false;
 }
 
 void AlarmStore::clear(std::string_view stream, std::string_view event) {
@@ -128,7 +155,7 @@ void AlarmStore::clear(std::string_view stream, std::string_view event) {
         return;
     }
     const std::string path = base::concat(directory_, '/', stream, '/', event);
-    const FileDescriptor file(::open(path.c_str(), O_WRONLY | O_CLOEXEC | O_NOFOLLOW));
+    const FileDescriptor file(::open(path.c_str(), kWriteFlags));
     if (!file.isOpen() && errno == ENOENT) {
         return;
     }
@@ -147,24 +174,6 @@ bool AlarmStore::makeDirectory(const std::string& path) {
     }
     return errno == ENOENT && path.size() > 1 && makeDirectory(parentOf(path)) &&
            ::mkdir(path.c_str(), kDirectoryMode) == 0 && syncDirectory(parentOf(path));
-}
-
-bool AlarmStore::write(const std::string& path, std::string_view line) {
-    const int flags = O_WRONLY | O_CLOEXEC | O_NOFOLLOW;
-    FileDescriptor file(::open(path.c_str(), flags));
-    const bool isNew = !file.isOpen() && errno == ENOENT;
-    if (isNew) {
-        file = FileDescriptor(::open(path.c_str(), flags | O_CREAT, kFileMode));
-    }
-    struct stat status {};
-    if (!file.isOpen() || !writeAt0(file.get(), line) || ::fstat(file.get(), &status) != 0) {
-        return false;
-    }
-    if (status.st_size != static_cast<off_t>(kLineSize) &&
-        ::ftruncate(file.get(), kLineSize) != 0) {
-        return false;
-    }
-    return ::fdatasync(file.get()) == 0 && (!isNew || syncDirectory(parentOf(path)));
 }
 
 void AlarmStore::report(std::string_view what, std::string_view path, int error) const {

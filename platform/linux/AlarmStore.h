@@ -24,9 +24,9 @@ class AlarmStore {
     /// The registered alarms of a stream: event names and dates.
     [[nodiscard]] std::vector<std::pair<std::string, Date>> load(std::string_view stream) const;
 
-    /// Puts the registration on disk before it returns. Makes the directories. A failure is logged:
-    /// the alarm then lasts as long as the process.
-    void save(std::string_view stream, std::string_view event, Date date);
+    /// Puts the registration on disk before it returns, and makes the directories. False, and a
+    /// line in the log, when that failed: the alarm then lasts as long as the process.
+    bool save(std::string_view stream, std::string_view event, Date date);
 
     /// Takes the registration away. Not synced: an alarm that comes back after a power cut fires
     /// once too often, which does no harm.
@@ -34,7 +34,6 @@ class AlarmStore {
 
   private:
     [[nodiscard]] static bool makeDirectory(const std::string& path);
-    [[nodiscard]] static bool write(const std::string& path, std::string_view line);
     void report(std::string_view what, std::string_view path, int error) const;
 
     std::string directory_;

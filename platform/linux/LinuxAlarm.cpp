@@ -37,8 +37,11 @@ void LinuxAlarm::set(std::string_view stream, std::string_view event,
     const Name name(stream, event);
     events_.drop(stream, event);
     if (const std::optional<Date> date = dateIn(dictionary)) {
-        store_.save(stream, event, *date);
-        registrations_.insert_or_assign(name, Registration{*date});
+        const auto found = registrations_.find(name);
+        const bool isKept =
+            found != registrations_.end() && found->second.kept && found->second.date == *date;
+        registrations_.insert_or_assign(
+            name, Registration{*date, isKept || store_.save(stream, event, *date)});
         fireDue();
     } else {
         cancel(name);
@@ -76,7 +79,7 @@ void LinuxAlarm::close() {
 
 void LinuxAlarm::restore(std::string_view stream) {
     for (auto& [event, date] : store_.load(stream)) {
-        registrations_.try_emplace(Name(stream, event), Registration{date});
+        registrations_.try_emplace(Name(stream, event), Registration{date, true});
     }
     fireDue();
     armForNext();
@@ -137,7 +140,7 @@ void LinuxAlarm::armForNext() {
         if (!armed_) {
             armed_.emplace(transactions_, kArmedLabel);
         }
-    } else {
+    } else if (armed_) {
         timer_.disarm();
         armed_.reset();
     }

@@ -44,6 +44,8 @@ class LinuxAlarm final : public AlarmEvent {
     using Name = std::pair<std::string, std::string>;
     struct Registration {
         Date date;
+        /// Whether this very date is on disk.
+        bool kept = false;
         bool fired = false;
     };
     using Registrations = std::map<Name, Registration>;

@@ -39,13 +39,13 @@ struct Opened {
 
 Opened openOrMake(const std::string& path, mode_t mode) {
     for (int attempt = 0; attempt < kOpenAttempts; ++attempt) {
-        FileDescriptor made = makeFile(path, mode);
-        if (made.isOpen() || errno != EEXIST) {
-            return {std::move(made), true};
-        }
         FileDescriptor existing(::open(path.c_str(), kOpenFlags));
         if (existing.isOpen() || errno != ENOENT) {
             return {std::move(existing), false};
+        }
+        FileDescriptor made = makeFile(path, mode);
+        if (made.isOpen() || errno != EEXIST) {
+            return {std::move(made), true};
         }
     }
     return {};

@@ -17,6 +17,7 @@
 #include <systemd/sd-daemon.h>
 
 #include <string>
+#include <string_view>
 #include <utility>
 
 namespace platform {
@@ -33,7 +34,7 @@ struct LinuxHost::Parts {
           events(runLoop, log),
           alarm(events, runLoop, AlarmStore(options.paths.alarmDirectory(), log), transactions) {
         settingsWatch.emplace(options.paths.managedSettings(), runLoop, log, [this] {
-            events.post({wire::kNotifydMatchingStream, kSettingsChangedEvent});
+            post(wire::kNotifydMatchingStream, kSettingsChangedEvent);
         });
         if (options.eventSocket.isOpen()) {
             eventSocket = std::make_unique<EventSocket>(
@@ -50,12 +51,16 @@ struct LinuxHost::Parts {
         }
     }
 
-    void arrived(const wire::EventDatagram& event) {
+    void post(std::string_view stream, std::string_view name) {
         if (idleExit) {
             idleExit->touch();
         }
+        events.post({std::string(stream), std::string(name)});
+    }
+
+    void arrived(const wire::EventDatagram& event) {
         if (event.stream != wire::kAlarmStream) {
-            events.post({std::string(event.stream), std::string(event.name)});
+            post(event.stream, event.name);
         } else if (!alarm.arrived(event.stream, event.name, event.payload)) {
             log.write(
                 LogLevel::warning,

@@ -58,6 +58,9 @@ Status LinuxKernelChannel::structCall(ConnectionHandle connection, std::uint32_t
         return statusFromErrno(EBADF);
     }
     const std::size_t offered = outputSize == nullptr ? 0 : *outputSize;
+    if (offered > 0 && output == nullptr) {
+        return statusFromErrno(EINVAL);
+    }
     const auto prefix =
         wire::encodeKernelStructPrefix(selector, base::saturate<std::uint32_t>(offered));
     KernelSocketConnection::Reply reply;

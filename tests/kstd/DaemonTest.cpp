@@ -1,5 +1,6 @@
 #include "kstd/Daemon.h"
 
+#include "platform/EventStream.h"
 #include "tests/kstd/DaemonFixture.h"
 
 #include <gmock/gmock.h>
@@ -54,6 +55,13 @@ class DaemonTest : public DaemonFixture {
         return Daemon(fake.host(), std::move(services)).run();
     }
 
+    /// The fake host with other event streams.
+    platform::Host hostWith(platform::EventStream& events) {
+        const platform::Host host = fake.host();
+        return {host.log,          host.registry, host.channel,  events,    host.alarms,
+                host.transactions, host.runLoop,  host.settings, host.files};
+    }
+
     std::vector<std::string> diary;
 };
 
@@ -102,6 +110,37 @@ TEST_F(DaemonTest, EventQueuedBeforeTheStartIsDeliveredOnceTheRunLoopRuns) {
                             "only event early after <kstd: main_block_invoke: Wisp Event: early "
                             "(notifyd).>",
                             "only stop after <kstd: main: Stoping service - only.>"));
+}
+
+/// Writes down who subscribes.
+class SubscriptionDiary final : public platform::EventStream {
+  public:
+    explicit SubscriptionDiary(std::vector<std::string>& diary) : diary_(diary) {}
+    void setHandler(std::string_view stream, Handler /*handler*/) override {
+        diary_.push_back("subscribe " + std::string(stream));
+    }
+
+  private:
+    std::vector<std::string>& diary_;
+};
+
+TEST_F(DaemonTest, AllServicesAreStartedBeforeTheFirstStreamIsSubscribed) {
+    SubscriptionDiary events(diary);
+    const platform::Host host = hostWith(events);
+    fake.events.closeSources();
+    EXPECT_EQ(Daemon(host, {witness("first"), witness("second")}).run(), 0);
+    EXPECT_THAT(diary,
+                ElementsAre(testing::StartsWith("first start"), testing::StartsWith("second start"),
+                            "subscribe com.zerva.notifyd.matching",
+                            "subscribe com.zerva.corvid.matching",
+                            testing::StartsWith("first stop"), testing::StartsWith("second stop")));
+}
+
+TEST_F(DaemonTest, TheAlarmStreamIsSubscribedWhenTheListIsMade) {
+    SubscriptionDiary events(diary);
+    const platform::Host host = hostWith(events);
+    const auto services = makeServices(host);
+    EXPECT_THAT(diary, ElementsAre("subscribe com.zerva.alarm"));
 }
 
 TEST_F(DaemonTest, ATransactionIsHeldWhileAnEventOfEitherStreamIsHandled) {

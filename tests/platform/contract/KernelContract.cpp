@@ -267,6 +267,14 @@ TEST_P(KernelContract, ReplyWhereNoneWasOfferedIsRefused) {
               statusFromErrno(EMSGSIZE));
 }
 
+TEST_P(KernelContract, SizeOfferedWithoutABufferIsRefusedBeforeAnythingIsSent) {
+    const ConnectionHandle connection = connect();
+    std::size_t size = 1;
+    EXPECT_EQ(channel().structCall(connection, 0, "x", 1, nullptr, &size), statusFromErrno(EINVAL));
+    EXPECT_EQ(size, 1U);
+    EXPECT_TRUE(fixture().structCalls().empty());
+}
+
 TEST_P(KernelContract, StatusOfTheKernelSideIsPassedOnUnchanged) {
     const ConnectionHandle connection = connect();
     for (const Status status : {-6005, 1, 0x7fffffff, -0x7fffffff - 1, -3, -1001}) {

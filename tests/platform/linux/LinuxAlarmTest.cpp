@@ -7,6 +7,8 @@
 
 #include <gmock/gmock.h>
 
+#include <filesystem>
+#include <fstream>
 #include <memory>
 #include <string>
 #include <time.h>
@@ -193,6 +195,34 @@ TEST_F(LinuxAlarmTest, ArrivedAlarmWithoutADateIsMalformed) {
     EXPECT_FALSE(process->alarm.arrived("stream", "a", std::vector<std::uint8_t>(7)));
     EXPECT_FALSE(process->alarm.arrived("stream", "a", longer));
     EXPECT_FALSE(process->events.busy());
+}
+
+TEST_F(LinuxAlarmTest, RegistrationThatIsOnDiskIsNotWrittenAgain) {
+    process->set("a", kFarAway);
+    const std::string file = path + "/stream/a";
+    std::filesystem::remove(file);
+    process->set("a", kFarAway);
+    EXPECT_FALSE(std::filesystem::exists(file));
+    process->set("a", kFarAway + 1);
+    EXPECT_THAT(registered(), ElementsAre(Pair("a", Date{kFarAway + 1})));
+}
+
+TEST_F(LinuxAlarmTest, RegistrationThatCouldNotBeKeptIsTriedAgain) {
+    std::ofstream(path) << "a file in the directory's place";
+    process->set("a", kFarAway);
+    EXPECT_EQ(process->log.texts().size(), 1U);
+    std::filesystem::remove(path);
+    process->set("a", kFarAway);
+    EXPECT_THAT(registered(), ElementsAre(Pair("a", Date{kFarAway})));
+}
+
+TEST_F(LinuxAlarmTest, FiredAlarmIsRegisteredAnewAtTheSameDate) {
+    process->set("a", 1);
+    EXPECT_TRUE(process->loop.runOnce(kDistantFuture));
+    process->set("a", 1);
+    EXPECT_THAT(registered(), ElementsAre(Pair("a", Date{1})));
+    EXPECT_TRUE(process->loop.runOnce(kDistantFuture));
+    EXPECT_THAT(process->delivered, ElementsAre("a", "a"));
 }
 
 TEST_F(LinuxAlarmTest, AfterCloseRegistrationsAreStillKept) {
