@@ -1,0 +1,245 @@
+// A timer notification from its event to its acknowledgement, through the daemon's own code on the
+// Linux host, against a bare write, sync and round trip.
+
+#include "KSTLib/Platform.h"
+#include "base/ByteWriter.h"
+#include "base/Concat.h"
+#include "bench/support/BareFile.h"
+#include "bench/support/Benchmark.h"
+#include "bench/support/Comparison.h"
+#include "bench/support/HostWith.h"
+#include "bench/support/Peer.h"
+#include "bench/support/PrivateRoot.h"
+#include "bench/support/Quiet.h"
+#include "bench/support/SystemError.h"
+#include "kstd/Daemon.h"
+#include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
+#include "platform/MainRunLoop.h"
+#include "platform/linux/EventSocket.h"
+#include "platform/linux/LinuxHost.h"
+#include "platform/linux/UnixAddress.h"
+#include "wire/EventDatagram.h"
+#include "wire/RestrictedMode.h"
+
+#include <functional>
+#include <memory>
+#include <stdexcept>
+#include <string>
+#include <sys/socket.h>
+#include <utility>
+
+namespace {
+
+constexpr int kDefaultRounds = 1000;
+constexpr double kTarget = 1.25;
+
+/// In the year 2100: armed, and never due.
+constexpr std::uint64_t kFarAlarm = 4102444800;
+
+/// What the records of a series ask for.
+struct Alarm {
+    const char* name;
+    std::uint64_t timestamp;
+    bool changes;
+};
+
+constexpr Alarm kAlarms[] = {
+    {"none", 0, false}, {"unchanged", kFarAlarm, false}, {"changed", kFarAlarm, true}};
+
+bench::PeerScript scriptFor(const Alarm& alarm) {
+    using wire::KernelOperation;
+    bench::Bytes record(wire::rm::kNotificationSize);
+    base::ByteWriter writer(record);
+    if (!writer.writeU32(wire::rm::kKSTRMNotificationTimerRestarted) ||
+        !writer.writeU64(alarm.timestamp)) {
+        throw std::logic_error("a record has no room for its fields");
+    }
+    bench::PeerScript script = bench::basicScript();
+    script.replies[KernelOperation::copyProperty] =
+        bench::preparedReply(KernelOperation::copyProperty, 1, record);
+    script.replies[KernelOperation::structCall] =
+        bench::preparedReply(KernelOperation::structCall, 0, {});
+    if (alarm.changes) {
+        script.growingNumber = wire::kKernelReplyHeaderSize + wire::rm::kAlarmTimestampOffset;
+    }
+    return script;
+}
+
+/// Stands behind the daemon's service and so sees an event when that has handled it.
+class Handled final : public kstd::KSTService {
+  public:
+    explicit Handled(const platform::Host& host) : KSTService(host) {}
+
+    void handleWispEventWithName(std::string_view /*eventName*/) override { ++count_; }
+    [[nodiscard]] std::string description() const override { return "<Handled>"; }
+
+    [[nodiscard]] std::uint64_t count() const { return count_; }
+
+  private:
+    std::uint64_t count_ = 0;
+};
+
+/// The daemon's run loop, which runs a measurement in place of its turns and then has no source
+/// left; the measurement turns the real loop.
+class MeasuringLoop final : public platform::MainRunLoop {
+  public:
+    explicit MeasuringLoop(std::function<void()> measurement)
+        : measurement_(std::move(measurement)) {}
+
+    [[nodiscard]] bool runOnce(platform::Date /*deadline*/) override {
+        measurement_();
+        return false;
+    }
+
+  private:
+    std::function<void()> measurement_;
+};
+
+/// Sends the event of a timer notification, as the kernel side does.
+class EventSender {
+  public:
+    explicit EventSender(const std::string& path)
+        : socket_(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)),
+          datagram_(wire::encodeEvent(wire::kNotifydMatchingStream,
+                                      base::concat(wire::rm::kNotificationNamePrefix,
+                                                   wire::rm::kTimerRestartedProperty))
+                        .value()) {
+        const auto address = platform::unixAddress(path);
+        if (!address || ::connect(socket_.get(), reinterpret_cast<const sockaddr*>(&*address),
+                                  sizeof *address) != 0) {
+            throw bench::systemError("cannot connect to " + path);
+        }
+    }
+
+    void send() {
+        if (::send(socket_.get(), datagram_.data(), datagram_.size(), MSG_NOSIGNAL) < 0) {
+            throw bench::systemError("cannot send the event");
+        }
+    }
+
+  private:
+    platform::FileDescriptor socket_;
+    bench::Bytes datagram_;
+};
+
+/// One series: a daemon with a peer of its own, under a root of its own.
+class Series {
+  public:
+    Series(const std::filesystem::path& root, const Alarm& alarm, platform::SystemLog* otherLog)
+        : paths_(bench::makePrivateRoot(root)),
+          peer_(paths_.kernelSocket(), scriptFor(alarm)),
+          linuxHost_(
+              {.paths = paths_, .eventSocket = platform::makeEventSocket(paths_.eventSocket())}),
+          loop_([this] { measure(); }),
+          host_(bench::hostWith(linuxHost_.interfaces(),
+                                otherLog != nullptr ? *otherLog : linuxHost_.interfaces().log,
+                                loop_)),
+          handled_(std::make_shared<Handled>(host_)),
+          sender_(paths_.eventSocket()) {}
+
+    /// The times of a bare save and acknowledgement, of the same with a second save, and of the
+    /// daemon's.
+    [[nodiscard]] bench::Measured run(int rounds) {
+        rounds_ = rounds;
+        kst::installPlatform({host_.log, host_.registry, host_.channel});
+        const int status =
+            kstd::Daemon(host_, {kstd::DeviceRestrictedModeService::make(host_), handled_}).run();
+        kst::removePlatform();
+        if (status != 0) {
+            throw std::runtime_error("the daemon failed");
+        }
+        return std::move(measured_);
+    }
+
+  private:
+    void notify() {
+        const std::uint64_t before = handled_->count();
+        sender_.send();
+        while (handled_->count() == before) {
+            if (!linuxHost_.interfaces().runLoop.runOnce(platform::kDistantFuture)) {
+                throw std::runtime_error("the run loop ended");
+            }
+        }
+    }
+
+    [[nodiscard]] bench::BareFile bareState(const char* path) const {
+        return {paths_.under(path), wire::rm::kStateBlobSize, bench::BareFile::Sync::dataAndTimes};
+    }
+
+    void measure() {
+        notify();
+        bench::BareExchange bare(paths_.kernelSocket(), peer_.lastRequest());
+        // Each has files of its own: one that is written twice in a round is synced faster the
+        // second time.
+        bench::BareFile state = bareState("/var/root/bare-state");
+        bench::BareFile secondState = bareState("/var/root/bare-second-state");
+        bench::BareFile alarm(paths_.under("/var/root/bare-alarm"), kAlarmFileSize,
+                              bench::BareFile::Sync::data);
+        const std::uint64_t before = peer_.structCalls();
+        const std::uint64_t handledBefore = handled_->count();
+        measured_ = bench::interleave(rounds_, 1,
+                                      {[&] {
+                                           state.save();
+                                           bare.roundTrip();
+                                       },
+                                       [&] {
+                                           secondState.save();
+                                           alarm.save();
+                                           bare.roundTrip();
+                                       },
+                                       [this] {
+                                           notify();
+                                       }});
+        const std::uint64_t handled = handled_->count() - handledBefore;
+        if (peer_.structCalls() - before != handled + bare.roundTrips()) {
+            throw std::runtime_error("not every notification was acknowledged");
+        }
+    }
+
+    /// What the host keeps of an alarm on disk.
+    static constexpr std::size_t kAlarmFileSize = 21;
+
+    platform::Paths paths_;
+    bench::Peer peer_;
+    platform::LinuxHost linuxHost_;
+    MeasuringLoop loop_;
+    platform::Host host_;
+    std::shared_ptr<Handled> handled_;
+    EventSender sender_;
+    int rounds_ = 0;
+    bench::Measured measured_;
+};
+
+void measureAll(const bench::Options& options, const std::filesystem::path& directory) {
+    const bench::QuietStandardError quiet;
+    bench::printHead(base::concat("Event to acknowledgement against a bare save and round trip, ",
+                                  options.rounds, " rounds, ",
+                                  options.pinned ? "one CPU" : "any CPU"));
+    bench::NullLog noLog;
+    int number = 0;
+    const auto series = [&](const char* prefix, const Alarm& alarm, platform::SystemLog* otherLog) {
+        const auto root = directory / base::concat(++number);
+        const auto measured = Series(root, alarm, otherLog).run(options.rounds);
+        const std::string name = base::concat(prefix, "alarm ", alarm.name);
+        bench::printRow(name, bench::compare(measured, 0, 2), kTarget);
+        if (alarm.timestamp != 0) {
+            bench::printRow(base::concat(name, ", floor with two saves"),
+                            bench::compare(measured, 1, 2), kTarget);
+        }
+    };
+    for (const Alarm& alarm : kAlarms) {
+        series("", alarm, nullptr);
+    }
+    for (const Alarm& alarm : kAlarms) {
+        series("no log, ", alarm, &noLog);
+    }
+}
+
+} // namespace
+
+int main(int argc, char** argv) {
+    return bench::runBenchmark(
+        argc, argv,
+        "The cost of a notification over that of its durable write and its acknowledgement.",
+        kDefaultRounds, measureAll);
+}

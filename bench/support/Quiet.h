@@ -1,0 +1,37 @@
+#pragma once
+
+#include "bench/support/SystemError.h"
+#include "platform/SystemLog.h"
+#include "platform/linux/FileDescriptor.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+namespace bench {
+
+/// Drops every line.
+class NullLog final : public platform::SystemLog {
+  public:
+    void write(platform::LogLevel /*level*/, std::string_view /*text*/,
+               const platform::CodePlace& /*place*/) override {}
+};
+
+/// Sends standard error to /dev/null until the end of the scope, so that the daemon's own log does
+/// all its work and nobody has to read it.
+class QuietStandardError {
+  public:
+    QuietStandardError() : saved_(::fcntl(STDERR_FILENO, F_DUPFD_CLOEXEC, 0)) {
+        const platform::FileDescriptor nowhere(::open("/dev/null", O_WRONLY | O_CLOEXEC));
+        if (!saved_.isOpen() || !nowhere.isOpen() || ::dup2(nowhere.get(), STDERR_FILENO) < 0) {
+            throw systemError("cannot send standard error to /dev/null");
+        }
+    }
+    QuietStandardError(const QuietStandardError&) = delete;
+    QuietStandardError& operator=(const QuietStandardError&) = delete;
+    ~QuietStandardError() { ::dup2(saved_.get(), STDERR_FILENO); }
+
+  private:
+    platform::FileDescriptor saved_;
+};
+
+} // namespace bench
