@@ -158,6 +158,28 @@ TEST_F(RunSequenceTest, KernelAbsentAtTheStartAndPresentLater) {
     EXPECT_EQ(file(kAnalyticsFile), analytics(0x60));
 }
 
+TEST_F(RunSequenceTest, ModelOfTheTimerDrivesTheDaemonByItself) {
+    startKernel({"--clock", "1700000000", "--period", "3600"});
+    const auto daemon = startDaemon();
+    kernel("lock");
+    kernel("wait acks=1");
+    ASSERT_TRUE(daemon->awaitLine("scheduleAlarm:]: called, timestamp=1700003600."));
+    // Restricted mode begins: the alarm is no longer wanted, and the figures are saved.
+    kernel("clock advance 3600");
+    kernel("wait acks=3");
+    EXPECT_EQ(kernelStatus("restricted"), "on");
+    EXPECT_EQ(file(kStateFile),
+              (std::vector<std::uint8_t>{1, 0, 0, 0, 0x00, 0xf1, 0x53, 0x65, 0, 0, 0, 0, 1}));
+    EXPECT_TRUE(file(kAnalyticsFile));
+    kernel("clock advance 60");
+    kernel("unlock");
+    ASSERT_TRUE(daemon->awaitLine("SENDING ACK KSTRMTimerRestartedAnalyticsCollected."));
+    // Forbidding the policy reaches the model as request 5.
+    putSettings("restricted-mode-allowed = no\n");
+    kernel("wait control=5 count=1");
+    EXPECT_EQ(kernelStatus("allowed"), "off");
+}
+
 TEST_F(RunSequenceTest, KernelRestartedWhileTheDaemonRuns) {
     startKernel();
     const auto daemon = startDaemon();

@@ -35,8 +35,9 @@ class SystemFixture : public testing::Test {
   protected:
     SystemFixture();
 
-    /// Starts the kernel side and connects to its control socket.
-    void startKernel(const std::vector<std::string>& options = {});
+    /// Starts the kernel side and connects to its control socket. It publishes nothing but what a
+    /// test asks for, unless the options say otherwise.
+    void startKernel(const std::vector<std::string>& options = {"--quiet"});
     void stopKernel();
 
     /// Sends a command to the kernel side, which must succeed; its lines are returned.

@@ -170,7 +170,8 @@ TEST_F(NotificationsTest, EmptyNameIsAcknowledgedWithZeros) {
 }
 
 TEST_F(NotificationsTest, NameMayBeCutInsideACharacter) {
-    const std::string name = std::string(63, 'n') + "\xc3\xa4";
+    std::string name(63, 'n');
+    name += "\xc3\xa4";
     EXPECT_EQ(service->sendNotificationACKWithPropertyName(name), 0);
     EXPECT_EQ(requests().front().payload.back(), 0xc3);
 }

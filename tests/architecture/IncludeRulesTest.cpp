@@ -1,0 +1,107 @@
+// Which room may include which.
+
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <fstream>
+#include <map>
+#include <set>
+#include <string>
+#include <vector>
+
+namespace {
+
+namespace fs = std::filesystem;
+
+/// Rooms by their folder; a folder inside a room may be one of its own.
+const std::vector<std::string> kRooms = {
+    "platform/shared", "platform/linux", "platform/fake", "platform",      "base",  "wire",
+    "common",          "KSTLib",         "kstd",          "keystrand-sim", "tools", "bench"};
+
+const std::map<std::string, std::set<std::string>> kMayInclude = {
+    {"base", {}},
+    {"wire", {"base"}},
+    {"platform", {"base"}},
+    {"platform/shared", {"platform", "base"}},
+    {"platform/linux", {"platform", "platform/shared", "wire", "base"}},
+    {"platform/fake", {"platform", "platform/shared", "base"}},
+    {"common", {"platform", "base"}},
+    {"KSTLib", {"common", "platform", "base"}},
+    {"kstd", {"KSTLib", "common", "platform", "wire", "base"}},
+    {"keystrand-sim", {"common", "wire", "base"}},
+    {"tools",
+     {"kstd", "KSTLib", "common", "platform", "platform/linux", "keystrand-sim", "wire", "base"}},
+    {"bench", {"kstd", "KSTLib", "common", "platform", "platform/linux", "wire", "base"}},
+};
+
+/// What a single file may include beyond its room.
+const std::map<std::string, std::set<std::string>> kMayIncludeToo = {
+    {"kstd/main.cpp", {"platform/linux"}},
+};
+
+std::string roomOf(const std::string& path) {
+    for (const std::string& room : kRooms) {
+        if (path.rfind(room + "/", 0) == 0) {
+            return room;
+        }
+    }
+    return "";
+}
+
+struct Include {
+    std::string file;
+    std::string target;
+};
+
+/// Every include of one of our own headers, as it is written.
+std::vector<Include> includesOfTree() {
+    std::vector<Include> includes;
+    for (const std::string& room : kRooms) {
+        for (const auto& entry : fs::recursive_directory_iterator(fs::path(SOURCE_ROOT) / room)) {
+            const std::string file = fs::relative(entry.path(), SOURCE_ROOT).string();
+            if (!entry.is_regular_file() || roomOf(file) != room) {
+                continue;
+            }
+            std::ifstream stream(entry.path());
+            for (std::string line; std::getline(stream, line);) {
+                if (line.rfind("#include \"", 0) == 0) {
+                    includes.push_back({file, line.substr(10, line.rfind('"') - 10)});
+                }
+            }
+        }
+    }
+    return includes;
+}
+
+bool isAllowed(const Include& include) {
+    const std::string from = roomOf(include.file);
+    const std::string to = roomOf(include.target);
+    const auto extra = kMayIncludeToo.find(include.file);
+    return from == to || kMayInclude.at(from).contains(to) ||
+           (extra != kMayIncludeToo.end() && extra->second.contains(to));
+}
+
+TEST(IncludeRulesTest, EveryIncludeIsAllowedByTheHouse) {
+    const auto includes = includesOfTree();
+    EXPECT_GT(includes.size(), 300U);
+    for (const Include& include : includes) {
+        EXPECT_TRUE(isAllowed(include)) << include.file << " includes " << include.target;
+    }
+}
+
+TEST(IncludeRulesTest, EveryIncludeIsWrittenFromTheRootOfTheTree) {
+    for (const Include& include : includesOfTree()) {
+        EXPECT_TRUE(fs::exists(fs::path(SOURCE_ROOT) / include.target))
+            << include.file << " includes " << include.target;
+    }
+}
+
+TEST(IncludeRulesTest, RulesRefuseWhatTheyShould) {
+    EXPECT_FALSE(isAllowed({"kstd/Daemon.cpp", "platform/linux/LinuxHost.h"}));
+    EXPECT_FALSE(isAllowed({"kstd/Daemon.cpp", "platform/fake/FakeHost.h"}));
+    EXPECT_FALSE(isAllowed({"keystrand-sim/main.cpp", "kstd/Daemon.h"}));
+    EXPECT_FALSE(isAllowed({"common/LibCall.cpp", "KSTLib/Channel.h"}));
+    EXPECT_TRUE(isAllowed({"kstd/main.cpp", "platform/linux/LinuxHost.h"}));
+}
+
+} // namespace

@@ -1,0 +1,116 @@
+// Many notifications through one daemon process: nothing grows.
+
+#include "KSTLib/Platform.h"
+#include "common/AllocatedBytes.h"
+#include "kstd/Daemon.h"
+#include "platform/linux/EventSocket.h"
+#include "platform/linux/LinuxHost.h"
+#include "tests/platform/linux/OpenDescriptors.h"
+#include "tests/system/SystemFixture.h"
+
+#include <fcntl.h>
+#include <fstream>
+#include <malloc.h>
+#include <thread>
+#include <unistd.h>
+
+#if defined(__has_feature)
+#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
+#define KSTD_SANITIZED 1
+#endif
+#endif
+
+namespace system_tests {
+namespace {
+
+constexpr int kRounds = KSTD_SOAK_NOTIFICATIONS / 4;
+constexpr int kWarmUpRounds = 100;
+static_assert(kRounds > kWarmUpRounds);
+
+/// What a process must not gather.
+struct Footprint {
+    std::size_t descriptors = support::countOpenDescriptors();
+    std::size_t heap = ::mallinfo2().uordblks;
+    std::size_t residentPages = readResidentPages();
+
+  private:
+    static std::size_t readResidentPages() {
+        std::size_t size = 0;
+        std::size_t resident = 0;
+        std::ifstream("/proc/self/statm") >> size >> resident;
+        return resident;
+    }
+};
+
+/// Sends what is written to standard error nowhere while it lives.
+class QuietStandardError {
+  public:
+    QuietStandardError() : saved_(::dup(STDERR_FILENO)) {
+        const int nowhere = ::open("/dev/null", O_WRONLY | O_CLOEXEC);
+        ::dup2(nowhere, STDERR_FILENO);
+        ::close(nowhere);
+    }
+    QuietStandardError(const QuietStandardError&) = delete;
+    QuietStandardError& operator=(const QuietStandardError&) = delete;
+    ~QuietStandardError() {
+        ::dup2(saved_, STDERR_FILENO);
+        ::close(saved_);
+    }
+
+  private:
+    int saved_;
+};
+
+class SoakTest : public SystemFixture {
+  protected:
+    /// Publishes one record of each type in every round and waits for the acknowledgements.
+    void publish(int firstRound, int lastRound) {
+        for (int round = firstRound; round < lastRound; ++round) {
+            kernel("publish timer-restarted alarm=0 version=" + std::to_string(round));
+            kernel("publish analytics-collected");
+            kernel("publish save-analytics");
+            kernel("publish timer-restarted-analytics total=60");
+            kernel("wait acks=" + std::to_string(4 * (round + 1)));
+        }
+    }
+};
+
+TEST_F(SoakTest, NeitherMemoryNorDescriptorsGrow) {
+    startKernel();
+    const std::int64_t allocatedBefore = gAllocatedBytes;
+    Footprint warm;
+    Footprint end;
+    {
+        const QuietStandardError quiet;
+        const platform::Paths paths(root.path().string());
+        platform::LinuxHost host({.paths = paths,
+                                  .eventSocket = platform::makeEventSocket(paths.eventSocket()),
+                                  .idleTime = std::chrono::milliseconds(500)});
+        const platform::Host interfaces = host.interfaces();
+        kst::installPlatform({interfaces.log, interfaces.registry, interfaces.channel});
+        std::thread kernelSide([&] {
+            publish(0, kWarmUpRounds);
+            warm = Footprint();
+            publish(kWarmUpRounds, kRounds);
+            end = Footprint();
+        });
+        EXPECT_EQ(kstd::Daemon(interfaces, kstd::makeServices(interfaces)).run(), 0);
+        kernelSide.join();
+        kst::removePlatform();
+    }
+    EXPECT_EQ(kernelStatus("acks"), std::to_string(4 * kRounds));
+    EXPECT_EQ(gAllocatedBytes, allocatedBefore);
+    EXPECT_EQ(end.descriptors, warm.descriptors);
+#ifndef KSTD_SANITIZED
+    // A sanitizer keeps freed memory for a while on purpose.
+    EXPECT_LE(end.heap, warm.heap + 4096);
+    EXPECT_LE(end.residentPages, warm.residentPages + 64);
+#endif
+    RecordProperty("notifications", 4 * kRounds);
+    RecordProperty("heapGrowthBytes", static_cast<int>(end.heap) - static_cast<int>(warm.heap));
+    RecordProperty("residentGrowthPages",
+                   static_cast<int>(end.residentPages) - static_cast<int>(warm.residentPages));
+}
+
+} // namespace
+} // namespace system_tests
