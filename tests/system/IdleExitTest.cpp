@@ -49,6 +49,8 @@ TEST_F(IdleExitTest, ArmedAlarmKeepsTheDaemonFromEnding) {
     ASSERT_TRUE(supervisor->awaitLine("Entering the main runloop."));
     kernel("publish timer-restarted alarm=4102444800");
     kernel("wait acks=1");
+    sendEvent("first tick");
+    ASSERT_TRUE(supervisor->awaitLine("Wisp Event: first tick"));
     // Each of these would otherwise meet another process.
     const std::size_t launches = supervisor->count("kstd-supervise: started");
     for (int i = 0; i < 20; ++i) {
