@@ -21,6 +21,9 @@ class LinuxEventStream final : public EventStream {
 
     void setHandler(std::string_view stream, Handler handler) override;
 
+    /// Destroys every handler and what it holds.
+    void clearHandlers() { queue_.clearHandlers(); }
+
     /// Queues an event. One on a stream without a handler is dropped with a log line when its turn
     /// comes.
     void post(Event event);

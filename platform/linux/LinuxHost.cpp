@@ -22,7 +22,7 @@
 
 namespace platform {
 
-/// In the order of construction: what stands below uses what stands above, and goes first.
+/// In the order of construction: what stands below uses what stands above, and goes before it.
 struct LinuxHost::Parts {
     explicit Parts(LinuxHostOptions options)
         : log(options.paths),
@@ -93,7 +93,9 @@ struct LinuxHost::Parts {
 LinuxHost::LinuxHost(LinuxHostOptions options)
     : parts_(std::make_unique<Parts>(std::move(options))) {}
 
-LinuxHost::~LinuxHost() = default;
+LinuxHost::~LinuxHost() {
+    parts_->events.clearHandlers();
+}
 
 void LinuxHost::closeStreams() {
     parts_->closeStreams();

@@ -9,6 +9,11 @@ void EventQueue::setHandler(std::string_view stream, EventStream::Handler handle
     handlers_.insert_or_assign(std::string(stream), std::move(handler));
 }
 
+void EventQueue::clearHandlers() {
+    // Out of the queue first, because what a handler holds may come back here when it goes.
+    const auto handlers = std::exchange(handlers_, {});
+}
+
 void EventQueue::push(Event event) {
     events_.push_back(std::move(event));
 }

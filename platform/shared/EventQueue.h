@@ -15,6 +15,9 @@ class EventQueue {
   public:
     void setHandler(std::string_view stream, EventStream::Handler handler);
 
+    /// Destroys every handler and what it holds.
+    void clearHandlers();
+
     void push(Event event);
 
     /// Drops what is queued for this stream under this name.

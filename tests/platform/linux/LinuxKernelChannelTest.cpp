@@ -282,6 +282,19 @@ TEST_F(LinuxKernelChannelTest, HangUpInsteadOfAnAnswerIsReportedAndTheRequestNot
     EXPECT_EQ(calls, 2);
 }
 
+TEST_F(LinuxKernelChannelTest, ServiceThatHangsUpOnEveryConnectionGivesAPlatformStatus) {
+    serveAnswers([](const Packet& request) { return reply(request, 0, 2, "ok"); });
+    ASSERT_EQ(open(), kSuccess);
+    server.reset();
+    server.emplace(path, [](const SeqpacketServer::Peer&) {});
+    // Whether the hang-up is seen before or after the request was sent is the system's affair.
+    EXPECT_THAT(call(), testing::AnyOf(statusFromErrno(EPIPE), statusFromErrno(ECONNRESET)));
+    expectOutputUntouched();
+    server.reset();
+    serveAnswers([](const Packet& request) { return reply(request, 0, 2, "ok"); });
+    expectNextCallWorks();
+}
+
 TEST_F(LinuxKernelChannelTest, LateAnswerIsNotTakenForTheNextOne) {
     std::atomic<bool> firstSeen = false;
     LinuxKernelChannel impatient(path, registry, log, std::chrono::milliseconds(20));

@@ -1,0 +1,178 @@
+#include "platform/linux/LinuxHost.h"
+
+#include "platform/EventStream.h"
+#include "platform/MainRunLoop.h"
+#include "platform/ProcessTransaction.h"
+#include "platform/linux/EventSocket.h"
+#include "platform/linux/RealTime.h"
+#include "platform/linux/UnixAddress.h"
+#include "tests/platform/linux/RootDirectory.h"
+#include "tests/platform/linux/StandardErrorCapture.h"
+#include "wire/EventDatagram.h"
+
+#include <gmock/gmock.h>
+
+#include <cstdlib>
+#include <fcntl.h>
+#include <memory>
+#include <string>
+#include <sys/socket.h>
+#include <vector>
+
+namespace platform {
+namespace {
+
+using testing::ElementsAre;
+using testing::HasSubstr;
+
+constexpr std::int64_t kFarAway = 4'102'444'800'000'000'000;
+constexpr char kAlarms[] = "com.zerva.alarm";
+
+class LinuxHostTest : public testing::Test {
+  protected:
+    LinuxHostTest() {
+        for (const char* const directory : {"/run/kstd", "/etc/kstd", "/var/lib/kstd"}) {
+            root.makeDirectory(directory);
+        }
+    }
+
+    void start(std::optional<std::chrono::milliseconds> idleTime = std::nullopt) {
+        start(idleTime, makeEventSocket(root.paths().eventSocket()));
+    }
+
+    void start(std::optional<std::chrono::milliseconds> idleTime, FileDescriptor eventSocket) {
+        host = std::make_unique<LinuxHost>(LinuxHostOptions{
+            .paths = root.paths(), .eventSocket = std::move(eventSocket), .idleTime = idleTime});
+        for (const char* const stream : {"com.zerva.notifyd.matching", kAlarms}) {
+            interfaces().events.setHandler(
+                stream, [this](const Event& event) { delivered.push_back(event.name); });
+        }
+    }
+
+    [[nodiscard]] Host interfaces() { return host->interfaces(); }
+
+    void send(std::string_view stream, std::string_view name,
+              const std::vector<std::uint8_t>& payload = {}) {
+        const FileDescriptor sender(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+        const auto datagram = wire::encodeEvent(stream, name, payload).value();
+        const auto address = unixAddress(root.paths().eventSocket()).value();
+        ASSERT_EQ(::sendto(sender.get(), datagram.data(), datagram.size(), 0,
+                           reinterpret_cast<const sockaddr*>(&address), sizeof address),
+                  static_cast<ssize_t>(datagram.size()));
+    }
+
+    void handleAll() {
+        for (int i = 0; i < 10; ++i) {
+            EXPECT_TRUE(interfaces().runLoop.runOnce({0}));
+        }
+    }
+
+    void setAlarm(std::int64_t date) {
+        const EventDictionary dictionary{{kAlarmDateKey, {date}}};
+        interfaces().alarms.set(kAlarms, "alarm", &dictionary);
+    }
+
+    static std::vector<std::uint8_t> dateBytes(std::int64_t date) {
+        std::vector<std::uint8_t> bytes(8);
+        for (std::size_t i = 0; i < bytes.size(); ++i) {
+            bytes[i] = static_cast<std::uint8_t>(static_cast<std::uint64_t>(date) >> (8 * i));
+        }
+        return bytes;
+    }
+
+    support::RootDirectory root;
+    std::vector<std::string> delivered;
+    std::unique_ptr<LinuxHost> host;
+};
+
+TEST_F(LinuxHostTest, IdleHostSaysThatItStopsAndLeavesTheLoopWithoutSources) {
+    const FileDescriptor listener = makeEventSocket(root.real("/run/notify"));
+    ::setenv("NOTIFY_SOCKET", root.real("/run/notify").c_str(), 1);
+    start(std::chrono::milliseconds(1));
+    while (interfaces().runLoop.runOnce(kDistantFuture)) {
+    }
+    ::unsetenv("NOTIFY_SOCKET");
+    char message[64] = {};
+    EXPECT_GT(::recv(listener.get(), message, sizeof message - 1, MSG_DONTWAIT), 0);
+    EXPECT_STREQ(message, "STOPPING=1");
+}
+
+TEST_F(LinuxHostTest, HostWithSomethingInHandDoesNotEnd) {
+    start(std::chrono::milliseconds(1));
+    auto transaction = std::make_unique<ProcessTransaction>(interfaces().transactions, "busy");
+    EXPECT_TRUE(interfaces().runLoop.runOnce({realTimeNow().nanosecondsSince1970 + 10'000'000}));
+    EXPECT_TRUE(interfaces().runLoop.runOnce({0}));
+    transaction.reset();
+    while (interfaces().runLoop.runOnce(kDistantFuture)) {
+    }
+}
+
+TEST_F(LinuxHostTest, EventThatArrivesAfterTheEndStaysInTheSocketForTheNextProcess) {
+    FileDescriptor first = makeEventSocket(root.paths().eventSocket());
+    // The init system's own descriptor of the socket.
+    FileDescriptor kept(::fcntl(first.get(), F_DUPFD_CLOEXEC, 0));
+    start(std::nullopt, std::move(first));
+    host->closeStreams();
+    send("com.zerva.notifyd.matching", "late");
+    EXPECT_FALSE(interfaces().runLoop.runOnce({0}));
+    EXPECT_THAT(delivered, ElementsAre());
+    start(std::nullopt, std::move(kept));
+    handleAll();
+    EXPECT_THAT(delivered, ElementsAre("late"));
+}
+
+TEST_F(LinuxHostTest, AlarmDatagramCountsForThePresentRegistrationOnly) {
+    start();
+    setAlarm(kFarAway);
+    send(kAlarms, "alarm", dateBytes(kFarAway + 1));
+    handleAll();
+    EXPECT_THAT(delivered, ElementsAre());
+    send(kAlarms, "alarm", dateBytes(kFarAway));
+    send("com.zerva.notifyd.matching", "after");
+    for (int i = 0; i < 10 && interfaces().runLoop.runOnce({0}); ++i) {
+    }
+    EXPECT_THAT(delivered, ElementsAre("alarm", "after"));
+}
+
+TEST_F(LinuxHostTest, AlarmDatagramWithoutADateIsDroppedWithALine) {
+    start();
+    setAlarm(kFarAway);
+    const support::StandardErrorCapture standardError;
+    send(kAlarms, "alarm");
+    handleAll();
+    EXPECT_THAT(standardError.text(),
+                HasSubstr("kstd: EventSocket: dropped alarm alarm without a date.\n"));
+    EXPECT_THAT(delivered, ElementsAre());
+}
+
+TEST_F(LinuxHostTest, HostWithoutAnEventSocketSaysSo) {
+    const support::StandardErrorCapture standardError;
+    const LinuxHost lonely({.paths = root.paths()});
+    EXPECT_THAT(
+        standardError.text(),
+        HasSubstr("kstd: EventSocket: no socket was handed over; no events will arrive.\n"));
+}
+
+TEST_F(LinuxHostTest, HandlersAreDestroyedWhileTheInterfacesAreStillThere) {
+    start();
+    struct Witness {
+        Host interfaces;
+        bool& gone;
+        ~Witness() {
+            // What a handler holds may still use the host.
+            interfaces.alarms.set("stream", "alarm", nullptr);
+            interfaces.events.setHandler("other", nullptr);
+            gone = true;
+        }
+    };
+    bool gone = false;
+    std::shared_ptr<Witness> witness(new Witness{interfaces(), gone});
+    interfaces().events.setHandler("stream", [witness](const Event&) {});
+    witness.reset();
+    EXPECT_FALSE(gone);
+    host.reset();
+    EXPECT_TRUE(gone);
+}
+
+} // namespace
+} // namespace platform
