@@ -4,6 +4,7 @@
 #include "KSTLib/Platform.h"
 #include "base/ByteWriter.h"
 #include "base/Concat.h"
+#include "base/UnixAddress.h"
 #include "bench/support/BareFile.h"
 #include "bench/support/Benchmark.h"
 #include "bench/support/Comparison.h"
@@ -17,7 +18,6 @@
 #include "platform/MainRunLoop.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"
-#include "platform/linux/UnixAddress.h"
 #include "wire/EventDatagram.h"
 #include "wire/RestrictedMode.h"
 
@@ -104,9 +104,8 @@ class EventSender {
                                       base::concat(wire::rm::kNotificationNamePrefix,
                                                    wire::rm::kTimerRestartedProperty))
                         .value()) {
-        const auto address = platform::unixAddress(path);
-        if (!address || ::connect(socket_.get(), reinterpret_cast<const sockaddr*>(&*address),
-                                  sizeof *address) != 0) {
+        const auto address = base::UnixAddress::of(path);
+        if (!address || ::connect(socket_.get(), address->get(), address->size()) != 0) {
             throw bench::systemError("cannot connect to " + path);
         }
     }
@@ -118,7 +117,7 @@ class EventSender {
     }
 
   private:
-    platform::FileDescriptor socket_;
+    base::FileDescriptor socket_;
     bench::Bytes datagram_;
 };
 

@@ -1,12 +1,11 @@
 #include "keystrand-sim/Acceptor.h"
 
-#include "keystrand-sim/UnixAddress.h"
-
 #include <cerrno>
 #include <chrono>
 #include <ctime>
 #include <sys/epoll.h>
 #include <sys/socket.h>
+#include <unistd.h>
 #include <utility>
 
 namespace sim {
@@ -17,6 +16,16 @@ constexpr std::chrono::milliseconds kRetryDelay{200};
 
 bool isOutOfRoom(int error) {
     return error == EMFILE || error == ENFILE || error == ENOBUFS || error == ENOMEM;
+}
+
+/// Whether the process at the other end runs as root or as this process's user.
+bool isTrustedPeer(int fd) {
+    ucred peer{};
+    socklen_t length = sizeof peer;
+    if (::getsockopt(fd, SOL_SOCKET, SO_PEERCRED, &peer, &length) != 0) {
+        return false;
+    }
+    return peer.uid == 0 || peer.uid == ::geteuid();
 }
 
 } // namespace
@@ -37,8 +46,9 @@ void Acceptor::resume() {
 }
 
 void Acceptor::accept() {
-    UniqueFd connection(::accept4(socket_.fd(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
-    if (!connection) {
+    base::FileDescriptor connection(
+        ::accept4(socket_.fd(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
+    if (!connection.isOpen()) {
         if (isOutOfRoom(errno)) {
             pause();
             retry_.expireIn(kRetryDelay);

@@ -1,8 +1,8 @@
 #pragma once
 
+#include "base/FileDescriptor.h"
 #include "keystrand-sim/EventLoop.h"
 #include "keystrand-sim/ListeningSocket.h"
-#include "keystrand-sim/UniqueFd.h"
 
 #include <functional>
 
@@ -12,7 +12,7 @@ namespace sim {
 /// closed without a word. While it is paused, connections wait in the socket's queue.
 class Acceptor {
   public:
-    using Handler = std::function<void(UniqueFd connection)>;
+    using Handler = std::function<void(base::FileDescriptor connection)>;
 
     /// The loop outlives it.
     Acceptor(EventLoop& loop, ListeningSocket socket, Handler handler);

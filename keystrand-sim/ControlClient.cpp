@@ -1,14 +1,13 @@
 #include "keystrand-sim/ControlClient.h"
 
 #include "base/Concat.h"
+#include "base/UnixAddress.h"
 
 #include <array>
 #include <cerrno>
-#include <cstring>
 #include <poll.h>
 #include <sys/socket.h>
 #include <sys/time.h>
-#include <sys/un.h>
 #include <unistd.h>
 #include <utility>
 
@@ -18,25 +17,15 @@ namespace {
 
 constexpr int kAttemptDistanceMilliseconds = 10;
 
-std::optional<sockaddr_un> addressOf(const std::string& path) {
-    sockaddr_un address{};
-    if (path.empty() || path.size() >= sizeof address.sun_path) {
-        return std::nullopt;
-    }
-    address.sun_family = AF_UNIX;
-    std::memcpy(address.sun_path, path.c_str(), path.size() + 1);
-    return address;
-}
-
 /// A connected socket with the receive timeout set, or -1.
-int tryConnect(const sockaddr_un& address) {
+int tryConnect(const base::UnixAddress& address) {
     const int fd = ::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
     if (fd < 0) {
         return -1;
     }
     const timeval timeout{.tv_sec = ControlClient::kReceiveTimeout.count(), .tv_usec = 0};
     if (::setsockopt(fd, SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof timeout) == 0 &&
-        ::connect(fd, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0) {
+        ::connect(fd, address.get(), address.size()) == 0) {
         return fd;
     }
     ::close(fd);
@@ -55,7 +44,7 @@ std::optional<std::string> ControlClient::Answer::value(std::string_view key) co
 }
 
 std::optional<ControlClient> ControlClient::connect(const std::string& path, int attempts) {
-    const auto address = addressOf(path);
+    const auto address = base::UnixAddress::of(path);
     for (int attempt = 0; address && attempt < attempts; ++attempt) {
         if (attempt > 0) {
             ::poll(nullptr, 0, kAttemptDistanceMilliseconds);

@@ -12,7 +12,7 @@
 
 namespace sim {
 
-ControlConnection::ControlConnection(EventLoop& loop, UniqueFd fd, Handlers handlers)
+ControlConnection::ControlConnection(EventLoop& loop, base::FileDescriptor fd, Handlers handlers)
     : fd_(std::move(fd)),
       handlers_(std::move(handlers)),
       source_(loop.watch(fd_.get(), EPOLLIN, [this](std::uint32_t events) { onReady(events); })),

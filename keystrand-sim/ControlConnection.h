@@ -1,8 +1,8 @@
 #pragma once
 
+#include "base/FileDescriptor.h"
 #include "keystrand-sim/ControlCommand.h"
 #include "keystrand-sim/EventLoop.h"
-#include "keystrand-sim/UniqueFd.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -27,7 +27,7 @@ class ControlConnection {
     };
 
     /// The loop outlives the connection.
-    ControlConnection(EventLoop& loop, UniqueFd fd, Handlers handlers);
+    ControlConnection(EventLoop& loop, base::FileDescriptor fd, Handlers handlers);
 
     /// False when the loop had no room to watch it; such a connection never ends by itself.
     [[nodiscard]] bool isWatched() const { return source_ && timeout_; }
@@ -48,7 +48,7 @@ class ControlConnection {
     [[nodiscard]] bool sendOutput();
     void endUnless(bool alive) const;
 
-    UniqueFd fd_;
+    base::FileDescriptor fd_;
     Handlers handlers_;
     std::string input_;
     std::string output_;

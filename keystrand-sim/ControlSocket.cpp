@@ -7,11 +7,11 @@ namespace sim {
 ControlSocket::ControlSocket(EventLoop& loop, ListeningSocket socket, const ControlContext& context)
     : loop_(loop),
       context_(context),
-      acceptor_(loop, std::move(socket), [this](UniqueFd fd) { take(std::move(fd)); }) {
+      acceptor_(loop, std::move(socket), [this](base::FileDescriptor fd) { take(std::move(fd)); }) {
     context_.requests.setObserver([this] { checkWaits(); });
 }
 
-void ControlSocket::take(UniqueFd fd) {
+void ControlSocket::take(base::FileDescriptor fd) {
     const std::uint64_t id = ++lastId_;
     auto connection = std::make_unique<ControlConnection>(
         loop_, std::move(fd),

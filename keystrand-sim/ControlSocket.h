@@ -21,7 +21,7 @@ class ControlSocket {
     ControlSocket(EventLoop& loop, ListeningSocket socket, const ControlContext& context);
 
   private:
-    void take(UniqueFd fd);
+    void take(base::FileDescriptor fd);
     void drop(std::uint64_t id);
     void checkWaits();
 

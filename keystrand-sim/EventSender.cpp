@@ -1,6 +1,6 @@
 #include "keystrand-sim/EventSender.h"
 
-#include "keystrand-sim/UnixAddress.h"
+#include "base/UnixAddress.h"
 #include "wire/EventDatagram.h"
 
 #include <cerrno>
@@ -19,10 +19,10 @@ namespace {
 constexpr std::chrono::milliseconds kRetryDelay{200};
 
 /// Connected, because only a connected socket can be waited for until its peer has room.
-UniqueFd connectTo(const std::string& path) {
-    const auto address = UnixAddress::of(path);
-    UniqueFd fd(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
-    if (!address || !fd || ::connect(fd.get(), address->get(), address->length) != 0) {
+base::FileDescriptor connectTo(const std::string& path) {
+    const auto address = base::UnixAddress::of(path);
+    base::FileDescriptor fd(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+    if (!address || !fd.isOpen() || ::connect(fd.get(), address->get(), address->size()) != 0) {
         return {};
     }
     return fd;
@@ -99,14 +99,14 @@ bool EventSender::connectToPresentFile() {
         disconnect();
         return false;
     }
-    if (fd_ && present.st_dev == device_ && present.st_ino == inode_) {
+    if (fd_.isOpen() && present.st_dev == device_ && present.st_ino == inode_) {
         return true;
     }
     disconnect();
-    UniqueFd fd = connectTo(path_);
+    base::FileDescriptor fd = connectTo(path_);
     struct stat connected {};
-    if (!fd || ::stat(path_.c_str(), &connected) != 0 || connected.st_dev != present.st_dev ||
-        connected.st_ino != present.st_ino) {
+    if (!fd.isOpen() || ::stat(path_.c_str(), &connected) != 0 ||
+        connected.st_dev != present.st_dev || connected.st_ino != present.st_ino) {
         return false;
     }
     fd_ = std::move(fd);
@@ -130,7 +130,7 @@ void EventSender::disconnect() {
 /// may have been replaced by another file.
 void EventSender::waitForRoom() {
     waiting_ = true;
-    if (fd_) {
+    if (fd_.isOpen()) {
         writable_.listenFor(EPOLLOUT);
     }
     retry_.expireIn(kRetryDelay);

@@ -1,8 +1,8 @@
 #pragma once
 
+#include "base/FileDescriptor.h"
 #include "keystrand-sim/EventLoop.h"
 #include "keystrand-sim/EventPoster.h"
-#include "keystrand-sim/UniqueFd.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -42,7 +42,7 @@ class EventSender : public EventPoster {
     std::deque<std::vector<std::uint8_t>> queue_;
     std::uint64_t sent_ = 0;
     std::uint64_t refused_ = 0;
-    UniqueFd fd_;
+    base::FileDescriptor fd_;
     dev_t device_ = 0;
     ino_t inode_ = 0;
     EventSource writable_;

@@ -8,8 +8,9 @@
 
 namespace sim {
 
-KernelConnection::KernelConnection(EventLoop& loop, UniqueFd fd, RequestHandler& handler,
-                                   std::span<std::uint8_t> packetBuffer, Ended ended)
+KernelConnection::KernelConnection(EventLoop& loop, base::FileDescriptor fd,
+                                   RequestHandler& handler, std::span<std::uint8_t> packetBuffer,
+                                   Ended ended)
     : fd_(std::move(fd)),
       handler_(handler),
       packetBuffer_(packetBuffer),

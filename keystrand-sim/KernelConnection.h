@@ -1,8 +1,8 @@
 #pragma once
 
+#include "base/FileDescriptor.h"
 #include "keystrand-sim/EventLoop.h"
 #include "keystrand-sim/RequestHandler.h"
-#include "keystrand-sim/UniqueFd.h"
 
 #include <cstdint>
 #include <functional>
@@ -21,7 +21,7 @@ class KernelConnection {
 
     /// `packetBuffer` is scratch space for one packet, one byte larger than the largest that is
     /// allowed; connections may share it. Loop, handler and buffer outlive the connection.
-    KernelConnection(EventLoop& loop, UniqueFd fd, RequestHandler& handler,
+    KernelConnection(EventLoop& loop, base::FileDescriptor fd, RequestHandler& handler,
                      std::span<std::uint8_t> packetBuffer, Ended ended);
 
     /// False when the loop had no room to watch it; such a connection never ends by itself.
@@ -36,7 +36,7 @@ class KernelConnection {
     [[nodiscard]] Alive sendReply();
     void endUnless(Alive alive);
 
-    UniqueFd fd_;
+    base::FileDescriptor fd_;
     RequestHandler& handler_;
     std::span<std::uint8_t> packetBuffer_;
     Ended ended_;

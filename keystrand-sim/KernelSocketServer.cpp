@@ -12,9 +12,10 @@ KernelSocketServer::KernelSocketServer(EventLoop& loop, ListeningSocket socket,
       handler_(handler),
       faults_(faults),
       packetBuffer_(wire::kKernelMessageMaxSize + 1),
-      acceptor_(loop, std::move(socket), [this](UniqueFd fd) { take(std::move(fd)); }) {}
+      acceptor_(loop, std::move(socket), [this](base::FileDescriptor fd) { take(std::move(fd)); }) {
+}
 
-void KernelSocketServer::take(UniqueFd fd) {
+void KernelSocketServer::take(base::FileDescriptor fd) {
     if (faults_.takeRefusal()) {
         return;
     }

@@ -26,7 +26,7 @@ class KernelSocketServer {
     [[nodiscard]] std::size_t connectionCount() const { return connections_.size(); }
 
   private:
-    void take(UniqueFd fd);
+    void take(base::FileDescriptor fd);
     void drop(std::uint64_t id);
 
     EventLoop& loop_;

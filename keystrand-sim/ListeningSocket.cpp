@@ -1,7 +1,7 @@
 #include "keystrand-sim/ListeningSocket.h"
 
 #include "base/Concat.h"
-#include "keystrand-sim/UnixAddress.h"
+#include "base/UnixAddress.h"
 
 #include <cerrno>
 #include <sys/socket.h>
@@ -20,14 +20,15 @@ std::string reason(const std::string& path, const char* what) {
 }
 
 /// Nobody listens when a connection is refused; anything else counts as somebody.
-bool isAbandoned(const UnixAddress& address, int type) {
-    const UniqueFd probe(::socket(AF_UNIX, type | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
-    return probe && ::connect(probe.get(), address.get(), address.length) != 0 &&
+bool isAbandoned(const base::UnixAddress& address, int type) {
+    const base::FileDescriptor probe(::socket(AF_UNIX, type | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+    return probe.isOpen() && ::connect(probe.get(), address.get(), address.size()) != 0 &&
            errno == ECONNREFUSED;
 }
 
 /// Makes the path free for a socket. False with a reason when it is not to be had.
-bool clearPath(const std::string& path, const UnixAddress& address, int type, std::string& error) {
+bool clearPath(const std::string& path, const base::UnixAddress& address, int type,
+               std::string& error) {
     struct stat present {};
     if (::lstat(path.c_str(), &present) != 0) {
         const bool isFree = errno == ENOENT;
@@ -53,7 +54,7 @@ bool clearPath(const std::string& path, const UnixAddress& address, int type, st
 
 std::optional<ListeningSocket> ListeningSocket::open(const std::string& path, int type,
                                                      std::string& error) {
-    const auto address = UnixAddress::of(path);
+    const auto address = base::UnixAddress::of(path);
     if (!address) {
         error = base::concat(path, ": too long for a socket");
         return std::nullopt;
@@ -61,10 +62,10 @@ std::optional<ListeningSocket> ListeningSocket::open(const std::string& path, in
     if (!clearPath(path, *address, type, error)) {
         return std::nullopt;
     }
-    UniqueFd fd(::socket(AF_UNIX, type | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+    base::FileDescriptor fd(::socket(AF_UNIX, type | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
     // The file takes over the mode that the descriptor has when it is bound.
-    if (!fd || ::fchmod(fd.get(), kSocketMode) != 0 ||
-        ::bind(fd.get(), address->get(), address->length) != 0) {
+    if (!fd.isOpen() || ::fchmod(fd.get(), kSocketMode) != 0 ||
+        ::bind(fd.get(), address->get(), address->size()) != 0) {
         error = reason(path, "cannot make the socket");
         return std::nullopt;
     }
@@ -76,12 +77,13 @@ std::optional<ListeningSocket> ListeningSocket::open(const std::string& path, in
     return ListeningSocket(std::move(fd), path, made.st_dev, made.st_ino);
 }
 
-ListeningSocket::ListeningSocket(UniqueFd fd, std::string path, dev_t device, ino_t inode)
+ListeningSocket::ListeningSocket(base::FileDescriptor fd, std::string path, dev_t device,
+                                 ino_t inode)
     : fd_(std::move(fd)), path_(std::move(path)), device_(device), inode_(inode) {}
 
 ListeningSocket::~ListeningSocket() {
     struct stat present {};
-    if (fd_ && ::lstat(path_.c_str(), &present) == 0 && present.st_dev == device_ &&
+    if (fd_.isOpen() && ::lstat(path_.c_str(), &present) == 0 && present.st_dev == device_ &&
         present.st_ino == inode_) {
         ::unlink(path_.c_str());
     }

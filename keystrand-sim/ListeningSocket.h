@@ -1,6 +1,6 @@
 #pragma once
 
-#include "keystrand-sim/UniqueFd.h"
+#include "base/FileDescriptor.h"
 
 #include <optional>
 #include <string>
@@ -26,9 +26,9 @@ class ListeningSocket {
     [[nodiscard]] int fd() const { return fd_.get(); }
 
   private:
-    ListeningSocket(UniqueFd fd, std::string path, dev_t device, ino_t inode);
+    ListeningSocket(base::FileDescriptor fd, std::string path, dev_t device, ino_t inode);
 
-    UniqueFd fd_;
+    base::FileDescriptor fd_;
     std::string path_;
     dev_t device_;
     ino_t inode_;

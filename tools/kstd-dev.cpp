@@ -33,8 +33,8 @@ void makeDirectories(const platform::Paths& paths) {
     std::filesystem::permissions(paths.stateDirectory(), perms::owner_all);
 }
 
-platform::FileDescriptor eventSocket(const platform::Paths& paths) {
-    platform::FileDescriptor activated = platform::takeActivatedEventSocket();
+base::FileDescriptor eventSocket(const platform::Paths& paths) {
+    base::FileDescriptor activated = platform::takeActivatedEventSocket();
     return activated.isOpen() ? std::move(activated)
                               : platform::makeEventSocket(paths.eventSocket());
 }

@@ -89,7 +89,7 @@ bool waitForEnd(pid_t program, int signals, const sigset_t& ending) {
 int supervise(const Options& options) {
     const platform::Paths paths(options.root);
     std::filesystem::create_directories(paths.under("/run/kstd"));
-    const platform::FileDescriptor socket = platform::makeEventSocket(paths.eventSocket());
+    const base::FileDescriptor socket = platform::makeEventSocket(paths.eventSocket());
     if (!socket.isOpen()) {
         std::cerr << "kstd-supervise: cannot make the event socket " << paths.eventSocket() << '\n';
         return 1;
@@ -101,8 +101,8 @@ int supervise(const Options& options) {
     sigset_t all = ending;
     sigaddset(&all, SIGCHLD);
     ::sigprocmask(SIG_BLOCK, &all, nullptr);
-    const platform::FileDescriptor endingSignals(::signalfd(-1, &ending, SFD_CLOEXEC));
-    const platform::FileDescriptor signals(::signalfd(-1, &all, SFD_CLOEXEC));
+    const base::FileDescriptor endingSignals(::signalfd(-1, &ending, SFD_CLOEXEC));
+    const base::FileDescriptor signals(::signalfd(-1, &all, SFD_CLOEXEC));
     std::cout << "kstd-supervise: ready" << std::endl;
 
     bool launch = options.startAtOnce;

@@ -14,8 +14,8 @@ namespace {
 constexpr int kFlags = O_RDWR | O_CLOEXEC;
 constexpr mode_t kMode = 0600;
 
-platform::FileDescriptor openFile(const std::string& path, int flags) {
-    platform::FileDescriptor file(::open(path.c_str(), flags, kMode));
+base::FileDescriptor openFile(const std::string& path, int flags) {
+    base::FileDescriptor file(::open(path.c_str(), flags, kMode));
     if (!file.isOpen()) {
         throw systemError("cannot open " + path);
     }
@@ -37,7 +37,7 @@ void BareFile::save() {
 }
 
 void BareFile::openAndSave() {
-    platform::FileDescriptor file = openFile(path_, kFlags);
+    base::FileDescriptor file = openFile(path_, kFlags);
     saveTo(file.get());
     if (::close(file.release()) != 0) {
         throw systemError("cannot close " + path_);

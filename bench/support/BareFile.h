@@ -1,6 +1,6 @@
 #pragma once
 
-#include "platform/linux/FileDescriptor.h"
+#include "base/FileDescriptor.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -31,7 +31,7 @@ class BareFile {
     std::string path_;
     std::vector<std::uint8_t> record_;
     Sync sync_;
-    platform::FileDescriptor held_;
+    base::FileDescriptor held_;
 };
 
 } // namespace bench

@@ -1,6 +1,6 @@
 #include "bench/support/Comparison.h"
 
-#include "platform/linux/FileDescriptor.h"
+#include "base/FileDescriptor.h"
 
 #include <algorithm>
 #include <array>
@@ -47,7 +47,7 @@ class WaitingTime {
     }
 
   private:
-    platform::FileDescriptor statistics_{::open("/proc/self/schedstat", O_RDONLY | O_CLOEXEC)};
+    base::FileDescriptor statistics_{::open("/proc/self/schedstat", O_RDONLY | O_CLOEXEC)};
 };
 
 struct Sample {

@@ -2,8 +2,8 @@
 
 #include "base/ByteReader.h"
 #include "base/ByteWriter.h"
+#include "base/UnixAddress.h"
 #include "bench/support/SystemError.h"
-#include "platform/linux/UnixAddress.h"
 #include "wire/RestrictedMode.h"
 
 #include <algorithm>
@@ -31,16 +31,16 @@ constexpr int kBacklog = 8;
 constexpr std::size_t kOperationOffset = sizeof wire::kKernelRequestMagic + 1;
 constexpr std::size_t kSequenceOffset = wire::kKernelRequestHeaderSize - sizeof(std::uint64_t);
 
-platform::FileDescriptor seqpacketSocket() {
-    platform::FileDescriptor socket(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
+base::FileDescriptor seqpacketSocket() {
+    base::FileDescriptor socket(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
     if (!socket.isOpen()) {
         throw systemError("cannot make a socket");
     }
     return socket;
 }
 
-sockaddr_un addressOf(const std::string& path) {
-    const auto address = platform::unixAddress(path);
+base::UnixAddress addressOf(const std::string& path) {
+    const auto address = base::UnixAddress::of(path);
     if (!address) {
         throw std::runtime_error("path too long for a socket, choose another --dir: " + path);
     }
@@ -154,9 +154,9 @@ PeerScript basicScript() {
 }
 
 Peer::Peer(const std::string& socketPath, const PeerScript& script) {
-    const platform::FileDescriptor listener = seqpacketSocket();
-    const sockaddr_un address = addressOf(socketPath);
-    if (::bind(listener.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0 ||
+    const base::FileDescriptor listener = seqpacketSocket();
+    const base::UnixAddress address = addressOf(socketPath);
+    if (::bind(listener.get(), address.get(), address.size()) != 0 ||
         ::listen(listener.get(), kBacklog) != 0) {
         throw systemError("cannot listen on " + socketPath);
     }
@@ -194,9 +194,8 @@ Bytes Peer::lastRequest() const {
 
 BareExchange::BareExchange(const std::string& socketPath, Bytes request)
     : socket_(seqpacketSocket()), request_(std::move(request)), reply_(kBufferSize) {
-    const sockaddr_un address = addressOf(socketPath);
-    if (::connect(socket_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) !=
-        0) {
+    const base::UnixAddress address = addressOf(socketPath);
+    if (::connect(socket_.get(), address.get(), address.size()) != 0) {
         throw systemError("cannot connect to " + socketPath);
     }
 }

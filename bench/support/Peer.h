@@ -1,6 +1,6 @@
 #pragma once
 
-#include "platform/linux/FileDescriptor.h"
+#include "base/FileDescriptor.h"
 #include "wire/KernelSocket.h"
 
 #include <cstddef>
@@ -71,7 +71,7 @@ class BareExchange {
     [[nodiscard]] std::size_t replySize() const { return replySize_; }
 
   private:
-    platform::FileDescriptor socket_;
+    base::FileDescriptor socket_;
     Bytes request_;
     Bytes reply_;
     std::size_t replySize_ = 0;

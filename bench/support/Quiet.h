@@ -1,8 +1,8 @@
 #pragma once
 
+#include "base/FileDescriptor.h"
 #include "bench/support/SystemError.h"
 #include "platform/SystemLog.h"
-#include "platform/linux/FileDescriptor.h"
 
 #include <fcntl.h>
 #include <unistd.h>
@@ -21,7 +21,7 @@ class NullLog final : public platform::SystemLog {
 class QuietStandardError {
   public:
     QuietStandardError() : saved_(::fcntl(STDERR_FILENO, F_DUPFD_CLOEXEC, 0)) {
-        const platform::FileDescriptor nowhere(::open("/dev/null", O_WRONLY | O_CLOEXEC));
+        const base::FileDescriptor nowhere(::open("/dev/null", O_WRONLY | O_CLOEXEC));
         if (!saved_.isOpen() || !nowhere.isOpen() || ::dup2(nowhere.get(), STDERR_FILENO) < 0) {
             throw systemError("cannot send standard error to /dev/null");
         }
@@ -31,7 +31,7 @@ class QuietStandardError {
     ~QuietStandardError() { ::dup2(saved_.get(), STDERR_FILENO); }
 
   private:
-    platform::FileDescriptor saved_;
+    base::FileDescriptor saved_;
 };
 
 } // namespace bench

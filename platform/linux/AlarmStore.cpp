@@ -1,7 +1,7 @@
 #include "platform/linux/AlarmStore.h"
 
 #include "base/Concat.h"
-#include "platform/linux/FileDescriptor.h"
+#include "base/FileDescriptor.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -59,7 +59,8 @@ Line parse(std::string_view text) {
 }
 
 std::string readLine(const std::string& path) {
-    const FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+    const base::FileDescriptor file(
+        ::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
     std::string text(kLineSize + 1, '\0');
     const ssize_t length = file.isOpen() ? ::read(file.get(), text.data(), text.size()) : 0;
     text.resize(length > 0 ? static_cast<std::size_t>(length) : 0);
@@ -94,7 +95,7 @@ bool writeLine(int descriptor, std::string_view line) {
 }
 
 bool syncDirectory(const std::string& path) {
-    const FileDescriptor directory(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    const base::FileDescriptor directory(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     return directory.isOpen() && ::fsync(directory.get()) == 0;
 }
 
@@ -104,12 +105,12 @@ std::string parentOf(const std::string& path) {
 
 /// Fails with ENOENT when there is no such file.
 bool overwrite(const std::string& path, std::string_view line) {
-    const FileDescriptor file(::open(path.c_str(), kWriteFlags));
+    const base::FileDescriptor file(::open(path.c_str(), kWriteFlags));
     return file.isOpen() && writeLine(file.get(), line);
 }
 
 bool make(const std::string& path, std::string_view line) {
-    const FileDescriptor file(::open(path.c_str(), kWriteFlags | O_CREAT, kFileMode));
+    const base::FileDescriptor file(::open(path.c_str(), kWriteFlags | O_CREAT, kFileMode));
     return file.isOpen() && writeLine(file.get(), line) && syncDirectory(parentOf(path));
 }
 
@@ -155,7 +156,7 @@ void AlarmStore::clear(std::string_view stream, std::string_view event) {
         return;
     }
     const std::string path = base::concat(directory_, '/', stream, '/', event);
-    const FileDescriptor file(::open(path.c_str(), kWriteFlags));
+    const base::FileDescriptor file(::open(path.c_str(), kWriteFlags));
     if (!file.isOpen() && errno == ENOENT) {
         return;
     }

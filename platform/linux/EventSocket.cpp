@@ -1,7 +1,7 @@
 #include "platform/linux/EventSocket.h"
 
 #include "base/Concat.h"
-#include "platform/linux/UnixAddress.h"
+#include "base/UnixAddress.h"
 
 #include <systemd/sd-daemon.h>
 
@@ -53,7 +53,7 @@ std::optional<uid_t> senderOf(const msghdr& message) {
 
 } // namespace
 
-EventSocket::EventSocket(FileDescriptor socket, LinuxRunLoop& loop, SystemLog& log,
+EventSocket::EventSocket(base::FileDescriptor socket, LinuxRunLoop& loop, SystemLog& log,
                          Receiver receiver)
     : socket_(std::move(socket)),
       log_(log),
@@ -117,12 +117,12 @@ void EventSocket::handOn(const std::uint8_t* data, std::size_t length) {
     receiver_(*event);
 }
 
-FileDescriptor takeActivatedEventSocket() {
+base::FileDescriptor takeActivatedEventSocket() {
     char** names = nullptr;
     const int count = sd_listen_fds_with_names(1, &names);
-    FileDescriptor found;
+    base::FileDescriptor found;
     for (int i = 0; i < count; ++i) {
-        FileDescriptor candidate(SD_LISTEN_FDS_START + i);
+        base::FileDescriptor candidate(SD_LISTEN_FDS_START + i);
         const bool isEvents = std::string_view(names[i]) == kActivationName &&
                               sd_is_socket(candidate.get(), AF_UNIX, SOCK_DGRAM, -1) > 0;
         if (isEvents && !found.isOpen()) {
@@ -134,20 +134,20 @@ FileDescriptor takeActivatedEventSocket() {
     return found;
 }
 
-FileDescriptor makeEventSocket(const std::string& path) {
-    const auto address = unixAddress(path);
-    FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+base::FileDescriptor makeEventSocket(const std::string& path) {
+    const auto address = base::UnixAddress::of(path);
+    base::FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
     if (!address || !socket.isOpen()) {
-        return FileDescriptor();
+        return base::FileDescriptor();
     }
     acceptCredentials(socket.get());
     ::unlink(path.c_str());
     // The mode of the socket's file is that of the descriptor less the umask; the change afterwards
     // makes it exact.
     ::fchmod(socket.get(), kSocketMode);
-    if (::bind(socket.get(), reinterpret_cast<const sockaddr*>(&*address), sizeof *address) != 0 ||
+    if (::bind(socket.get(), address->get(), address->size()) != 0 ||
         ::chmod(path.c_str(), kSocketMode) != 0) {
-        return FileDescriptor();
+        return base::FileDescriptor();
     }
     return socket;
 }

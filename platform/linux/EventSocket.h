@@ -1,7 +1,7 @@
 #pragma once
 
+#include "base/FileDescriptor.h"
 #include "platform/SystemLog.h"
-#include "platform/linux/FileDescriptor.h"
 #include "platform/linux/LinuxRunLoop.h"
 #include "wire/EventDatagram.h"
 
@@ -23,14 +23,14 @@ class EventSocket {
   public:
     using Receiver = std::function<void(const wire::EventDatagram&)>;
 
-    EventSocket(FileDescriptor socket, LinuxRunLoop& loop, SystemLog& log, Receiver receiver);
+    EventSocket(base::FileDescriptor socket, LinuxRunLoop& loop, SystemLog& log, Receiver receiver);
 
   private:
     void receiveOne();
     void handOn(const std::uint8_t* data, std::size_t length);
     [[nodiscard]] bool mayServe(uid_t sender) const;
 
-    FileDescriptor socket_;
+    base::FileDescriptor socket_;
     SystemLog& log_;
     Receiver receiver_;
     uid_t owner_;
@@ -40,10 +40,10 @@ class EventSocket {
 
 /// The event socket that the init system or a supervisor handed to this process under the name
 /// "events", or none.
-[[nodiscard]] FileDescriptor takeActivatedEventSocket();
+[[nodiscard]] base::FileDescriptor takeActivatedEventSocket();
 
 /// A new event socket at `path`, mode 0600, in the place of a file that stands there. For a program
 /// that runs without an init system; what is queued in it is lost with the process.
-[[nodiscard]] FileDescriptor makeEventSocket(const std::string& path);
+[[nodiscard]] base::FileDescriptor makeEventSocket(const std::string& path);
 
 } // namespace platform

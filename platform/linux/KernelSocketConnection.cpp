@@ -1,7 +1,7 @@
 #include "platform/linux/KernelSocketConnection.h"
 
 #include "base/Concat.h"
-#include "platform/linux/UnixAddress.h"
+#include "base/UnixAddress.h"
 
 #include <algorithm>
 #include <array>
@@ -77,11 +77,11 @@ Status KernelSocketConnection::connect() {
 }
 
 Status KernelSocketConnection::openSocket() {
-    const auto address = unixAddress(path_);
+    const auto address = base::UnixAddress::of(path_);
     if (!address) {
         return statusFromErrno(ENAMETOOLONG);
     }
-    FileDescriptor socket(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
+    base::FileDescriptor socket(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
     if (!socket.isOpen()) {
         return statusFromErrno(errno);
     }
@@ -90,8 +90,7 @@ Status KernelSocketConnection::openSocket() {
     ::setsockopt(socket.get(), SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof timeout);
     int result = -1;
     do {
-        result =
-            ::connect(socket.get(), reinterpret_cast<const sockaddr*>(&*address), sizeof *address);
+        result = ::connect(socket.get(), address->get(), address->size());
     } while (result != 0 && errno == EINTR);
     if (result != 0) {
         return statusFromErrno(asTimeout(errno));

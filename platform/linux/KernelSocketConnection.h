@@ -1,8 +1,8 @@
 #pragma once
 
+#include "base/FileDescriptor.h"
 #include "platform/Status.h"
 #include "platform/SystemLog.h"
-#include "platform/linux/FileDescriptor.h"
 #include "wire/KernelSocket.h"
 
 #include <chrono>
@@ -79,7 +79,7 @@ class KernelSocketConnection {
     SystemLog& log_;
     std::chrono::milliseconds timeout_;
     Greeting greeting_;
-    FileDescriptor socket_;
+    base::FileDescriptor socket_;
     std::uint64_t sequence_ = 0;
     std::unique_ptr<std::uint8_t[]> buffer_;
 };

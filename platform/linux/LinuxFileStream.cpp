@@ -9,7 +9,8 @@
 
 namespace platform {
 
-LinuxFileStream::LinuxFileStream(LinuxFiles& files, FileDescriptor descriptor, std::string path)
+LinuxFileStream::LinuxFileStream(LinuxFiles& files, base::FileDescriptor descriptor,
+                                 std::string path)
     : files_(files), descriptor_(std::move(descriptor)), path_(std::move(path)) {}
 
 std::size_t LinuxFileStream::write(const void* data, std::size_t elementSize, std::size_t count) {

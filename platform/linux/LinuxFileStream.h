@@ -1,7 +1,7 @@
 #pragma once
 
+#include "base/FileDescriptor.h"
 #include "platform/Files.h"
-#include "platform/linux/FileDescriptor.h"
 
 #include <string>
 #include <sys/types.h>
@@ -14,7 +14,7 @@ class LinuxFiles;
 /// with the descriptor before.
 class LinuxFileStream final : public FileStream {
   public:
-    LinuxFileStream(LinuxFiles& files, FileDescriptor descriptor, std::string path);
+    LinuxFileStream(LinuxFiles& files, base::FileDescriptor descriptor, std::string path);
 
     [[nodiscard]] std::size_t write(const void* data, std::size_t elementSize,
                                     std::size_t count) override;
@@ -23,7 +23,7 @@ class LinuxFileStream final : public FileStream {
 
   private:
     LinuxFiles& files_;
-    FileDescriptor descriptor_;
+    base::FileDescriptor descriptor_;
     std::string path_;
     off_t position_ = 0;
 };

@@ -1,6 +1,6 @@
 #include "platform/linux/LinuxFiles.h"
 
-#include "platform/linux/FileDescriptor.h"
+#include "base/FileDescriptor.h"
 #include "platform/linux/LinuxFileStream.h"
 #include "platform/linux/RegularFile.h"
 #include "platform/linux/Sync.h"
@@ -22,8 +22,8 @@ constexpr int kOpenAttempts = 8;
 
 /// Makes the file, with exactly the permission bits `mode` whatever the umask is. None when it is
 /// there already (errno EEXIST) or cannot be made.
-FileDescriptor makeFile(const std::string& path, mode_t mode) {
-    FileDescriptor descriptor(::open(path.c_str(), kOpenFlags | O_CREAT | O_EXCL, mode));
+base::FileDescriptor makeFile(const std::string& path, mode_t mode) {
+    base::FileDescriptor descriptor(::open(path.c_str(), kOpenFlags | O_CREAT | O_EXCL, mode));
     if (descriptor.isOpen() && ::fchmod(descriptor.get(), mode) != 0) {
         descriptor.reset();
         ::unlink(path.c_str());
@@ -33,17 +33,17 @@ FileDescriptor makeFile(const std::string& path, mode_t mode) {
 }
 
 struct Opened {
-    FileDescriptor descriptor;
+    base::FileDescriptor descriptor;
     bool isNew = false;
 };
 
 Opened openOrMake(const std::string& path, mode_t mode) {
     for (int attempt = 0; attempt < kOpenAttempts; ++attempt) {
-        FileDescriptor existing(::open(path.c_str(), kOpenFlags));
+        base::FileDescriptor existing(::open(path.c_str(), kOpenFlags));
         if (existing.isOpen() || errno != ENOENT) {
             return {std::move(existing), false};
         }
-        FileDescriptor made = makeFile(path, mode);
+        base::FileDescriptor made = makeFile(path, mode);
         if (made.isOpen() || errno != EEXIST) {
             return {std::move(made), true};
         }
@@ -82,7 +82,8 @@ std::unique_ptr<FileStream> LinuxFiles::attachStream(const OpenFile& file) {
     if (!isWritable(file.descriptor)) {
         return nullptr;
     }
-    return std::make_unique<LinuxFileStream>(*this, FileDescriptor(file.descriptor), file.path);
+    return std::make_unique<LinuxFileStream>(*this, base::FileDescriptor(file.descriptor),
+                                             file.path);
 }
 
 std::optional<std::vector<std::uint8_t>> LinuxFiles::load(const std::string& path) {
@@ -98,7 +99,7 @@ int LinuxFiles::syncNameOnce(const std::string& path) {
         return 0;
     }
     const std::string directory = directoryOf(paths_.under(path));
-    const FileDescriptor descriptor(
+    const base::FileDescriptor descriptor(
         ::open(directory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC | O_NOCTTY));
     if (!descriptor.isOpen()) {
         return errno;

@@ -1,7 +1,7 @@
 #pragma once
 
+#include "base/FileDescriptor.h"
 #include "platform/Host.h"
-#include "platform/linux/FileDescriptor.h"
 #include "platform/linux/Paths.h"
 
 #include <chrono>
@@ -15,7 +15,7 @@ struct LinuxHostOptions {
     /// Where the system's paths begin.
     Paths paths{"/"};
     /// Where events come from; without one the host has no event socket.
-    FileDescriptor eventSocket{};
+    base::FileDescriptor eventSocket{};
     /// How long the process stays idle before the host closes its streams; none is for ever.
     std::optional<std::chrono::milliseconds> idleTime = std::nullopt;
 };

@@ -1,7 +1,7 @@
 #pragma once
 
+#include "base/FileDescriptor.h"
 #include "platform/Date.h"
-#include "platform/linux/FileDescriptor.h"
 
 namespace platform {
 
@@ -24,7 +24,7 @@ class RealTimeTimer {
     [[nodiscard]] Wake acknowledge();
 
   private:
-    FileDescriptor descriptor_;
+    base::FileDescriptor descriptor_;
 };
 
 } // namespace platform

@@ -1,6 +1,6 @@
 #include "platform/linux/RegularFile.h"
 
-#include "platform/linux/FileDescriptor.h"
+#include "base/FileDescriptor.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -56,7 +56,7 @@ bool readAll(int descriptor, std::size_t limit, RegularFile& file) {
 
 RegularFile readRegularFile(const std::string& path, std::size_t limit) {
     // Not blocking, because opening a pipe would wait for its writer.
-    const FileDescriptor descriptor(
+    const base::FileDescriptor descriptor(
         ::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
     if (!descriptor.isOpen()) {
         return failed(errno == ENOENT ? ReadFailure::missing : ReadFailure::unreadable, errno);

@@ -1,7 +1,7 @@
 #pragma once
 
+#include "base/FileDescriptor.h"
 #include "platform/SystemLog.h"
-#include "platform/linux/FileDescriptor.h"
 #include "platform/linux/LinuxRunLoop.h"
 
 #include <functional>
@@ -28,7 +28,7 @@ class SettingsWatch {
     std::string directoryName_;
     std::string fileName_;
     Changed changed_;
-    FileDescriptor inotify_;
+    base::FileDescriptor inotify_;
     int parentWatch_ = -1;
     int directoryWatch_ = -1;
     std::unique_ptr<RunLoopSource> source_;

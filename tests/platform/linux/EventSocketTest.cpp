@@ -1,7 +1,7 @@
 #include "platform/linux/EventSocket.h"
 
+#include "base/UnixAddress.h"
 #include "platform/fake/FakeSystemLog.h"
-#include "platform/linux/UnixAddress.h"
 #include "tests/platform/linux/OpenDescriptors.h"
 #include "tests/support/ChildProcess.h"
 #include "tests/support/TemporaryDirectory.h"
@@ -42,10 +42,9 @@ class EventSocketTest : public testing::Test {
     }
 
     bool send(const std::vector<std::uint8_t>& datagram) const {
-        const auto address = unixAddress(path);
-        return ::sendto(sender, datagram.data(), datagram.size(), 0,
-                        reinterpret_cast<const sockaddr*>(&*address),
-                        sizeof *address) == static_cast<ssize_t>(datagram.size());
+        const auto address = base::UnixAddress::of(path);
+        return ::sendto(sender, datagram.data(), datagram.size(), 0, address->get(),
+                        address->size()) == static_cast<ssize_t>(datagram.size());
     }
 
     /// Handles what is there.
@@ -108,12 +107,12 @@ TEST_F(EventSocketTest, DescriptorsSentAlongAreClosed) {
     const std::size_t before = support::countOpenDescriptors();
     for (int i = 0; i < 50; ++i) {
         auto datagram = event("with descriptors");
-        const auto address = unixAddress(path);
+        const auto address = base::UnixAddress::of(path);
         iovec data{datagram.data(), datagram.size()};
         alignas(cmsghdr) std::array<char, CMSG_SPACE(4 * sizeof(int))> control{};
         msghdr message{};
-        message.msg_name = const_cast<sockaddr_un*>(&*address);
-        message.msg_namelen = sizeof *address;
+        message.msg_name = const_cast<sockaddr*>(address->get());
+        message.msg_namelen = address->size();
         message.msg_iov = &data;
         message.msg_iovlen = 1;
         message.msg_control = control.data();
@@ -151,7 +150,7 @@ TEST_F(EventSocketTest, TheOwnerOfTheSocketMaySend) {
         GTEST_SKIP() << "needs root, to give the socket to another user";
     }
     socket.reset();
-    FileDescriptor made = makeEventSocket(path);
+    base::FileDescriptor made = makeEventSocket(path);
     ASSERT_EQ(::chown(path.c_str(), kNobody, kNobody), 0);
     ASSERT_EQ(::chmod(directory.path().c_str(), 0755), 0);
     socket = std::make_unique<EventSocket>(
@@ -208,11 +207,11 @@ ino_t socketIdentity(int descriptor) {
 }
 
 TEST_F(EventSocketTest, ActivatedSocketIsFoundByItsNameWhereverItStands) {
-    const FileDescriptor wanted = makeEventSocket(directory.file("a"));
-    const FileDescriptor unwanted = makeEventSocket(directory.file("b"));
+    const base::FileDescriptor wanted = makeEventSocket(directory.file("a"));
+    const base::FileDescriptor unwanted = makeEventSocket(directory.file("b"));
     const ino_t identity = socketIdentity(wanted.get());
     const auto isWanted = [identity] {
-        const FileDescriptor found = takeActivatedEventSocket();
+        const base::FileDescriptor found = takeActivatedEventSocket();
         return found.isOpen() && socketIdentity(found.get()) == identity &&
                        std::getenv("LISTEN_FDS") == nullptr
                    ? 0
@@ -223,8 +222,8 @@ TEST_F(EventSocketTest, ActivatedSocketIsFoundByItsNameWhereverItStands) {
 }
 
 TEST_F(EventSocketTest, OtherNamesAndOtherKindsOfSocketAreNotTaken) {
-    const FileDescriptor datagrams = makeEventSocket(directory.file("a"));
-    const FileDescriptor stream(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    const base::FileDescriptor datagrams = makeEventSocket(directory.file("a"));
+    const base::FileDescriptor stream(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
     const auto isNone = [] {
         return takeActivatedEventSocket().isOpen() ? 1 : 0;
     };

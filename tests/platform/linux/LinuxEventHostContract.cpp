@@ -1,8 +1,8 @@
+#include "base/UnixAddress.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"
 #include "platform/linux/LinuxProcessTransactions.h"
 #include "platform/linux/RealTime.h"
-#include "platform/linux/UnixAddress.h"
 #include "tests/platform/contract/EventHostContract.h"
 #include "tests/platform/linux/RootDirectory.h"
 #include "wire/EventDatagram.h"
@@ -35,9 +35,9 @@ class LinuxEventHostFixture final : public EventHostFixture {
 
     void post(std::string_view stream, std::string_view name) override {
         const auto datagram = wire::encodeEvent(stream, name).value();
-        const auto address = platform::unixAddress(root_.paths().eventSocket()).value();
+        const auto address = base::UnixAddress::of(root_.paths().eventSocket()).value();
         const ssize_t sent = ::sendto(sender_.get(), datagram.data(), datagram.size(), MSG_DONTWAIT,
-                                      reinterpret_cast<const sockaddr*>(&address), sizeof address);
+                                      address.get(), address.size());
         if (sent != static_cast<ssize_t>(datagram.size())) {
             throw std::runtime_error("the event socket is full");
         }
@@ -69,7 +69,7 @@ class LinuxEventHostFixture final : public EventHostFixture {
     }
 
     support::RootDirectory root_;
-    platform::FileDescriptor sender_{::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)};
+    base::FileDescriptor sender_{::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)};
     std::unique_ptr<platform::LinuxHost> host_;
 };
 

@@ -1,11 +1,11 @@
 #include "platform/linux/LinuxHost.h"
 
+#include "base/UnixAddress.h"
 #include "platform/EventStream.h"
 #include "platform/MainRunLoop.h"
 #include "platform/ProcessTransaction.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/RealTime.h"
-#include "platform/linux/UnixAddress.h"
 #include "tests/platform/linux/RootDirectory.h"
 #include "tests/platform/linux/StandardErrorCapture.h"
 #include "wire/EventDatagram.h"
@@ -40,7 +40,8 @@ class LinuxHostTest : public testing::Test {
         start(idleTime, makeEventSocket(root.paths().eventSocket()));
     }
 
-    void start(std::optional<std::chrono::milliseconds> idleTime, FileDescriptor eventSocket) {
+    void start(std::optional<std::chrono::milliseconds> idleTime,
+               base::FileDescriptor eventSocket) {
         host = std::make_unique<LinuxHost>(LinuxHostOptions{
             .paths = root.paths(), .eventSocket = std::move(eventSocket), .idleTime = idleTime});
         for (const char* const stream : {"com.zerva.notifyd.matching", kAlarms}) {
@@ -53,11 +54,11 @@ class LinuxHostTest : public testing::Test {
 
     void send(std::string_view stream, std::string_view name,
               const std::vector<std::uint8_t>& payload = {}) {
-        const FileDescriptor sender(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+        const base::FileDescriptor sender(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
         const auto datagram = wire::encodeEvent(stream, name, payload).value();
-        const auto address = unixAddress(root.paths().eventSocket()).value();
-        ASSERT_EQ(::sendto(sender.get(), datagram.data(), datagram.size(), 0,
-                           reinterpret_cast<const sockaddr*>(&address), sizeof address),
+        const auto address = base::UnixAddress::of(root.paths().eventSocket()).value();
+        ASSERT_EQ(::sendto(sender.get(), datagram.data(), datagram.size(), 0, address.get(),
+                           address.size()),
                   static_cast<ssize_t>(datagram.size()));
     }
 
@@ -86,7 +87,7 @@ class LinuxHostTest : public testing::Test {
 };
 
 TEST_F(LinuxHostTest, IdleHostSaysThatItStopsAndLeavesTheLoopWithoutSources) {
-    const FileDescriptor listener = makeEventSocket(root.real("/run/notify"));
+    const base::FileDescriptor listener = makeEventSocket(root.real("/run/notify"));
     ::setenv("NOTIFY_SOCKET", root.real("/run/notify").c_str(), 1);
     start(std::chrono::milliseconds(1));
     while (interfaces().runLoop.runOnce(kDistantFuture)) {
@@ -108,9 +109,9 @@ TEST_F(LinuxHostTest, HostWithSomethingInHandDoesNotEnd) {
 }
 
 TEST_F(LinuxHostTest, EventThatArrivesAfterTheEndStaysInTheSocketForTheNextProcess) {
-    FileDescriptor first = makeEventSocket(root.paths().eventSocket());
+    base::FileDescriptor first = makeEventSocket(root.paths().eventSocket());
     // The init system's own descriptor of the socket.
-    FileDescriptor kept(::fcntl(first.get(), F_DUPFD_CLOEXEC, 0));
+    base::FileDescriptor kept(::fcntl(first.get(), F_DUPFD_CLOEXEC, 0));
     start(std::nullopt, std::move(first));
     host->closeStreams();
     send("com.zerva.notifyd.matching", "late");

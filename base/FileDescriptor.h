@@ -3,7 +3,7 @@
 #include <unistd.h>
 #include <utility>
 
-namespace platform {
+namespace base {
 
 /// Owns a file descriptor; -1 is none.
 class FileDescriptor {
@@ -38,4 +38,4 @@ class FileDescriptor {
     int number_ = -1;
 };
 
-} // namespace platform
+} // namespace base
