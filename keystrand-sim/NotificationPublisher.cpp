@@ -12,8 +12,12 @@ bool NotificationPublisher::publish(const Notification& notification) {
     }
     ++publishedCount_;
     rememberKept(notification);
-    return events_.post(wire::kNotifydMatchingStream,
-                        base::concat(wire::rm::kNotificationNamePrefix, property));
+    if (!events_.post(wire::kNotifydMatchingStream,
+                      base::concat(wire::rm::kNotificationNamePrefix, property))) {
+        return false;
+    }
+    registry_.announce(property);
+    return true;
 }
 
 void NotificationPublisher::rememberKept(const Notification& notification) {

@@ -1,6 +1,7 @@
 #include "base/Concat.h"
 #include "keystrand-sim/ControlCommand.h"
 #include "wire/EventDatagram.h"
+#include "wire/RestrictedMode.h"
 
 #include <algorithm>
 #include <array>
@@ -82,8 +83,12 @@ ControlOutcome post(ControlContext& context, ControlArguments& arguments) {
     if (count > EventSender::kMaxQueued - context.events.queued()) {
         return ControlOutcome::failed("no room for so many events");
     }
+    const std::string_view prefix = wire::rm::kNotificationNamePrefix;
     for (std::size_t i = 0; i < count; ++i) {
         context.events.post(stream, name);
+        if (name.starts_with(prefix)) {
+            context.kernel.registry.announce(name.substr(prefix.size()));
+        }
     }
     return ControlOutcome::done();
 }

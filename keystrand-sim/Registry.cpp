@@ -21,6 +21,13 @@ bool Registry::set(std::string_view name, std::span<const std::uint8_t> value) {
     return true;
 }
 
+void Registry::announce(std::string_view name) {
+    const auto found = properties_.find(name);
+    if (found != properties_.end()) {
+        ++found->second.announcements;
+    }
+}
+
 bool Registry::remove(std::string_view name) {
     const auto found = properties_.find(name);
     if (found == properties_.end()) {
@@ -40,13 +47,22 @@ std::optional<std::vector<std::uint8_t>> Registry::copy(std::string_view name) {
     if (found == properties_.end()) {
         return std::nullopt;
     }
-    found->second.handedOut = found->second.generation;
-    return found->second.value;
+    Property& property = found->second;
+    property.handedOut = property.generation;
+    property.lastCopy = ++lastCopy_;
+    if (property.announcements > 0) {
+        --property.announcements;
+    }
+    return property.value;
 }
 
 bool Registry::acknowledge(std::string_view name) {
     const auto found = acknowledgedProperty(name);
-    if (found == properties_.end() || found->second.handedOut != found->second.generation) {
+    if (found == properties_.end()) {
+        return false;
+    }
+    const Property& property = found->second;
+    if (property.announcements > 0 || property.handedOut != property.generation) {
         return false;
     }
     properties_.erase(found);
@@ -61,7 +77,7 @@ Registry::Properties::iterator Registry::acknowledgedProperty(std::string_view n
     auto latest = properties_.end();
     for (auto it = properties_.lower_bound(name);
          it != properties_.end() && it->first.starts_with(name); ++it) {
-        if (latest == properties_.end() || it->second.handedOut > latest->second.handedOut) {
+        if (latest == properties_.end() || it->second.lastCopy > latest->second.lastCopy) {
             latest = it;
         }
     }

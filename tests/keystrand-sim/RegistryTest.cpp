@@ -62,6 +62,43 @@ TEST_F(RegistryTest, RecordPublishedAfterRemovalIsNotTheOneHandedOut) {
     EXPECT_FALSE(registry_.acknowledge("P"));
 }
 
+TEST_F(RegistryTest, RecordThatWasAnnouncedTwiceStaysUntilBothEventsAreAnswered) {
+    ASSERT_TRUE(registry_.set("P", kFirst));
+    registry_.announce("P");
+    ASSERT_TRUE(registry_.set("P", kSecond));
+    registry_.announce("P");
+    EXPECT_EQ(registry_.copy("P"), kSecond);
+    EXPECT_FALSE(registry_.acknowledge("P"));
+    EXPECT_EQ(registry_.copy("P"), kSecond);
+    EXPECT_TRUE(registry_.acknowledge("P"));
+}
+
+TEST_F(RegistryTest, NewerRecordThatWasAnnouncedSurvivesTheAcknowledgementOfTheOlder) {
+    ASSERT_TRUE(registry_.set("P", kFirst));
+    registry_.announce("P");
+    static_cast<void>(registry_.copy("P"));
+    ASSERT_TRUE(registry_.set("P", kSecond));
+    registry_.announce("P");
+    EXPECT_FALSE(registry_.acknowledge("P"));
+    EXPECT_EQ(registry_.copy("P"), kSecond);
+    EXPECT_TRUE(registry_.acknowledge("P"));
+}
+
+TEST_F(RegistryTest, RecordThatWasReadAndNotAcknowledgedLeavesNoAnnouncementBehind) {
+    ASSERT_TRUE(registry_.set("P", kFirst));
+    registry_.announce("P");
+    static_cast<void>(registry_.copy("P"));
+    ASSERT_TRUE(registry_.set("P", kSecond));
+    registry_.announce("P");
+    static_cast<void>(registry_.copy("P"));
+    EXPECT_TRUE(registry_.acknowledge("P"));
+}
+
+TEST_F(RegistryTest, AnnouncingWhatIsNotThereDoesNothing) {
+    registry_.announce("P");
+    EXPECT_EQ(registry_.count(), 0U);
+}
+
 TEST_F(RegistryTest, SecondAcknowledgementDropsNothing) {
     ASSERT_TRUE(registry_.set("P", kFirst));
     static_cast<void>(registry_.copy("P"));
@@ -97,6 +134,17 @@ TEST_F(RegistryTest, CutNameStandsForThePropertyReadLast) {
     EXPECT_TRUE(registry_.acknowledge(stem));
     EXPECT_EQ(registry_.find(stem + "b"), nullptr);
     EXPECT_EQ(registry_.count(), 2U);
+}
+
+TEST_F(RegistryTest, CutNameStandsForTheLastCopyAlsoOfAnOlderRecord) {
+    const std::string stem(64, 'n');
+    ASSERT_TRUE(registry_.set(stem + "a", kFirst));
+    ASSERT_TRUE(registry_.set(stem + "b", kFirst));
+    static_cast<void>(registry_.copy(stem + "b"));
+    static_cast<void>(registry_.copy(stem + "a"));
+    EXPECT_TRUE(registry_.acknowledge(stem));
+    EXPECT_EQ(registry_.find(stem + "a"), nullptr);
+    EXPECT_NE(registry_.find(stem + "b"), nullptr);
 }
 
 TEST_F(RegistryTest, NameLengthHasLimits) {
