@@ -18,7 +18,8 @@ template <std::integral To, std::floating_point From>
     }
     // Both ends are powers of two (or 0) as floating-point numbers: the upper one may be max + 1,
     // which is why it is excluded.
-    constexpr From upperEnd = static_cast<From>(std::numeric_limits<To>::max() / 2 + 1) * From{2};
+    constexpr To halfRange = std::numeric_limits<To>::max() / 2 + 1;
+    constexpr From upperEnd = static_cast<From>(halfRange) * From{2};
     constexpr From lowerEnd = static_cast<From>(std::numeric_limits<To>::min());
     if (value >= upperEnd) {
         return std::numeric_limits<To>::max();

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstddef>
 #include <cstring>
 #include <optional>
 #include <string_view>
@@ -18,18 +19,20 @@ class UnixAddress {
             return std::nullopt;
         }
         std::memcpy(address.storage_.sun_path, path.data(), path.size());
+        address.size_ = static_cast<socklen_t>(offsetof(sockaddr_un, sun_path) + path.size() + 1);
         return address;
     }
 
     [[nodiscard]] const sockaddr* get() const {
         return reinterpret_cast<const sockaddr*>(&storage_);
     }
-    [[nodiscard]] static constexpr socklen_t size() { return sizeof(sockaddr_un); }
+    [[nodiscard]] socklen_t size() const { return size_; }
 
   private:
     UnixAddress() { storage_.sun_family = AF_UNIX; }
 
     sockaddr_un storage_{};
+    socklen_t size_ = 0;
 };
 
 } // namespace base

@@ -10,6 +10,7 @@
 
 #include <chrono>
 #include <csignal>
+#include <cstdio>
 #include <exception>
 #include <filesystem>
 #include <iostream>
@@ -58,7 +59,7 @@ int runDaemon(const Options& options) {
 
 } // namespace
 
-int main(int argc, char** argv) {
+int main(int argc, char** argv) try {
     std::signal(SIGPIPE, SIG_IGN);
     CLI::App app("Runs the daemon with all its paths under a root directory of its own.");
     Options options;
@@ -67,10 +68,8 @@ int main(int argc, char** argv) {
     app.add_option("--idle-exit", options.idleMilliseconds,
                    "End after this many milliseconds without work; 0 is never");
     CLI11_PARSE(app, argc, argv);
-    try {
-        return runDaemon(options);
-    } catch (const std::exception& error) {
-        std::cerr << "kstd-dev: " << error.what() << '\n';
-        return 1;
-    }
+    return runDaemon(options);
+} catch (const std::exception& error) {
+    std::fprintf(stderr, "kstd-dev: %s\n", error.what());
+    return 1;
 }

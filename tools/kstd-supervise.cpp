@@ -8,6 +8,7 @@
 
 #include <cerrno>
 #include <csignal>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <exception>
@@ -122,7 +123,7 @@ int supervise(const Options& options) {
 
 } // namespace
 
-int main(int argc, char** argv) {
+int main(int argc, char** argv) try {
     CLI::App app("Owns the event socket under a root directory and launches a program for it.");
     Options options;
     app.add_option("--root", options.root, "The directory in which /run lies")->required();
@@ -130,10 +131,8 @@ int main(int argc, char** argv) {
     app.add_option("program", options.program, "The program and its arguments, after --")
         ->required();
     CLI11_PARSE(app, argc, argv);
-    try {
-        return supervise(options);
-    } catch (const std::exception& error) {
-        std::cerr << "kstd-supervise: " << error.what() << '\n';
-        return 1;
-    }
+    return supervise(options);
+} catch (const std::exception& error) {
+    std::fprintf(stderr, "kstd-supervise: %s\n", error.what());
+    return 1;
 }

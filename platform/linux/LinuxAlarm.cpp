@@ -49,10 +49,11 @@ void LinuxAlarm::set(std::string_view stream, std::string_view event,
     armForNext();
 }
 
-// By value: the name may be the one inside the registration.
-void LinuxAlarm::cancel(Name name) {
-    if (registrations_.erase(name) > 0) {
-        store_.clear(name.first, name.second);
+void LinuxAlarm::cancel(const Name& name) {
+    // A copy, because the name may be the one inside the registration.
+    const Name cancelled = name;
+    if (registrations_.erase(cancelled) > 0) {
+        store_.clear(cancelled.first, cancelled.second);
     }
 }
 

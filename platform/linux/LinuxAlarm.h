@@ -52,7 +52,7 @@ class LinuxAlarm final : public AlarmEvent {
 
     void restore(std::string_view stream);
     void delivered(const Event& event);
-    void cancel(Name name);
+    void cancel(const Name& name);
     void timerWoke();
     void fireDue();
     [[nodiscard]] Registrations::iterator earliest();
