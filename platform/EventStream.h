@@ -4,6 +4,7 @@
 
 #include <functional>
 #include <map>
+#include <optional>
 #include <string>
 #include <string_view>
 
@@ -38,6 +39,15 @@ using EventDictionary = std::map<std::string, Date, std::less<>>;
 
 /// The key of an alarm's date.
 inline constexpr char kAlarmDateKey[] = "Date";
+
+/// The date under kAlarmDateKey; none when it is not there or `dictionary` is null.
+[[nodiscard]] inline std::optional<Date> alarmDateIn(const EventDictionary* dictionary) {
+    if (dictionary == nullptr) {
+        return std::nullopt;
+    }
+    const auto date = dictionary->find(kAlarmDateKey);
+    return date == dictionary->end() ? std::nullopt : std::optional(date->second);
+}
 
 /// Registration of events that the system fires at a date.
 ///

@@ -1,9 +1,5 @@
 #include "platform/fake/FakeAlarmEvent.h"
 
-#include <algorithm>
-#include <utility>
-#include <vector>
-
 namespace platform {
 
 FakeAlarmEvent::FakeAlarmEvent(FakeAlarmStore& store, const FakeClock& clock, EventQueue& queue)
@@ -13,59 +9,40 @@ void FakeAlarmEvent::set(std::string_view stream, std::string_view event,
                          const EventDictionary* dictionary) {
     const Name name(stream, event);
     queue_.drop(stream, event);
-    const auto none = EventDictionary();
-    const EventDictionary& values = dictionary == nullptr ? none : *dictionary;
-    const auto date = values.find(kAlarmDateKey);
-    if (date == values.end()) {
-        store_.clear(name);
-        registrations_.erase(name);
-        return;
+    if (const auto date = alarmDateIn(dictionary)) {
+        store_.save(name, *date);
+        registrations_.put(name, *date);
+        fireDue();
+    } else {
+        cancel(name);
     }
-    store_.save(name, date->second);
-    registrations_.insert_or_assign(name, Registration{date->second});
-    fireDue();
+}
+
+void FakeAlarmEvent::cancel(const Name& name) {
+    store_.clear(name);
+    registrations_.erase(name);
 }
 
 void FakeAlarmEvent::restore(std::string_view stream) {
     for (const auto& [name, date] : store_.all()) {
         if (name.first == stream) {
-            registrations_.try_emplace(name, Registration{date});
+            registrations_.putIfAbsent(name, date);
         }
     }
     fireDue();
 }
 
 void FakeAlarmEvent::fireDue() {
-    std::vector<std::pair<Date, Name>> due;
-    for (auto& [name, registration] : registrations_) {
-        if (!registration.fired && registration.date <= clock_.now()) {
-            registration.fired = true;
-            due.emplace_back(registration.date, name);
-        }
-    }
-    std::sort(due.begin(), due.end());
-    for (auto& [date, name] : due) {
-        queue_.push({std::move(name.first), std::move(name.second)});
+    for (auto& [stream, event] : registrations_.takeDue(clock_.now())) {
+        queue_.push({stream, event});
     }
 }
 
 void FakeAlarmEvent::delivered(const Event& event) {
-    const auto found = registrations_.find(Name(event.stream, event.name));
-    if (found != registrations_.end() && found->second.fired &&
-        !queue_.holds(event.stream, event.name)) {
-        store_.clear(found->first);
-        registrations_.erase(found);
+    const Name name(event.stream, event.name);
+    if (registrations_.hasFired(name) && !queue_.holds(event.stream, event.name)) {
+        cancel(name);
     }
-}
-
-std::optional<Date> FakeAlarmEvent::next() const {
-    std::optional<Date> next;
-    for (const auto& [name, registration] : registrations_) {
-        if (!registration.fired && (!next || registration.date < *next)) {
-            next = registration.date;
-        }
-    }
-    return next;
 }
 
 } // namespace platform

@@ -3,9 +3,9 @@
 #include "platform/EventStream.h"
 #include "platform/fake/FakeAlarmStore.h"
 #include "platform/fake/FakeClock.h"
+#include "platform/shared/AlarmRegistrations.h"
 #include "platform/shared/EventQueue.h"
 
-#include <map>
 #include <optional>
 #include <string_view>
 
@@ -33,19 +33,17 @@ class FakeAlarmEvent final : public AlarmEvent {
     void delivered(const Event& event);
 
     /// When the next alarm that has not fired is due.
-    [[nodiscard]] std::optional<Date> next() const;
+    [[nodiscard]] std::optional<Date> next() const { return registrations_.next(); }
 
   private:
-    using Name = FakeAlarmStore::Name;
-    struct Registration {
-        Date date;
-        bool fired = false;
-    };
+    using Name = AlarmRegistrations::Name;
+
+    void cancel(const Name& name);
 
     FakeAlarmStore& store_;
     const FakeClock& clock_;
     EventQueue& queue_;
-    std::map<Name, Registration> registrations_;
+    AlarmRegistrations registrations_;
 };
 
 } // namespace platform

@@ -119,51 +119,64 @@ bool make(const std::string& path, std::string_view line) {
 AlarmStore::AlarmStore(std::string directory, SystemLog& log)
     : directory_(std::move(directory)), log_(log) {}
 
-std::vector<std::pair<std::string, Date>> AlarmStore::load(std::string_view stream) const {
+std::vector<std::pair<std::string, Date>> AlarmStore::load(std::string_view stream) {
     std::vector<std::pair<std::string, Date>> alarms;
     std::error_code error;
     const std::string directory = base::concat(directory_, '/', stream);
     for (const auto& entry : std::filesystem::directory_iterator(directory, error)) {
-        const Line line = parse(readLine(entry.path().string()));
+        const std::string path = entry.path().string();
+        const Line line = parse(readLine(path));
         if (!line.readable) {
-            report("unreadable alarm, taken as due", entry.path().string(), 0);
-            alarms.emplace_back(entry.path().filename().string(), Date{});
-        } else if (line.date) {
-            alarms.emplace_back(entry.path().filename().string(), *line.date);
+            report("unreadable alarm, taken as due", path, 0);
+        }
+        if (line.readable && !line.date) {
+            known_.insert_or_assign(path, std::nullopt);
+        } else {
+            alarms.emplace_back(entry.path().filename().string(), line.date.value_or(Date{}));
         }
     }
     return alarms;
 }
 
-bool AlarmStore::save(std::string_view stream, std::string_view event, Date date) {
+void AlarmStore::save(std::string_view stream, std::string_view event, Date date) {
     if (!isFileName(stream) || !isFileName(event)) {
         report("alarm whose name cannot be kept on disk", event, 0);
-        return false;
+        return;
     }
     const std::string directory = base::concat(directory_, '/', stream);
     const std::string path = base::concat(directory, '/', event);
+    if (knows(path, date)) {
+        return;
+    }
     const std::string line = lineFor(date);
     if (overwrite(path, line) ||
         (errno == ENOENT && makeDirectory(directory) && make(path, line))) {
-        return true;
+        known_.insert_or_assign(path, date);
+        return;
     }
     report("cannot keep the alarm on disk", path, errno);
-    return false;
+    known_.erase(path);
 }
 
 void AlarmStore::clear(std::string_view stream, std::string_view event) {
-    if (!isFileName(stream) || !isFileName(event)) {
-        return;
-    }
     const std::string path = base::concat(directory_, '/', stream, '/', event);
-    const base::FileDescriptor file(::open(path.c_str(), kWriteFlags));
-    if (!file.isOpen() && errno == ENOENT) {
+    if (!isFileName(stream) || !isFileName(event) || knows(path, std::nullopt)) {
         return;
     }
-    if (!file.isOpen() || !writeAt0(file.get(), kCancelled) ||
-        ::ftruncate(file.get(), kLineSize) != 0) {
-        report("cannot cancel the alarm on disk", path, errno);
+    const base::FileDescriptor file(::open(path.c_str(), kWriteFlags));
+    const bool isMissing = !file.isOpen() && errno == ENOENT;
+    if (isMissing || (file.isOpen() && writeAt0(file.get(), kCancelled) &&
+                      ::ftruncate(file.get(), kLineSize) == 0)) {
+        known_.insert_or_assign(path, std::nullopt);
+        return;
     }
+    report("cannot cancel the alarm on disk", path, errno);
+    known_.erase(path);
+}
+
+bool AlarmStore::knows(const std::string& path, std::optional<Date> date) const {
+    const auto known = known_.find(path);
+    return known != known_.end() && known->second == date;
 }
 
 bool AlarmStore::makeDirectory(const std::string& path) {

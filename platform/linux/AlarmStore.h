@@ -3,6 +3,9 @@
 #include "platform/Date.h"
 #include "platform/SystemLog.h"
 
+#include <functional>
+#include <map>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -22,22 +25,27 @@ class AlarmStore {
     AlarmStore(std::string directory, SystemLog& log);
 
     /// The registered alarms of a stream: event names and dates.
-    [[nodiscard]] std::vector<std::pair<std::string, Date>> load(std::string_view stream) const;
+    [[nodiscard]] std::vector<std::pair<std::string, Date>> load(std::string_view stream);
 
-    /// Puts the registration on disk before it returns, and makes the directories. False, and a
-    /// line in the log, when that failed: the alarm then lasts as long as the process.
-    bool save(std::string_view stream, std::string_view event, Date date);
+    /// Puts the registration on disk before it returns, and makes the directories. A failure is
+    /// logged: the alarm then lasts as long as the process. A date that this store has put on disk
+    /// before is not written again.
+    void save(std::string_view stream, std::string_view event, Date date);
 
     /// Takes the registration away. Not synced: an alarm that comes back after a power cut fires
     /// once too often, which does no harm.
     void clear(std::string_view stream, std::string_view event);
 
   private:
+    [[nodiscard]] bool knows(const std::string& path, std::optional<Date> date) const;
     [[nodiscard]] static bool makeDirectory(const std::string& path);
     void report(std::string_view what, std::string_view path, int error) const;
 
     std::string directory_;
     SystemLog& log_;
+    /// What each file holds, by its path, as far as this store knows: the date that it has put
+    /// there, or that the alarm is cancelled. A date that was only read may not be synced.
+    std::map<std::string, std::optional<Date>, std::less<>> known_;
 };
 
 } // namespace platform

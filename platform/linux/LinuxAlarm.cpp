@@ -3,21 +3,11 @@
 #include "base/ByteReader.h"
 #include "platform/linux/RealTime.h"
 
-#include <algorithm>
-
 namespace platform {
 
 namespace {
 
 constexpr char kArmedLabel[] = "alarm armed";
-
-std::optional<Date> dateIn(const EventDictionary* dictionary) {
-    if (dictionary == nullptr) {
-        return std::nullopt;
-    }
-    const auto date = dictionary->find(kAlarmDateKey);
-    return date == dictionary->end() ? std::nullopt : std::optional(date->second);
-}
 
 } // namespace
 
@@ -35,26 +25,20 @@ LinuxAlarm::LinuxAlarm(LinuxEventStream& events, LinuxRunLoop& loop, AlarmStore 
 void LinuxAlarm::set(std::string_view stream, std::string_view event,
                      const EventDictionary* dictionary) {
     const Name name(stream, event);
+    restore(stream);
     events_.drop(stream, event);
-    if (const std::optional<Date> date = dateIn(dictionary)) {
-        const auto found = registrations_.find(name);
-        const bool isKept =
-            found != registrations_.end() && found->second.kept && found->second.date == *date;
-        registrations_.insert_or_assign(
-            name, Registration{*date, isKept || store_.save(stream, event, *date)});
-        fireDue();
+    if (const auto date = alarmDateIn(dictionary)) {
+        store_.save(stream, event, *date);
+        registrations_.put(name, *date);
     } else {
         cancel(name);
     }
-    armForNext();
+    fireDueAndArm();
 }
 
 void LinuxAlarm::cancel(const Name& name) {
-    // A copy, because the name may be the one inside the registration.
-    const Name cancelled = name;
-    if (registrations_.erase(cancelled) > 0) {
-        store_.clear(cancelled.first, cancelled.second);
-    }
+    store_.clear(name.first, name.second);
+    registrations_.erase(name);
 }
 
 bool LinuxAlarm::arrived(std::string_view stream, std::string_view event,
@@ -64,10 +48,9 @@ bool LinuxAlarm::arrived(std::string_view stream, std::string_view event,
     if (!reader.readU64(date) || reader.left() != 0) {
         return false;
     }
-    const auto found = registrations_.find(Name(stream, event));
-    if (found != registrations_.end() && !found->second.fired &&
-        found->second.date.nanosecondsSince1970 == static_cast<std::int64_t>(date)) {
-        fire(found->first, found->second);
+    const Name name(stream, event);
+    if (registrations_.take(name, {static_cast<std::int64_t>(date)})) {
+        events_.post({name.first, name.second});
         armForNext();
     }
     return true;
@@ -79,65 +62,43 @@ void LinuxAlarm::close() {
 }
 
 void LinuxAlarm::restore(std::string_view stream) {
-    for (auto& [event, date] : store_.load(stream)) {
-        registrations_.try_emplace(Name(stream, event), Registration{date, true});
+    if (!restored_.emplace(stream).second) {
+        return;
     }
-    fireDue();
-    armForNext();
+    for (const auto& [event, date] : store_.load(stream)) {
+        registrations_.putIfAbsent(Name(stream, event), date);
+    }
+    fireDueAndArm();
 }
 
-/// A registration that has fired ends when its event was handled and it was not replaced meanwhile,
-/// so that a process killed in between leaves an alarm that fires again.
 void LinuxAlarm::delivered(const Event& event) {
-    const auto found = registrations_.find(Name(event.stream, event.name));
-    if (found != registrations_.end() && found->second.fired &&
-        !events_.holds(event.stream, event.name)) {
-        cancel(found->first);
+    const Name name(event.stream, event.name);
+    if (registrations_.hasFired(name) && !events_.holds(event.stream, event.name)) {
+        cancel(name);
     }
 }
 
 void LinuxAlarm::timerWoke() {
     if (timer_.acknowledge() != RealTimeTimer::Wake::nothing) {
-        fireDue();
-        armForNext();
+        fireDueAndArm();
     }
 }
 
-/// In the order of their dates.
-void LinuxAlarm::fireDue() {
-    const Date now = realTimeNow();
-    for (auto next = earliest(); next != registrations_.end() && next->second.date <= now;
-         next = earliest()) {
-        fire(next->first, next->second);
+void LinuxAlarm::fireDueAndArm() {
+    for (const auto& [stream, event] : registrations_.takeDue(realTimeNow())) {
+        events_.post({stream, event});
     }
-}
-
-/// The alarm that fires next, of those that have not fired.
-LinuxAlarm::Registrations::iterator LinuxAlarm::earliest() {
-    auto earliest = registrations_.end();
-    for (auto it = registrations_.begin(); it != registrations_.end(); ++it) {
-        const bool isEarlier =
-            earliest == registrations_.end() || it->second.date < earliest->second.date;
-        if (!it->second.fired && isEarlier) {
-            earliest = it;
-        }
-    }
-    return earliest;
-}
-
-void LinuxAlarm::fire(const Name& name, Registration& registration) {
-    registration.fired = true;
-    events_.post({name.first, name.second});
+    armForNext();
 }
 
 void LinuxAlarm::armForNext() {
     if (!source_) {
         return;
     }
-    const auto next = earliest();
-    source_->setEnabled(next != registrations_.end());
-    if (next != registrations_.end()) {
-        timer_.arm(next->second.date);
+    const std::optional<Date> next = registrations_.next();
+    source_->setEnabled(next.has_value());
+    if (next) {
+        timer_.arm(*next);
         if (!armed_) {
             armed_.emplace(transactions_, kArmedLabel);
         }

@@ -6,11 +6,12 @@
 #include "platform/linux/LinuxEventStream.h"
 #include "platform/linux/LinuxRunLoop.h"
 #include "platform/linux/RealTimeTimer.h"
+#include "platform/shared/AlarmRegistrations.h"
 
 #include <cstdint>
-#include <map>
 #include <memory>
 #include <optional>
+#include <set>
 #include <span>
 #include <string>
 #include <string_view>
@@ -20,9 +21,10 @@ namespace platform {
 
 /// AlarmEvent with registrations on disk and a timer in the process.
 ///
-/// A stream's registrations are read back when the stream gets its handler: what became due while
-/// no process ran is then delivered at once. The timer cannot launch a process that is gone, so
-/// while an alarm is armed a transaction keeps this one from ending for being idle.
+/// A stream's registrations are read back when the stream gets its handler, or its first alarm:
+/// what became due while no process ran is then delivered at once. The timer cannot launch a
+/// process that is gone, so while an alarm is armed a transaction keeps this one from ending for
+/// being idle.
 class LinuxAlarm final : public AlarmEvent {
   public:
     LinuxAlarm(LinuxEventStream& events, LinuxRunLoop& loop, AlarmStore store,
@@ -41,22 +43,13 @@ class LinuxAlarm final : public AlarmEvent {
     void close();
 
   private:
-    using Name = std::pair<std::string, std::string>;
-    struct Registration {
-        Date date;
-        /// Whether this very date is on disk.
-        bool kept = false;
-        bool fired = false;
-    };
-    using Registrations = std::map<Name, Registration>;
+    using Name = AlarmRegistrations::Name;
 
     void restore(std::string_view stream);
     void delivered(const Event& event);
     void cancel(const Name& name);
     void timerWoke();
-    void fireDue();
-    [[nodiscard]] Registrations::iterator earliest();
-    void fire(const Name& name, Registration& registration);
+    void fireDueAndArm();
     void armForNext();
 
     LinuxEventStream& events_;
@@ -64,7 +57,9 @@ class LinuxAlarm final : public AlarmEvent {
     ProcessTransactions& transactions_;
     RealTimeTimer timer_;
     std::unique_ptr<RunLoopSource> source_;
-    Registrations registrations_;
+    AlarmRegistrations registrations_;
+    /// The streams whose registrations were read back.
+    std::set<std::string, std::less<>> restored_;
     std::optional<ProcessTransaction> armed_;
 };
 

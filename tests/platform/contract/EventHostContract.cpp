@@ -456,4 +456,14 @@ TEST_P(EventHostContract, ChangedSettingIsAnnouncedAndFound) {
     EXPECT_TRUE(answers.back());
 }
 
+TEST_P(EventHostContract, AlarmIsCancelledByAProcessThatHasNoHandlerForIt) {
+    setAlarm("alarm", kSoon);
+    fixture().restart();
+    cancelAlarm("alarm");
+    fixture().restart();
+    listen(kAlarms);
+    runFor(kLater);
+    EXPECT_THAT(delivered, IsEmpty());
+}
+
 } // namespace contract

@@ -89,6 +89,31 @@ TEST_F(AlarmStoreTest, ClearedRegistrationIsNotReadBackAndMayBeMadeAnew) {
     EXPECT_THAT(store.load("stream"), ElementsAre(Pair("a", Date{6})));
 }
 
+TEST_F(AlarmStoreTest, DateThatThisStorePutThereIsNotWrittenAgain) {
+    store.save("stream", "a", {5});
+    put("a", "changed behind its back");
+    store.save("stream", "a", {5});
+    EXPECT_EQ(contents("a"), "changed behind its back");
+    store.save("stream", "a", {6});
+    EXPECT_EQ(contents("a"), "00000000000000000006\n");
+}
+
+TEST_F(AlarmStoreTest, DateThatWasOnlyReadIsWrittenAndSynced) {
+    put("a", "00000000000000000005\n");
+    EXPECT_THAT(store.load("stream"), ElementsAre(Pair("a", Date{5})));
+    put("a", "changed behind its back");
+    store.save("stream", "a", {5});
+    EXPECT_EQ(contents("a"), "00000000000000000005\n");
+}
+
+TEST_F(AlarmStoreTest, CancelledAlarmIsNotCancelledAgain) {
+    store.save("stream", "a", {5});
+    store.clear("stream", "a");
+    put("a", "changed behind its back");
+    store.clear("stream", "a");
+    EXPECT_EQ(contents("a"), "changed behind its back");
+}
+
 TEST_F(AlarmStoreTest, ClearingWhatIsNotThereIsSilent) {
     store.clear("stream", "a");
     EXPECT_THAT(log.texts(), ElementsAre());
