@@ -1,0 +1,150 @@
+#pragma once
+
+#include "platform/Error.h"
+#include "platform/Link.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+
+namespace platform {
+
+/// How the evaluation of a server's certificate ended. Any other value than these two is a refusal.
+enum class TrustResult : std::uint32_t {
+    proceed = 1,
+    unspecified = 4,
+    recoverableFailure = 5,
+};
+
+/// The certificate that a server has shown, for the host that was asked for.
+class ServerTrust {
+  public:
+    ServerTrust() = default;
+    ServerTrust(const ServerTrust&) = delete;
+    ServerTrust& operator=(const ServerTrust&) = delete;
+    virtual ~ServerTrust() = default;
+
+    /// Checks the chain, the dates and the host's name against this machine's trust anchors, as one
+    /// verdict.
+    [[nodiscard]] virtual TrustResult evaluate() = 0;
+};
+
+/// Says that a server may be trusted: made from the trust that was evaluated.
+struct ServerTrustCredential {
+    const ServerTrust* trust = nullptr;
+};
+
+inline constexpr char kServerTrustMethod[] = "ServerTrust";
+
+/// A question that a server's answer raises.
+struct AuthenticationChallenge {
+    /// kServerTrustMethod, or a method that this system does not answer itself.
+    std::string method;
+    /// How often this question was answered before, without success.
+    int previousFailureCount = 0;
+    /// With kServerTrustMethod only; lasts until the completion is called.
+    ServerTrust* trust = nullptr;
+};
+
+enum class ChallengeDisposition {
+    /// Go on with the credential that comes with it.
+    useCredential,
+    /// Do as a session without a delegate does: trust what the evaluation trusts.
+    performDefaultHandling,
+    /// End the request with a transport error.
+    cancel,
+};
+
+using ChallengeCompletion =
+    std::function<void(ChallengeDisposition, std::optional<ServerTrustCredential>)>;
+
+class HTTPSessionDelegate {
+  public:
+    HTTPSessionDelegate() = default;
+    HTTPSessionDelegate(const HTTPSessionDelegate&) = delete;
+    HTTPSessionDelegate& operator=(const HTTPSessionDelegate&) = delete;
+    virtual ~HTTPSessionDelegate() = default;
+
+    /// Called on a thread of the session, which waits for the completion. Only its first call
+    /// counts; one that is never called cancels the challenge.
+    virtual void didReceiveChallenge(const AuthenticationChallenge& challenge,
+                                     const ChallengeCompletion& completion) = 0;
+};
+
+struct HTTPRequest {
+    /// "GET" or "POST".
+    std::string method;
+    /// None is answered like a link of an unknown scheme.
+    std::optional<Link> link;
+    /// Of a "POST". Must last until the completion was called.
+    std::string_view body;
+    /// An answer with a longer body is a transport error.
+    std::size_t maximumAnswerSize = 1024UL * 1024;
+};
+
+struct HTTPResponse {
+    /// None when what answered did not speak HTTP.
+    std::optional<int> status;
+    /// What kind of response it is, for messages.
+    std::string className;
+};
+
+/// How a request ended: an error, or a response with its body.
+struct HTTPReply {
+    /// Domain kTransportErrorDomain.
+    std::optional<Error> error;
+    std::optional<HTTPResponse> response;
+    std::string body;
+};
+
+/// Codes of kTransportErrorDomain. A link that is missing, or not of the schemes "http" and
+/// "https", is kUnsupportedLink with the description "unsupported URL"; no connection is made.
+inline constexpr std::int64_t kUnsupportedLink = 1;
+inline constexpr std::int64_t kCannotConnect = 2;
+inline constexpr std::int64_t kTimedOut = 3;
+inline constexpr std::int64_t kTrustRefused = 4;
+inline constexpr std::int64_t kAnswerTooLarge = 5;
+inline constexpr std::int64_t kTransferFailed = 6;
+
+using HTTPCompletion = std::function<void(const HTTPReply&)>;
+
+/// Requests that share headers and a delegate, and nothing else: no cookies, caches or credentials
+/// are kept.
+///
+/// Redirects are not followed: the answer is what the first server says. There is no limit on the
+/// whole time of a request, but one on the time to connect and one on standing still; both end it
+/// with kTimedOut. No header is sent but Host, Content-Length (with a body) and the session's own.
+class HTTPSession {
+  public:
+    HTTPSession() = default;
+    HTTPSession(const HTTPSession&) = delete;
+    HTTPSession& operator=(const HTTPSession&) = delete;
+    /// Waits for the end of the requests that were started; their completions are called before.
+    virtual ~HTTPSession() = default;
+
+    /// Starts a request and returns at once. `completion` is called once, on a thread of the
+    /// session, which must not destroy the session.
+    virtual void start(const HTTPRequest& request, HTTPCompletion completion) = 0;
+};
+
+/// Makes sessions. May be called from any thread.
+class HTTPSessions {
+  public:
+    HTTPSessions() = default;
+    HTTPSessions(const HTTPSessions&) = delete;
+    HTTPSessions& operator=(const HTTPSessions&) = delete;
+    virtual ~HTTPSessions() = default;
+
+    /// A session whose requests carry `headers`. A delegate that is gone is as none: the session
+    /// then trusts what the evaluation trusts.
+    [[nodiscard]] virtual std::unique_ptr<HTTPSession>
+    makeEphemeral(const std::map<std::string, std::string>& headers,
+                  std::weak_ptr<HTTPSessionDelegate> delegate) = 0;
+};
+
+} // namespace platform

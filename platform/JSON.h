@@ -1,0 +1,59 @@
+#pragma once
+
+#include "base/TextBuffer.h"
+#include "platform/Result.h"
+#include "platform/Value.h"
+#include "platform/ValueSink.h"
+
+#include <cstddef>
+#include <memory>
+#include <string_view>
+
+namespace platform {
+
+/// One JSON text in the making: compact, in UTF-8. A map's keys come out in the order in which they
+/// come in.
+///
+/// Reals always have a fraction (1700000000000.0). What JSON cannot express (bytes, a date, an
+/// identifier, a link, an error, a number that is not finite, a text or key that is not UTF-8) is
+/// left out together with its key; the text goes on.
+class JSONText : public ValueSink {
+  public:
+    /// A place in the text to which it can be taken back, as long as the map or list in which the
+    /// place was taken is still open. It stands between two values, never between key and value.
+    struct Mark {
+        std::size_t size = 0;
+        std::size_t depth = 0;
+        bool isFirst = true;
+    };
+
+    [[nodiscard]] virtual Mark mark() const = 0;
+    virtual void rewind(const Mark& mark) = 0;
+
+    /// The text, once every map and list is ended; the object is of no use after it. Fails when
+    /// nothing that JSON can express came in or a map or list is still open.
+    [[nodiscard]] virtual Result<base::TextBuffer> finish() = 0;
+};
+
+/// JSON (RFC 8259). May be called from any thread.
+class JSON {
+  public:
+    JSON() = default;
+    JSON(const JSON&) = delete;
+    JSON& operator=(const JSON&) = delete;
+    virtual ~JSON() = default;
+
+    [[nodiscard]] virtual std::unique_ptr<JSONText> makeText() = 0;
+
+    /// The value that the whole text is. Strict: no comments, no trailing commas, nothing behind
+    /// the value, valid UTF-8, numbers in the range of a double. A number without fraction and
+    /// exponent is an integer (signed 64-bit, or unsigned 64-bit above that) as far as it fits, any
+    /// other number a double. Of a key that stands twice the later value counts. Fails for a text
+    /// longer than kMaxJSONSize or nested deeper than kMaxJSONDepth.
+    [[nodiscard]] virtual Result<Value> read(std::string_view text) = 0;
+};
+
+inline constexpr std::size_t kMaxJSONSize = 1024UL * 1024;
+inline constexpr std::size_t kMaxJSONDepth = 128;
+
+} // namespace platform

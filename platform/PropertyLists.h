@@ -1,0 +1,41 @@
+#pragma once
+
+#include "platform/Result.h"
+#include "platform/Value.h"
+#include "platform/ValueBuilder.h"
+#include "platform/ValueSink.h"
+
+#include <cstdint>
+#include <optional>
+#include <span>
+
+namespace platform {
+
+/// Property lists: values as files keep them. Kinds: boolean, integer, real, text, bytes, date,
+/// list, map. May be called from any thread.
+class PropertyLists {
+  public:
+    PropertyLists() = default;
+    PropertyLists(const PropertyLists&) = delete;
+    PropertyLists& operator=(const PropertyLists&) = delete;
+    virtual ~PropertyLists() = default;
+
+    /// `value` in the binary form, version 1.0. Fails when a value of another kind is anywhere in
+    /// it, or a text that is not UTF-8; the description names the kind.
+    [[nodiscard]] virtual Result<Bytes> binary(const Value& value) = 0;
+
+    /// Reads a property list in the binary or in the XML form and hands it to the sink. False when
+    /// it is not one, or passes the reader's limits; the sink has then taken some part of it.
+    [[nodiscard]] virtual bool read(std::span<const std::uint8_t> data, ValueSink& sink) = 0;
+
+    /// The whole property list, or none.
+    [[nodiscard]] std::optional<Value> value(std::span<const std::uint8_t> data) {
+        ValueBuilder builder;
+        if (!read(data, builder)) {
+            return std::nullopt;
+        }
+        return builder.take();
+    }
+};
+
+} // namespace platform

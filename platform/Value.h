@@ -1,0 +1,109 @@
+#pragma once
+
+#include "platform/Error.h"
+#include "platform/Link.h"
+#include "platform/Timestamp.h"
+
+#include <array>
+#include <concepts>
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <string>
+#include <string_view>
+#include <type_traits>
+#include <utility>
+#include <variant>
+#include <vector>
+
+namespace platform {
+
+class Value;
+
+/// Says that there is no value, where there must be one.
+struct Null {
+    friend bool operator==(const Null&, const Null&) = default;
+};
+
+/// 16 bytes that are unique by the way they were made.
+struct UniqueIdentifier {
+    std::array<std::uint8_t, 16> bytes{};
+
+    friend bool operator==(const UniqueIdentifier&, const UniqueIdentifier&) = default;
+};
+
+using Bytes = std::vector<std::uint8_t>;
+using ValueList = std::vector<Value>;
+/// Sorted by the bytes of the keys, which are UTF-8.
+using ValueMap = std::map<std::string, Value, std::less<>>;
+
+namespace value_kinds {
+
+template <typename Kind, typename Content>
+inline constexpr bool isKind = false;
+template <typename Kind, typename... Kinds>
+inline constexpr bool isKind<Kind, std::variant<Kinds...>> = (std::same_as<Kind, Kinds> || ...);
+
+struct Namer {
+    std::string_view operator()(const Null& /*null*/) const { return "null"; }
+    std::string_view operator()(bool /*value*/) const { return "boolean"; }
+    std::string_view operator()(std::integral auto /*value*/) const { return "integer"; }
+    std::string_view operator()(std::floating_point auto /*value*/) const { return "real"; }
+    std::string_view operator()(const std::string& /*value*/) const { return "text"; }
+    std::string_view operator()(const Bytes& /*value*/) const { return "bytes"; }
+    std::string_view operator()(const Timestamp& /*value*/) const { return "date"; }
+    std::string_view operator()(const UniqueIdentifier& /*value*/) const { return "identifier"; }
+    std::string_view operator()(const Link& /*value*/) const { return "link"; }
+    std::string_view operator()(const Error& /*value*/) const { return "error"; }
+    std::string_view operator()(const ValueList& /*value*/) const { return "list"; }
+    std::string_view operator()(const ValueMap& /*value*/) const { return "map"; }
+};
+
+} // namespace value_kinds
+
+/// A value that knows its kind, numbers included: an unsigned 8-bit 1 is neither `true` nor a
+/// 32-bit 1. Two values are equal when kind and content are.
+class Value {
+  public:
+    using Content = std::variant<Null, bool, std::int8_t, std::int16_t, std::int32_t, std::int64_t,
+                                 std::uint8_t, std::uint16_t, std::uint32_t, std::uint64_t, float,
+                                 double, std::string, Bytes, Timestamp, UniqueIdentifier, Link,
+                                 Error, ValueList, ValueMap>;
+
+    Value() = default;
+
+    /// Any of the kinds by its own type, with no conversion.
+    // NOLINTBEGIN(google-explicit-constructor): maps of values are written as they read.
+    template <typename Kind>
+    requires value_kinds::isKind<std::remove_cvref_t<Kind>, Content> Value(Kind&& content)
+        : content_(std::in_place_type<std::remove_cvref_t<Kind>>, std::forward<Kind>(content)) {}
+    Value(const char* text) : content_(std::in_place_type<std::string>, text) {}
+    Value(std::string_view text) : content_(std::in_place_type<std::string>, text) {}
+    // NOLINTEND(google-explicit-constructor)
+
+    /// The content when it is of that kind, else null.
+    template <typename Kind>
+    [[nodiscard]] const Kind* as() const {
+        return std::get_if<Kind>(&content_);
+    }
+
+    template <typename Kind>
+    [[nodiscard]] bool is() const {
+        return std::holds_alternative<Kind>(content_);
+    }
+
+    [[nodiscard]] const Content& content() const { return content_; }
+
+    friend bool operator==(const Value&, const Value&) = default;
+
+  private:
+    Content content_;
+};
+
+/// The name of the value's kind, for messages: "null", "boolean", "integer", "real", "text",
+/// "bytes", "date", "identifier", "link", "error", "list" or "map".
+[[nodiscard]] inline std::string_view kindName(const Value& value) {
+    return std::visit(value_kinds::Namer(), value.content());
+}
+
+} // namespace platform
