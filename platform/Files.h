@@ -74,6 +74,9 @@ class Files {
     /// regular file, larger than kMaxLoadSize or unreadable.
     [[nodiscard]] virtual std::optional<std::vector<std::uint8_t>>
     load(const std::string& path) = 0;
+
+    /// Where a library that opens files by itself finds the one that programs call `path`.
+    [[nodiscard]] virtual std::string locate(const std::string& path) const = 0;
 };
 
 /// What `load` reads at the most. The daemon's own files are tens of bytes.

@@ -9,6 +9,7 @@
 #include <optional>
 #include <set>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace platform {
@@ -29,15 +30,25 @@ struct FakeFileFailures {
 /// Files of one process on a FakeDisk. As on a real system the lowest free descriptor number is
 /// given out next, and a file's name is synced with the first sync of the process.
 ///
+/// Libraries cannot open files of a FakeDisk: what they open by themselves lies in a real
+/// directory, `realRoot`.
+///
 /// The streams must not outlive it.
 class FakeFiles final : public Files {
   public:
-    explicit FakeFiles(FakeDisk& disk) : disk_(disk) {}
+    explicit FakeFiles(FakeDisk& disk, std::string realRoot = kNoRealRoot)
+        : disk_(disk), realRoot_(std::move(realRoot)) {}
+
+    /// A root under which nothing can be made.
+    static constexpr char kNoRealRoot[] = "/dev/null";
 
     [[nodiscard]] OpenFile openForWriting(const std::string& path, ProtectionClass protection,
                                           int classOptions, unsigned mode) override;
     [[nodiscard]] std::unique_ptr<FileStream> attachStream(const OpenFile& file) override;
     [[nodiscard]] std::optional<std::vector<std::uint8_t>> load(const std::string& path) override;
+    [[nodiscard]] std::string locate(const std::string& path) const override {
+        return realRoot_ + path;
+    }
 
     /// What was called, in order: "open /var/root/x", "attach", "write 13" (the bytes asked for),
     /// "sync", "close", "load /var/root/x". A stream that is destroyed open closes itself.
@@ -65,6 +76,7 @@ class FakeFiles final : public Files {
     [[nodiscard]] int sync(FakeFile& file, const std::string& path);
 
     FakeDisk& disk_;
+    std::string realRoot_;
     std::vector<std::string> calls_;
     std::map<int, std::shared_ptr<FakeFile>> descriptors_;
     std::map<std::string, ProtectionClass> protections_;

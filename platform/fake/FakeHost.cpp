@@ -15,7 +15,7 @@ FakeHost::FakeHost(FakeMachine& machine)
     : registry(machine.kernel),
       channel(machine.kernel, registry),
       settings([this] { events.post(kSettingsStream, kSettingsChangedEvent); }),
-      files(machine.disk),
+      files(machine.disk, machine.realRoot),
       events(machine.clock, machine.alarms) {}
 
 Host FakeHost::host() {

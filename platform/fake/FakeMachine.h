@@ -3,7 +3,10 @@
 #include "platform/fake/FakeAlarmStore.h"
 #include "platform/fake/FakeClock.h"
 #include "platform/fake/FakeDisk.h"
+#include "platform/fake/FakeFiles.h"
 #include "platform/fake/FakeKernel.h"
+
+#include <string>
 
 namespace platform {
 
@@ -14,6 +17,8 @@ struct FakeMachine {
     FakeClock clock;
     FakeAlarmStore alarms;
     FakeDisk disk;
+    /// The real directory under which libraries find their files; without one they find nothing.
+    std::string realRoot = FakeFiles::kNoRealRoot;
     FakeKernel kernel;
 };
 

@@ -26,6 +26,9 @@ class LinuxFiles final : public Files {
                                           int classOptions, unsigned mode) override;
     [[nodiscard]] std::unique_ptr<FileStream> attachStream(const OpenFile& file) override;
     [[nodiscard]] std::optional<std::vector<std::uint8_t>> load(const std::string& path) override;
+    [[nodiscard]] std::string locate(const std::string& path) const override {
+        return paths_.under(path);
+    }
 
   private:
     friend class LinuxFileStream;

@@ -215,6 +215,10 @@ TEST_P(FilesContract, LoadsAllBytesOfAFile) {
     EXPECT_EQ(fixture().openDescriptors(), 0U);
 }
 
+TEST_P(FilesContract, LocatesFilesUnderTheRealRoot) {
+    EXPECT_EQ(files().locate("/var/root/x.db"), fixture().real("/var/root/x.db"));
+}
+
 TEST_P(FilesContract, LoadsUpToTheLargestSize) {
     for (const std::size_t size : {kMaxLoadSize - 1, kMaxLoadSize}) {
         fixture().put(kPath, run(size, 3), 0600);

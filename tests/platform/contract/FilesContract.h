@@ -23,6 +23,9 @@ struct FilesFixture {
 
     virtual platform::Files& files() = 0;
 
+    /// Where the file lies for libraries.
+    [[nodiscard]] virtual std::string real(const std::string& path) const = 0;
+
     virtual void makeDirectory(const std::string& path) = 0;
     virtual void put(const std::string& path, const Bytes& bytes, unsigned mode) = 0;
     [[nodiscard]] virtual std::optional<Bytes> bytesOf(const std::string& path) = 0;

@@ -11,6 +11,7 @@ class FakeFilesFixture final : public FilesFixture {
     FakeFilesFixture() { disk_.makeDirectory("/var/root"); }
 
     platform::Files& files() override { return files_; }
+    std::string real(const std::string& path) const override { return "/some/directory" + path; }
     void makeDirectory(const std::string& path) override { disk_.makeDirectory(path); }
     void put(const std::string& path, const Bytes& bytes, unsigned mode) override {
         disk_.put(path, bytes, mode);
@@ -22,7 +23,7 @@ class FakeFilesFixture final : public FilesFixture {
 
   private:
     platform::FakeDisk disk_;
-    platform::FakeFiles files_{disk_};
+    platform::FakeFiles files_{disk_, "/some/directory"};
 };
 
 } // namespace

@@ -14,6 +14,7 @@ class LinuxFilesFixture final : public FilesFixture {
     LinuxFilesFixture() { root_.makeDirectory("/var/root"); }
 
     platform::Files& files() override { return files_; }
+    std::string real(const std::string& path) const override { return root_.real(path); }
     void makeDirectory(const std::string& path) override { root_.makeDirectory(path); }
     void put(const std::string& path, const Bytes& bytes, unsigned mode) override {
         root_.put(path, bytes, mode);
