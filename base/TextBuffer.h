@@ -36,6 +36,17 @@ class TextBuffer {
         ++size_;
     }
 
+    /// Appends the text between two of the character.
+    void append(std::string_view text, char around) {
+        char* const place = extend(text.size() + 2);
+        *place = around;
+        if (!text.empty()) {
+            std::memcpy(place + 1, text.data(), text.size());
+        }
+        place[text.size() + 1] = around;
+        size_ += text.size() + 2;
+    }
+
     /// Shortens the text to its first `size` bytes, of which it must have so many.
     void truncate(std::size_t size) { size_ = size; }
 

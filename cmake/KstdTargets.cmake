@@ -15,6 +15,12 @@ if(KSTD_SANITIZE)
     target_link_options(kstd_options INTERFACE -fsanitize=${KSTD_SANITIZE})
 endif()
 
+# What a fuzz target runs through tells it where it went.
+if(KSTD_FUZZ)
+    target_compile_options(kstd_options INTERFACE -fsanitize=fuzzer-no-link)
+    target_link_options(kstd_options INTERFACE -fsanitize=fuzzer-no-link)
+endif()
+
 # The standard headers that most sources include, compiled once. A source still includes what it uses:
 # the clang preset builds without them, which shows where one is missing.
 file(WRITE "${CMAKE_BINARY_DIR}/StandardHeaders.cpp" "")

@@ -52,7 +52,8 @@ struct AuthenticationChallenge {
 };
 
 enum class ChallengeDisposition {
-    /// Go on with the credential that comes with it.
+    /// Go on with the credential that comes with it. Without one that is made from the challenge's
+    /// own trust this is as cancel.
     useCredential,
     /// Do as a session without a delegate does: trust what the evaluation trusts.
     performDefaultHandling,
@@ -70,8 +71,9 @@ class HTTPSessionDelegate {
     HTTPSessionDelegate& operator=(const HTTPSessionDelegate&) = delete;
     virtual ~HTTPSessionDelegate() = default;
 
-    /// Called on a thread of the session, which waits for the completion. Only its first call
-    /// counts; one that is never called cancels the challenge.
+    /// Called on a thread of the session, which waits for the completion. It may be called on any
+    /// thread. Only its first call counts; when its last copy is gone without one, the challenge is
+    /// cancelled.
     virtual void didReceiveChallenge(const AuthenticationChallenge& challenge,
                                      const ChallengeCompletion& completion) = 0;
 };
@@ -82,7 +84,7 @@ struct HTTPRequest {
     /// None is answered like a link of an unknown scheme.
     std::optional<Link> link;
     /// Of a "POST". Must last until the completion was called.
-    std::string_view body;
+    std::string_view body = {};
     /// An answer with a longer body is a transport error.
     std::size_t maximumAnswerSize = 1024UL * 1024;
 };
@@ -102,8 +104,9 @@ struct HTTPReply {
     std::string body;
 };
 
-/// Codes of kTransportErrorDomain. A link that is missing, or not of the schemes "http" and
-/// "https", is kUnsupportedLink with the description "unsupported URL"; no connection is made.
+/// Codes of kTransportErrorDomain. A link that is missing, names no host, or is not of the schemes
+/// "http" and "https" (in any letter case), is kUnsupportedLink with the description
+/// "unsupported URL"; no connection is made.
 inline constexpr std::int64_t kUnsupportedLink = 1;
 inline constexpr std::int64_t kCannotConnect = 2;
 inline constexpr std::int64_t kTimedOut = 3;

@@ -46,10 +46,11 @@ class JSON {
     [[nodiscard]] virtual std::unique_ptr<JSONText> makeText() = 0;
 
     /// The value that the whole text is. Strict: no comments, no trailing commas, nothing behind
-    /// the value, valid UTF-8, numbers in the range of a double. A number without fraction and
-    /// exponent is an integer (signed 64-bit, or unsigned 64-bit above that) as far as it fits, any
-    /// other number a double. Of a key that stands twice the later value counts. Fails for a text
-    /// longer than kMaxJSONSize or nested deeper than kMaxJSONDepth.
+    /// the value, valid UTF-8, numbers in the range of a double (one too small to be told from zero
+    /// is out of it). A number without fraction and exponent is an integer (signed 64-bit, or
+    /// unsigned 64-bit above that) as far as it fits, any other number a double. Of a key that
+    /// stands twice the later value counts. Fails for a text longer than kMaxJSONSize or nested
+    /// deeper than kMaxJSONDepth; the error says why and at which byte.
     [[nodiscard]] virtual Result<Value> read(std::string_view text) = 0;
 };
 

@@ -14,7 +14,8 @@ struct Link {
 
     /// What stands before the first colon, as it was written.
     [[nodiscard]] std::string_view scheme() const {
-        return std::string_view(text).substr(0, text.find(':'));
+        const std::string_view all(text);
+        return {all.begin(), std::find(all.begin(), all.end(), ':')};
     }
 
     friend bool operator==(const Link&, const Link&) = default;

@@ -20,8 +20,10 @@ class PropertyLists {
     PropertyLists& operator=(const PropertyLists&) = delete;
     virtual ~PropertyLists() = default;
 
-    /// `value` in the binary form, version 1.0. Fails when a value of another kind is anywhere in
-    /// it, or a text that is not UTF-8; the description names the kind.
+    /// `value` in the binary form, version 1.0. Fails with an error of kGenericErrorDomain when a
+    /// value of another kind is anywhere in it, or a text that is not UTF-8 or holds a NUL; the
+    /// description names the kind. Fails also when lists and maps are too deep in each other; what
+    /// was written can always be read.
     [[nodiscard]] virtual Result<Bytes> binary(const Value& value) = 0;
 
     /// Reads a property list in the binary or in the XML form and hands it to the sink. False when

@@ -75,8 +75,8 @@ class Value {
     /// Any of the kinds by its own type, with no conversion.
     // NOLINTBEGIN(google-explicit-constructor): maps of values are written as they read.
     template <typename Kind>
-    requires value_kinds::isKind<std::remove_cvref_t<Kind>, Content> Value(Kind&& content)
-        : content_(std::in_place_type<std::remove_cvref_t<Kind>>, std::forward<Kind>(content)) {}
+    requires value_kinds::isKind<Kind, Content> Value(Kind content)
+        : content_(std::in_place_type<Kind>, std::move(content)) {}
     Value(const char* text) : content_(std::in_place_type<std::string>, text) {}
     Value(std::string_view text) : content_(std::in_place_type<std::string>, text) {}
     // NOLINTEND(google-explicit-constructor)

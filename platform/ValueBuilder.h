@@ -43,8 +43,7 @@ class ValueBuilder final : public ValueSink {
     void closeInnermost() {
         Open innermost = std::move(open_.back());
         open_.pop_back();
-        std::visit([this](auto&& content) { add(std::move(content)); },
-                   std::move(innermost.content));
+        std::visit([this](auto& content) { add(std::move(content)); }, innermost.content);
     }
 
     void add(Value value) {

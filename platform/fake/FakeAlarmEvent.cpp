@@ -2,7 +2,7 @@
 
 namespace platform {
 
-FakeAlarmEvent::FakeAlarmEvent(FakeAlarmStore& store, const FakeClock& clock, EventQueue& queue)
+FakeAlarmEvent::FakeAlarmEvent(FakeAlarmStore& store, Clock& clock, EventQueue& queue)
     : store_(store), clock_(clock), queue_(queue) {}
 
 void FakeAlarmEvent::set(std::string_view stream, std::string_view event,

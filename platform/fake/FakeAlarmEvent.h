@@ -1,8 +1,8 @@
 #pragma once
 
+#include "platform/Clock.h"
 #include "platform/EventStream.h"
 #include "platform/fake/FakeAlarmStore.h"
-#include "platform/fake/FakeClock.h"
 #include "platform/shared/AlarmRegistrations.h"
 #include "platform/shared/EventQueue.h"
 
@@ -18,7 +18,7 @@ namespace platform {
 /// stream gets its handler.
 class FakeAlarmEvent final : public AlarmEvent {
   public:
-    FakeAlarmEvent(FakeAlarmStore& store, const FakeClock& clock, EventQueue& queue);
+    FakeAlarmEvent(FakeAlarmStore& store, Clock& clock, EventQueue& queue);
 
     void set(std::string_view stream, std::string_view event,
              const EventDictionary* dictionary) override;
@@ -41,7 +41,7 @@ class FakeAlarmEvent final : public AlarmEvent {
     void cancel(const Name& name);
 
     FakeAlarmStore& store_;
-    const FakeClock& clock_;
+    Clock& clock_;
     EventQueue& queue_;
     AlarmRegistrations registrations_;
 };

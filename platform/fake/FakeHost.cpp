@@ -16,18 +16,28 @@ FakeHost::FakeHost(FakeMachine& machine)
       channel(machine.kernel, registry),
       settings([this] { events.post(kSettingsStream, kSettingsChangedEvent); }),
       files(machine.disk, machine.realRoot),
-      events(machine.clock, machine.alarms) {}
+      events(machine.clock, machine.alarms),
+      machine_(machine) {}
 
 Host FakeHost::host() {
-    return {log,
-            registry,
-            channel,
-            events.events(),
-            events.alarms(),
-            events.transactions(),
-            events.runLoop(),
-            settings,
-            files};
+    return {.log = log,
+            .registry = registry,
+            .channel = channel,
+            .events = events.events(),
+            .alarms = events.alarms(),
+            .transactions = events.transactions(),
+            .runLoop = events.runLoop(),
+            .settings = settings,
+            .files = files,
+            .clock = machine_.clock,
+            .propertyLists = propertyLists,
+            .json = json,
+            .defaults = defaults,
+            .resources = resources,
+            .version = version,
+            .diagnostics = diagnostics,
+            .queues = queues,
+            .https = https};
 }
 
 } // namespace platform

@@ -1,13 +1,21 @@
 #pragma once
 
 #include "platform/Host.h"
+#include "platform/fake/FakeConfigurationResource.h"
 #include "platform/fake/FakeEventHost.h"
 #include "platform/fake/FakeFiles.h"
+#include "platform/fake/FakeHTTPSessions.h"
+#include "platform/fake/FakeInternalDiagnostics.h"
+#include "platform/fake/FakeJSON.h"
 #include "platform/fake/FakeKernelChannel.h"
 #include "platform/fake/FakeMachine.h"
 #include "platform/fake/FakeManagedSettings.h"
+#include "platform/fake/FakePropertyLists.h"
+#include "platform/fake/FakeSerialQueues.h"
 #include "platform/fake/FakeServiceRegistry.h"
 #include "platform/fake/FakeSystemLog.h"
+#include "platform/fake/FakeSystemVersion.h"
+#include "platform/fake/FakeUserDefaults.h"
 
 namespace platform {
 
@@ -25,8 +33,19 @@ class FakeHost {
     FakeKernelChannel channel;
     FakeManagedSettings settings;
     FakeFiles files;
+    FakePropertyLists propertyLists;
+    FakeJSON json;
+    FakeUserDefaults defaults;
+    FakeConfigurationResource resources;
+    FakeSystemVersion version;
+    FakeInternalDiagnostics diagnostics;
+    FakeSerialQueues queues;
+    FakeHTTPSessions https;
     /// Last, because the handlers in it may use all the others until they are destroyed.
     FakeEventHost events;
+
+  private:
+    FakeMachine& machine_;
 };
 
 } // namespace platform

@@ -4,15 +4,24 @@
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/IdleExit.h"
 #include "platform/linux/LinuxAlarm.h"
+#include "platform/linux/LinuxClock.h"
+#include "platform/linux/LinuxConfigurationResource.h"
 #include "platform/linux/LinuxEventStream.h"
 #include "platform/linux/LinuxFiles.h"
+#include "platform/linux/LinuxHTTPSessions.h"
+#include "platform/linux/LinuxInternalDiagnostics.h"
 #include "platform/linux/LinuxKernelChannel.h"
 #include "platform/linux/LinuxManagedSettings.h"
 #include "platform/linux/LinuxProcessTransactions.h"
+#include "platform/linux/LinuxPropertyLists.h"
 #include "platform/linux/LinuxRunLoop.h"
 #include "platform/linux/LinuxServiceRegistry.h"
 #include "platform/linux/LinuxSystemLog.h"
+#include "platform/linux/LinuxSystemVersion.h"
+#include "platform/linux/LinuxUserDefaults.h"
 #include "platform/linux/SettingsWatch.h"
+#include "platform/shared/JSONCodec.h"
+#include "platform/shared/SerialQueueOfOne.h"
 
 #include <systemd/sd-daemon.h>
 
@@ -28,6 +37,11 @@ struct LinuxHost::Parts {
         : log(options.paths),
           files(options.paths),
           settings(options.paths, log),
+          defaults(options.paths, propertyLists, log),
+          resources(options.paths, propertyLists, log),
+          version(options.paths),
+          diagnostics(options.paths),
+          https(options.https),
           registry(options.paths.kernelSocket(), log),
           channel(options.paths.kernelSocket(), registry, log),
           runLoop(log),
@@ -79,6 +93,15 @@ struct LinuxHost::Parts {
     LinuxSystemLog log;
     LinuxFiles files;
     LinuxManagedSettings settings;
+    LinuxClock clock;
+    LinuxPropertyLists propertyLists;
+    LinuxUserDefaults defaults;
+    LinuxConfigurationResource resources;
+    LinuxSystemVersion version;
+    LinuxInternalDiagnostics diagnostics;
+    JSONCodec json;
+    SerialQueuesOfOne queues;
+    LinuxHTTPSessions https;
     LinuxServiceRegistry registry;
     LinuxKernelChannel channel;
     LinuxProcessTransactions transactions;
@@ -102,8 +125,24 @@ void LinuxHost::closeStreams() {
 }
 
 Host LinuxHost::interfaces() {
-    return {parts_->log,          parts_->registry, parts_->channel,  parts_->events, parts_->alarm,
-            parts_->transactions, parts_->runLoop,  parts_->settings, parts_->files};
+    return {.log = parts_->log,
+            .registry = parts_->registry,
+            .channel = parts_->channel,
+            .events = parts_->events,
+            .alarms = parts_->alarm,
+            .transactions = parts_->transactions,
+            .runLoop = parts_->runLoop,
+            .settings = parts_->settings,
+            .files = parts_->files,
+            .clock = parts_->clock,
+            .propertyLists = parts_->propertyLists,
+            .json = parts_->json,
+            .defaults = parts_->defaults,
+            .resources = parts_->resources,
+            .version = parts_->version,
+            .diagnostics = parts_->diagnostics,
+            .queues = parts_->queues,
+            .https = parts_->https};
 }
 
 } // namespace platform

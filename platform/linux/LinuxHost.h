@@ -2,6 +2,7 @@
 
 #include "base/FileDescriptor.h"
 #include "platform/Host.h"
+#include "platform/linux/LinuxHTTPSessions.h"
 #include "platform/linux/Paths.h"
 
 #include <chrono>
@@ -18,6 +19,7 @@ struct LinuxHostOptions {
     base::FileDescriptor eventSocket{};
     /// How long the process stays idle before the host closes its streams; none is for ever.
     std::optional<std::chrono::milliseconds> idleTime = std::nullopt;
+    LinuxHTTPOptions https{};
 };
 
 /// All interfaces of the platform on this machine, made and owned in one place.

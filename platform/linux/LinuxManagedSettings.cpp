@@ -1,26 +1,13 @@
 #include "platform/linux/LinuxManagedSettings.h"
 
 #include "base/Concat.h"
+#include "platform/linux/FileTrust.h"
 #include "platform/linux/ManagedSettingsText.h"
-
-#include <sys/stat.h>
-#include <system_error>
-#include <unistd.h>
+#include "platform/linux/RegularFile.h"
 
 namespace platform {
 
 namespace {
-
-std::string reasonOf(const RegularFile& file) {
-    switch (file.failure) {
-    case ReadFailure::notRegular:
-        return "not a regular file";
-    case ReadFailure::tooLarge:
-        return base::concat("larger than ", LinuxManagedSettings::kMaxSize, " bytes");
-    default:
-        return base::concat("cannot be read: ", std::generic_category().message(file.error));
-    }
-}
 
 std::string_view textOf(const RegularFile& file) {
     return {reinterpret_cast<const char*>(file.bytes.data()), file.bytes.size()};
@@ -36,10 +23,7 @@ bool LinuxManagedSettings::isRestrictedModeAllowed() {
     if (file.failure == ReadFailure::missing) {
         return true;
     }
-    if (file.failure != ReadFailure::none) {
-        return allowedInDoubt(reasonOf(file));
-    }
-    if (const std::string reason = distrust(file); !reason.empty()) {
+    if (const std::string reason = distrust(file, kMaxSize); !reason.empty()) {
         return allowedInDoubt(reason);
     }
     const ManagedSettingsText settings = parseManagedSettings(textOf(file));
@@ -53,17 +37,6 @@ bool LinuxManagedSettings::isRestrictedModeAllowed() {
             {});
     }
     return settings.restrictedModeAllowed;
-}
-
-std::string LinuxManagedSettings::distrust(const RegularFile& file) {
-    if (file.status.st_uid != 0 && file.status.st_uid != ::geteuid()) {
-        return base::concat("owned by user ", file.status.st_uid,
-                            ", neither root nor the daemon's own");
-    }
-    if ((file.status.st_mode & (S_IWGRP | S_IWOTH)) != 0) {
-        return "writable by group or others";
-    }
-    return {};
 }
 
 bool LinuxManagedSettings::allowedInDoubt(std::string_view reason) {

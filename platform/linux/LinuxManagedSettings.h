@@ -3,7 +3,6 @@
 #include "platform/ManagedSettings.h"
 #include "platform/SystemLog.h"
 #include "platform/linux/Paths.h"
-#include "platform/linux/RegularFile.h"
 
 #include <cstddef>
 #include <string>
@@ -27,9 +26,6 @@ class LinuxManagedSettings final : public ManagedSettings {
     static constexpr std::size_t kMaxSize = 64UL * 1024;
 
   private:
-    /// Why the file that was read counts for nothing; empty when it counts.
-    [[nodiscard]] static std::string distrust(const RegularFile& file);
-
     bool allowedInDoubt(std::string_view reason);
 
     std::string path_;

@@ -28,4 +28,22 @@ std::string Paths::under(std::string_view absolutePath) const {
     return base::concat(prefix_, '/', withoutLeadingSlashes(absolutePath));
 }
 
+std::string Paths::userDefaults(std::string_view domain) const {
+    return under(base::concat("/etc/kstd/", domain, ".plist"));
+}
+
+std::string Paths::configurationResource(std::string_view component, std::string_view name) const {
+    return under(base::concat("/usr/share/", component, '/', name, ".plist"));
+}
+
+std::string Paths::internalDiagnostics(std::string_view subsystem) const {
+    return under(base::concat("/etc/kstd/internal-diagnostics/", subsystem));
+}
+
+bool isPlainFileName(std::string_view name) {
+    constexpr std::string_view kNotInNames("/\0", 2);
+    return !name.empty() && name != "." && name != ".." &&
+           name.find_first_of(kNotInNames) == std::string_view::npos;
+}
+
 } // namespace platform

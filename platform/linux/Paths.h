@@ -26,10 +26,22 @@ class Paths {
     [[nodiscard]] std::string alarmDirectory() const { return under("/var/lib/kstd/alarms"); }
     [[nodiscard]] std::string journalSocket() const { return under("/run/systemd/journal/socket"); }
     [[nodiscard]] std::string stateDirectory() const { return under("/var/root"); }
+    [[nodiscard]] std::string osRelease() const { return under("/etc/os-release"); }
+    [[nodiscard]] std::string vendorOsRelease() const { return under("/usr/lib/os-release"); }
+
+    // Each name is a plain file name.
+    [[nodiscard]] std::string userDefaults(std::string_view domain) const;
+    [[nodiscard]] std::string configurationResource(std::string_view component,
+                                                    std::string_view name) const;
+    [[nodiscard]] std::string internalDiagnostics(std::string_view subsystem) const;
 
   private:
     /// The root without a slash at its end; empty for "/".
     std::string prefix_;
 };
+
+/// Whether the text can be a file's name, or the first part of one, without leading out of the
+/// directory.
+[[nodiscard]] bool isPlainFileName(std::string_view name);
 
 } // namespace platform

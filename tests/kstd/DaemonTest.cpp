@@ -2,6 +2,7 @@
 
 #include "platform/EventStream.h"
 #include "tests/kstd/DaemonFixture.h"
+#include "tests/kstd/HostWith.h"
 
 #include <gmock/gmock.h>
 
@@ -53,13 +54,6 @@ class DaemonTest : public DaemonFixture {
     int runUntilIdle(Daemon::Services services) {
         fake.events.runLoop().onIdle([this] { fake.events.closeSources(); });
         return Daemon(fake.host(), std::move(services)).run();
-    }
-
-    /// The fake host with other event streams.
-    platform::Host hostWith(platform::EventStream& events) {
-        const platform::Host host = fake.host();
-        return {host.log,          host.registry, host.channel,  events,    host.alarms,
-                host.transactions, host.runLoop,  host.settings, host.files};
     }
 
     std::vector<std::string> diary;
@@ -126,7 +120,7 @@ class SubscriptionDiary final : public platform::EventStream {
 
 TEST_F(DaemonTest, AllServicesAreStartedBeforeTheFirstStreamIsSubscribed) {
     SubscriptionDiary events(diary);
-    const platform::Host host = hostWith(events);
+    const platform::Host host = hostWith({.events = &events}, fake.host());
     fake.events.closeSources();
     EXPECT_EQ(Daemon(host, {witness("first"), witness("second")}).run(), 0);
     EXPECT_THAT(diary,
@@ -138,7 +132,7 @@ TEST_F(DaemonTest, AllServicesAreStartedBeforeTheFirstStreamIsSubscribed) {
 
 TEST_F(DaemonTest, TheAlarmStreamIsSubscribedWhenTheListIsMade) {
     SubscriptionDiary events(diary);
-    const platform::Host host = hostWith(events);
+    const platform::Host host = hostWith({.events = &events}, fake.host());
     const auto services = makeServices(host);
     EXPECT_THAT(diary, ElementsAre("subscribe com.zerva.alarm"));
 }

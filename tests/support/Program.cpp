@@ -17,8 +17,21 @@ namespace {
 
 using Clock = std::chrono::steady_clock;
 
-[[noreturn]] void become(const std::vector<std::string>& arguments, int output) {
+struct Pipe {
+    Pipe() {
+        if (::pipe2(ends, O_CLOEXEC) != 0) {
+            throw std::runtime_error("cannot make a pipe");
+        }
+    }
+
+    int ends[2] = {-1, -1};
+};
+
+[[noreturn]] void become(const std::vector<std::string>& arguments, int input, int output) {
     ::prctl(PR_SET_PDEATHSIG, SIGKILL);
+    if (input >= 0) {
+        ::dup2(input, STDIN_FILENO);
+    }
     ::dup2(output, STDOUT_FILENO);
     ::dup2(output, STDERR_FILENO);
     std::vector<char*> words;
@@ -37,17 +50,23 @@ int millisecondsUntil(Clock::time_point deadline) {
 
 } // namespace
 
-Program::Program(const std::vector<std::string>& arguments) {
-    int ends[2];
-    if (::pipe2(ends, O_CLOEXEC) != 0) {
-        throw std::runtime_error("cannot make a pipe");
+Program::Program(const std::vector<std::string>& arguments, Input input) {
+    const Pipe output;
+    int theirInput = -1;
+    if (input == Input::pipe) {
+        const Pipe pipe;
+        theirInput = pipe.ends[0];
+        input_ = pipe.ends[1];
     }
     pid_ = ::fork();
     if (pid_ == 0) {
-        become(arguments, ends[1]);
+        become(arguments, theirInput, output.ends[1]);
     }
-    ::close(ends[1]);
-    output_ = ends[0];
+    ::close(output.ends[1]);
+    output_ = output.ends[0];
+    if (theirInput >= 0) {
+        ::close(theirInput);
+    }
 }
 
 Program::~Program() {
@@ -56,6 +75,25 @@ Program::~Program() {
         ::waitpid(pid_, nullptr, 0);
     }
     ::close(output_);
+    endInput();
+}
+
+void Program::writeLine(const std::string& line) const {
+    const std::string whole = line + '\n';
+    for (std::size_t done = 0; done < whole.size();) {
+        const ssize_t written = ::write(input_, whole.data() + done, whole.size() - done);
+        if (written < 0 && errno != EINTR) {
+            throw std::runtime_error("a program does not read its input any more");
+        }
+        done += written > 0 ? static_cast<std::size_t>(written) : 0;
+    }
+}
+
+void Program::endInput() {
+    if (input_ >= 0) {
+        ::close(input_);
+        input_ = -1;
+    }
 }
 
 void Program::signal(int number) const {

@@ -17,12 +17,19 @@ inline constexpr std::chrono::seconds kPatience{30};
 /// killed at the end of the test if it still runs.
 class Program {
   public:
-    explicit Program(const std::vector<std::string>& arguments);
+    enum class Input { ofTest, pipe };
+
+    explicit Program(const std::vector<std::string>& arguments, Input input = Input::ofTest);
     Program(const Program&) = delete;
     Program& operator=(const Program&) = delete;
     ~Program();
 
     [[nodiscard]] pid_t pid() const { return pid_; }
+
+    /// Writes a line to the program's standard input, which must be a pipe.
+    void writeLine(const std::string& line) const;
+    /// Ends the program's standard input, which must be a pipe.
+    void endInput();
 
     /// Reads on until a line holds `text`, and returns that line; none when the program's output
     /// ended or patience did. Lines before it are kept in `lines`.
@@ -44,6 +51,7 @@ class Program {
     [[nodiscard]] bool readMore(std::chrono::steady_clock::time_point deadline);
 
     pid_t pid_ = -1;
+    int input_ = -1;
     int output_ = -1;
     std::string partial_;
     std::vector<std::string> lines_;

@@ -18,6 +18,11 @@ TEST(PathsTest, SystemRootAddsNothing) {
     EXPECT_EQ(paths.alarmDirectory(), "/var/lib/kstd/alarms");
     EXPECT_EQ(paths.journalSocket(), "/run/systemd/journal/socket");
     EXPECT_EQ(paths.stateDirectory(), "/var/root");
+    EXPECT_EQ(paths.osRelease(), "/etc/os-release");
+    EXPECT_EQ(paths.vendorOsRelease(), "/usr/lib/os-release");
+    EXPECT_EQ(paths.userDefaults("com.x"), "/etc/kstd/com.x.plist");
+    EXPECT_EQ(paths.configurationResource("x", "Y"), "/usr/share/x/Y.plist");
+    EXPECT_EQ(paths.internalDiagnostics("x"), "/etc/kstd/internal-diagnostics/x");
 }
 
 TEST(PathsTest, OtherRootStandsInFront) {

@@ -1,0 +1,43 @@
+#pragma once
+
+#include "platform/HTTPSession.h"
+
+#include <memory>
+#include <openssl/ssl.h>
+#include <optional>
+#include <string>
+
+namespace platform {
+
+/// Decides for a connection whether its server is trusted: evaluates, asks the delegate, and lets
+/// the handshake go on or fail.
+class TrustCheck {
+  public:
+    /// `host` is a name or an address; `anchors` a file or a directory as in LinuxHTTPOptions.
+    TrustCheck(std::string host, std::string anchors, std::weak_ptr<HTTPSessionDelegate> delegate);
+    TrustCheck(const TrustCheck&) = delete;
+    TrustCheck& operator=(const TrustCheck&) = delete;
+    ~TrustCheck() = default;
+
+    /// Makes this the only check of the connections of `context`, with no other trust anchors. This
+    /// must outlast them. False when `context` cannot be made to; it must then not be used.
+    [[nodiscard]] bool install(SSL_CTX* context);
+
+    /// Why the server was refused; none while it was not.
+    [[nodiscard]] const std::optional<std::string>& refusal() const { return refusal_; }
+
+  private:
+    static int verify(X509_STORE_CTX* chain, void* check) noexcept;
+
+    [[nodiscard]] bool requireHost(X509_VERIFY_PARAM* parameters) const;
+    [[nodiscard]] bool loadAnchors(SSL_CTX* context);
+    [[nodiscard]] bool isAccepted(X509_STORE_CTX* chain);
+
+    std::string host_;
+    std::string anchors_;
+    std::weak_ptr<HTTPSessionDelegate> delegate_;
+    bool hasAnchors_ = false;
+    std::optional<std::string> refusal_;
+};
+
+} // namespace platform

@@ -1,0 +1,64 @@
+#include "platform/shared/RequestThreads.h"
+
+#include <iterator>
+#include <system_error>
+#include <utility>
+
+namespace platform {
+
+RequestThreads::~RequestThreads() {
+    // A request may start another one until it has ended.
+    for (;;) {
+        std::list<Request> requests;
+        {
+            const std::lock_guard lock(mutex_);
+            if (requests_.empty()) {
+                return;
+            }
+            requests.splice(requests.end(), requests_);
+        }
+        join(std::move(requests));
+    }
+}
+
+bool RequestThreads::start(std::function<void()> work) {
+    join(takeEnded());
+    const std::lock_guard lock(mutex_);
+    const auto request = requests_.emplace(requests_.end());
+    try {
+        request->thread = std::thread(
+            [this, request, work = std::move(work)]() mutable { run(request, std::move(work)); });
+    } catch (const std::system_error&) {
+        requests_.erase(request);
+        return false;
+    }
+    return true;
+}
+
+void RequestThreads::run(std::list<Request>::iterator request, std::function<void()> work) {
+    work();
+    work = nullptr;
+    const std::lock_guard lock(mutex_);
+    request->ended = true;
+}
+
+std::list<RequestThreads::Request> RequestThreads::takeEnded() {
+    const std::lock_guard lock(mutex_);
+    std::list<Request> ended;
+    for (auto request = requests_.begin(); request != requests_.end();) {
+        const auto next = std::next(request);
+        if (request->ended) {
+            ended.splice(ended.end(), requests_, request);
+        }
+        request = next;
+    }
+    return ended;
+}
+
+void RequestThreads::join(std::list<Request> requests) {
+    for (Request& request : requests) {
+        request.thread.join();
+    }
+}
+
+} // namespace platform

@@ -1,0 +1,92 @@
+#include "base/TextBuffer.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <utility>
+
+namespace {
+
+using base::TextBuffer;
+
+TEST(TextBufferTest, NothingAtFirst) {
+    const TextBuffer buffer;
+    EXPECT_EQ(buffer.size(), 0U);
+    EXPECT_EQ(buffer.view(), "");
+}
+
+TEST(TextBufferTest, GrowsByTextsAndCharacters) {
+    TextBuffer buffer;
+    buffer.append("ab");
+    buffer.append('c');
+    buffer.append("");
+    buffer.append(std::string_view());
+    buffer.append(std::string_view("\0d", 2));
+    EXPECT_EQ(buffer.view(), std::string_view("abc\0d", 5));
+    EXPECT_EQ(buffer.size(), 5U);
+}
+
+TEST(TextBufferTest, TextBetweenTwoCharacters) {
+    TextBuffer buffer;
+    buffer.append("ab", '"');
+    buffer.append(std::string_view(), '|');
+    buffer.append(std::string(100, 'x'), '\0');
+    std::string expected = "\"ab\"||";
+    expected.push_back('\0');
+    expected.append(100, 'x');
+    expected.push_back('\0');
+    EXPECT_EQ(buffer.view(), expected);
+}
+
+TEST(TextBufferTest, KeepsWhatIsThereWhileItGrows) {
+    TextBuffer buffer;
+    std::string expected;
+    for (std::size_t i = 0; i < 2000; ++i) {
+        const auto character = static_cast<char>('a' + i % 26);
+        buffer.append(character);
+        expected.push_back(character);
+        ASSERT_EQ(buffer.view(), expected);
+    }
+    const std::string large(1 << 20, 'x');
+    buffer.append(large);
+    EXPECT_EQ(buffer.view(), expected + large);
+}
+
+TEST(TextBufferTest, ShortenedToEveryLength) {
+    for (std::size_t size = 0; size <= 3; ++size) {
+        TextBuffer buffer;
+        buffer.append("abc");
+        buffer.truncate(size);
+        EXPECT_EQ(buffer.size(), size);
+        buffer.append('z');
+        EXPECT_EQ(buffer.view(), std::string("abc").substr(0, size) + 'z');
+    }
+}
+
+TEST(TextBufferTest, MovedWithoutACopy) {
+    TextBuffer from;
+    from.append("text");
+    const char* const characters = from.view().data();
+
+    TextBuffer to(std::move(from));
+    EXPECT_EQ(to.view(), "text");
+    EXPECT_EQ(to.view().data(), characters);
+
+    TextBuffer third;
+    third.append("gone");
+    third = std::move(to);
+    EXPECT_EQ(third.view().data(), characters);
+}
+
+TEST(TextBufferTest, UsableAfterMoving) {
+    TextBuffer from;
+    from.append("text");
+    const TextBuffer to = std::move(from);
+    // NOLINTNEXTLINE(bugprone-use-after-move): empty is what it must be.
+    EXPECT_EQ(from.view(), "");
+    from.append("more");
+    EXPECT_EQ(from.view(), "more");
+    EXPECT_EQ(to.view(), "text");
+}
+
+} // namespace

@@ -1,0 +1,22 @@
+#pragma once
+
+#include "platform/SerialQueue.h"
+#include "tests/platform/contract/ContractTest.h"
+
+namespace contract {
+
+struct SerialQueueFixture {
+    SerialQueueFixture() = default;
+    SerialQueueFixture(const SerialQueueFixture&) = delete;
+    SerialQueueFixture& operator=(const SerialQueueFixture&) = delete;
+    virtual ~SerialQueueFixture() = default;
+
+    virtual platform::SerialQueues& queues() = 0;
+};
+
+class SerialQueueContract : public ContractTest<SerialQueueFixture> {
+  protected:
+    std::unique_ptr<platform::SerialQueue> queue_ = fixture().queues().make("queue of the test");
+};
+
+} // namespace contract
