@@ -1,4 +1,5 @@
 #include "KSTLib/Platform.h"
+#include "kstd/Analytics/AnalyticsLifetime.h"
 #include "kstd/Daemon.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"
@@ -22,5 +23,6 @@ int main() {
                               .idleTime = kIdleTime});
     const platform::Host interfaces = host.interfaces();
     kst::installPlatform({interfaces.log, interfaces.registry, interfaces.channel});
+    const kstd::AnalyticsLifetime analytics;
     return kstd::Daemon(interfaces, kstd::makeServices(interfaces)).run();
 }

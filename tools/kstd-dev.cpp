@@ -2,6 +2,7 @@
 // demonstration. The installed daemon takes no options.
 
 #include "KSTLib/Platform.h"
+#include "kstd/Analytics/AnalyticsLifetime.h"
 #include "kstd/Daemon.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"
@@ -21,6 +22,9 @@ namespace {
 struct Options {
     std::string root;
     int idleMilliseconds = 0;
+    std::string trustAnchors;
+    int slowSeconds = 0;
+    long slowestSpeed = 0;
 };
 
 /// What the package makes on a real system.
@@ -51,9 +55,19 @@ int runDaemon(const Options& options) {
     if (options.idleMilliseconds > 0) {
         hostOptions.idleTime = std::chrono::milliseconds(options.idleMilliseconds);
     }
+    if (!options.trustAnchors.empty()) {
+        hostOptions.https.trustAnchors = options.trustAnchors;
+    }
+    if (options.slowSeconds > 0) {
+        hostOptions.https.slowLimit = std::chrono::seconds(options.slowSeconds);
+    }
+    if (options.slowestSpeed > 0) {
+        hostOptions.https.slowestSpeed = options.slowestSpeed;
+    }
     platform::LinuxHost host(std::move(hostOptions));
     const platform::Host interfaces = host.interfaces();
     kst::installPlatform({interfaces.log, interfaces.registry, interfaces.channel});
+    const kstd::AnalyticsLifetime analytics;
     return kstd::Daemon(interfaces, kstd::makeServices(interfaces)).run();
 }
 
@@ -67,6 +81,12 @@ int main(int argc, char** argv) try {
         ->required();
     app.add_option("--idle-exit", options.idleMilliseconds,
                    "End after this many milliseconds without work; 0 is never");
+    app.add_option("--trust-anchors", options.trustAnchors,
+                   "Certificates (PEM) that servers are trusted by, in place of the system's");
+    app.add_option("--slow-limit", options.slowSeconds,
+                   "Give a server up that is too slow for this many seconds; 0 is the default");
+    app.add_option("--slowest-speed", options.slowestSpeed,
+                   "Fewer bytes a second than this are too slow; 0 is the default");
     CLI11_PARSE(app, argc, argv);
     return runDaemon(options);
 } catch (const std::exception& error) {

@@ -1,5 +1,6 @@
 #include "base/Saturate.h"
 #include "common/Allocation.h"
+#include "kstd/Analytics/Analytics.h"
 #include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
 #include "kstd/DeviceRestrictedMode/StateFilePaths.h"
 #include "kstd/LogLines.h"
@@ -7,6 +8,7 @@
 #include "wire/EventDatagram.h"
 
 #include <algorithm>
+#include <cstdint>
 
 namespace kstd {
 
@@ -24,6 +26,30 @@ constexpr char kScheduleAlarm[] = "-[DeviceRestrictedModeService scheduleAlarm:]
 constexpr char kUnscheduleAlarm[] = "-[DeviceRestrictedModeService unscheduleAlarm]";
 
 constexpr char kAlarmName[] = "com.zerva.kstd.alarm";
+
+constexpr std::int32_t kPolicyEventVersion = 3;
+constexpr std::int32_t kTimerRestartedEventVersion = 4;
+constexpr std::uint32_t kSecondsPerMinute = 60;
+
+platform::ValueMap policyAttributes(const KSTDRMDeamonNotification& notification) {
+    const bool isPolicyEnabled = notification.policyDisabledByPasscodeNotSet() == 0 &&
+                                 notification.policyDisabledByBootArg() == 0 &&
+                                 notification.policyDisabledByQuorvane() == 0;
+    return {{"eventVersion", kPolicyEventVersion},
+            {"restrictedMode", notification.restrictedMode()},
+            {"restrictedModeDuration", notification.restrictedModeDuration()},
+            {"policyEnabled", std::int32_t{isPolicyEnabled ? 1 : 0}},
+            {"policyDisabledByPasscodeNotSet", notification.policyDisabledByPasscodeNotSet()},
+            {"policyDisabledByBootArg", notification.policyDisabledByBootArg()},
+            {"policyDisabledByQuorvane", notification.policyDisabledByQuorvane()},
+            {"eventPeriodDuration", notification.eventPeriodDuration()}};
+}
+
+platform::ValueMap timerRestartedAttributes(const KSTDRMDeamonNotification& notification) {
+    return {{"eventVersion", kTimerRestartedEventVersion},
+            {"totalRestrictedModeDurationMin",
+             notification.totalRestrictedModeDuration() / kSecondsPerMinute}};
+}
 
 } // namespace
 
@@ -58,8 +84,9 @@ KSTStatus DeviceRestrictedModeService::saveStateBlob(const KSTDRMDeamonNotificat
 }
 
 KSTStatus DeviceRestrictedModeService::onKextAnalyticsCollected(
-    const KSTDRMDeamonNotification& /*notification*/) {
+    const KSTDRMDeamonNotification& notification) {
     logLine(host().log, kOnKextAnalyticsCollected, "called, .");
+    Analytics::logger(host())->logPolicyEventWithAttributes(policyAttributes(notification));
     return kKSTErrorSuccess;
 }
 
@@ -75,8 +102,10 @@ DeviceRestrictedModeService::onKextSaveAnalytics(const KSTDRMDeamonNotification&
 }
 
 KSTStatus DeviceRestrictedModeService::onKextTimerRestartedAnalyticsCollected(
-    const KSTDRMDeamonNotification& /*notification*/) {
+    const KSTDRMDeamonNotification& notification) {
     logLine(host().log, kOnKextTimerRestartedAnalyticsCollected, "called, .");
+    Analytics::logger(host())->logTimerRestartedEventWithAttributes(
+        timerRestartedAttributes(notification));
     return kKSTErrorSuccess;
 }
 

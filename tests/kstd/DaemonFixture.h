@@ -4,9 +4,10 @@
 #include "base/ByteReader.h"
 #include "common/AllocatedBytes.h"
 #include "common/Command.h"
+#include "kstd/Analytics/AnalyticsLifetime.h"
 #include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
 #include "platform/fake/FakeHost.h"
-#include "platform/fake/FakeMachine.h"
+#include "tests/kstd/MachineWithDirectory.h"
 #include "wire/RestrictedMode.h"
 
 #include <gtest/gtest.h>
@@ -44,7 +45,7 @@ struct ControlRequest {
 };
 
 /// The daemon's classes on a fake machine, with the library on the same one.
-class DaemonFixture : public testing::Test {
+class DaemonFixture : public testing::Test, protected MachineWithDirectory {
   protected:
     DaemonFixture() {
         kst::installPlatform({fake.log, fake.registry, fake.channel});
@@ -151,8 +152,8 @@ class DaemonFixture : public testing::Test {
         return date ? std::optional(date->nanosecondsSince1970) : std::nullopt;
     }
 
-    platform::FakeMachine machine;
     platform::FakeHost fake{machine};
+    AnalyticsLifetime analytics;
 
   private:
     static ControlRequest decode(const Bytes& frame) {

@@ -1,0 +1,58 @@
+#include "kstd/Analytics/EndpointBag.h"
+
+namespace kstd {
+
+namespace {
+
+const platform::Value* find(const platform::ValueMap& map, std::string_view key) {
+    const auto found = map.find(key);
+    return found != map.end() ? &found->second : nullptr;
+}
+
+template <typename Kind>
+std::optional<Kind> as(const platform::Value* value) {
+    const Kind* const content = value != nullptr ? value->as<Kind>() : nullptr;
+    return content != nullptr ? std::optional(*content) : std::nullopt;
+}
+
+std::optional<std::uint64_t> unsignedInteger(const platform::Value* value) {
+    const auto integer = as<std::int64_t>(value);
+    if (!integer) {
+        return as<std::uint64_t>(value);
+    }
+    return *integer >= 0 ? std::optional(static_cast<std::uint64_t>(*integer)) : std::nullopt;
+}
+
+std::optional<std::vector<std::string>> texts(const platform::Value* value) {
+    const auto* const list = value != nullptr ? value->as<platform::ValueList>() : nullptr;
+    if (list == nullptr) {
+        return std::nullopt;
+    }
+    std::vector<std::string> texts;
+    for (const platform::Value& element : *list) {
+        const auto* const text = element.as<std::string>();
+        if (text == nullptr) {
+            return std::nullopt;
+        }
+        texts.push_back(*text);
+    }
+    return texts;
+}
+
+} // namespace
+
+std::optional<EndpointBag> EndpointBag::fromValue(const platform::Value& value) {
+    const auto* const map = value.as<platform::ValueMap>();
+    if (map == nullptr) {
+        return std::nullopt;
+    }
+    return EndpointBag{.disabled = as<bool>(find(*map, "disabled")).value_or(false),
+                       .sendDisabled = as<bool>(find(*map, "sendDisabled")).value_or(false),
+                       .postFrequency = unsignedInteger(find(*map, "postFrequency")),
+                       .blacklistedEvents = texts(find(*map, "blacklistedEvents")),
+                       .blacklistedFields = texts(find(*map, "blacklistedFields")),
+                       .metricsBase = as<platform::ValueMap>(find(*map, "metricsBase")),
+                       .metricsUrl = as<std::string>(find(*map, "metricsUrl"))};
+}
+
+} // namespace kstd

@@ -1,0 +1,127 @@
+#include "kstd/Analytics/KSTDAnalyticsLogger.h"
+
+#include "base/Concat.h"
+#include "kstd/Analytics/AnalyticsConfiguration.h"
+#include "kstd/Analytics/TQAnalyticsLoggerSQLiteStore.h"
+#include "platform/Clock.h"
+#include "platform/Files.h"
+#include "platform/InternalDiagnostics.h"
+#include "platform/SystemLog.h"
+
+#include <algorithm>
+#include <utility>
+
+namespace kstd {
+
+namespace {
+
+constexpr char kQueueName[] = "com.zerva.keystrand.analytics";
+constexpr char kSubsystem[] = "Keystrand";
+
+constexpr std::int64_t kSecondsBetweenUploads = 259200;
+constexpr std::int64_t kSecondsBetweenUploadsOfDevelopers = 60;
+
+} // namespace
+
+std::shared_ptr<KSTDAnalyticsLogger> KSTDAnalyticsLogger::logger(const platform::Host& host) {
+    host.log.write(platform::LogLevel::info,
+                   "attempt to instatiate abstract class KSTDAnalyticsLogger", {});
+    return nullptr;
+}
+
+void KSTDAnalyticsLogger::init(const std::string& databasePath) {
+    fields.database = TQAnalyticsLoggerSQLiteStore::storeWithPath(
+        host_.files.locate(databasePath), kEventSchema,
+        {.log = host_.log, .clock = host_.clock, .propertyLists = host_.propertyLists});
+    fields.queue = host_.queues.make(kQueueName);
+    fields.secondsBetweenUploads = host_.diagnostics.isEnabled(kSubsystem)
+                                       ? kSecondsBetweenUploadsOfDevelopers
+                                       : kSecondsBetweenUploads;
+    readConfiguration();
+}
+
+void KSTDAnalyticsLogger::readConfiguration() {
+    auto configuration = AnalyticsConfiguration::read(host_.resources, host_.defaults);
+    fields.splunkTopicName = std::move(configuration.splunkTopicName);
+    fields.splunkUploadURL = std::move(configuration.splunkUploadURL);
+    fields.splunkBagURL = std::move(configuration.splunkBagURL);
+    fields.allowInsecureSplunkCert = configuration.allowInsecureSplunkCert;
+}
+
+void KSTDAnalyticsLogger::logEventNamed(std::optional<std::string_view> name,
+                                        const platform::ValueMap* withAttributes) {
+    if (!name) {
+        host_.log.write(platform::LogLevel::debug, "attempt to log an event with no name", {});
+        return;
+    }
+    std::optional<platform::Timestamp> uploadDate;
+    fields.queue->sync([&] { uploadDate = keepEvent(*name, withAttributes); });
+    const platform::Timestamp now = platform::timestampOf(host_.clock.now());
+    if (!uploadDate) {
+        resetUploadDate(false);
+    } else if (now.secondsSince2001 > uploadDate->secondsSince2001) {
+        upload();
+    }
+}
+
+/// Stores the event if it is wanted; the date at which uploading is due then, if there is one.
+std::optional<platform::Timestamp>
+KSTDAnalyticsLogger::keepEvent(std::string_view name, const platform::ValueMap* attributes) {
+    if (!isWanted(name)) {
+        return std::nullopt;
+    }
+    fields.database->addEventDict(
+        eventDictWithBlacklistedFieldsStrippedFrom(eventDictForEventName(name, attributes)),
+        kEventTable);
+    return fields.database->uploadDate();
+}
+
+bool KSTDAnalyticsLogger::isWanted(std::string_view eventName) const {
+    if (fields.disableLogging) {
+        return false;
+    }
+    const auto& unwanted = fields.blacklistedEvents;
+    return !unwanted || std::find(unwanted->begin(), unwanted->end(), eventName) == unwanted->end();
+}
+
+void KSTDAnalyticsLogger::upload() {
+    std::optional<platform::Error> error;
+    if (forceUploadWithError(&error)) {
+        host_.log.write(platform::LogLevel::debug, "uploaded oracle statistics", {});
+        resetUploadDate(true);
+    } else if (error) {
+        host_.log.write(platform::LogLevel::error,
+                        base::concat("TQAnalytics: failed to upload json to analytics server with "
+                                     "error: ",
+                                     error->description),
+                        {});
+    }
+}
+
+void KSTDAnalyticsLogger::resetUploadDate(bool clear) {
+    fields.queue->sync([this, clear] {
+        if (clear) {
+            fields.database->clearAllData();
+        }
+        setNextUploadDate();
+    });
+}
+
+void KSTDAnalyticsLogger::setNextUploadDate() {
+    const platform::Timestamp now = platform::timestampOf(host_.clock.now());
+    fields.database->setUploadDate(platform::Timestamp{
+        now.secondsSince2001 + static_cast<double>(fields.secondsBetweenUploads)});
+}
+
+void KSTDAnalyticsLogger::setDateProperty(const std::optional<platform::Timestamp>& date,
+                                          const std::string& forKey) {
+    fields.queue->sync([&] { fields.database->setDateProperty(date, forKey); });
+}
+
+std::optional<platform::Timestamp> KSTDAnalyticsLogger::datePropertyForKey(const std::string& key) {
+    std::optional<platform::Timestamp> date;
+    fields.queue->sync([&] { date = fields.database->datePropertyForKey(key); });
+    return date;
+}
+
+} // namespace kstd

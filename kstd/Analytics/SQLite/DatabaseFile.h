@@ -1,0 +1,25 @@
+#pragma once
+
+#include "platform/Error.h"
+
+#include <optional>
+#include <string>
+
+namespace kstd {
+
+/// Makes the directory that `path` lies in, and those above it, for the owner alone. What exists is
+/// left as it is and counts as made, also when it is no directory. The error says what could not be
+/// made.
+[[nodiscard]] std::optional<platform::Error> makeParentDirectories(const std::string& path);
+
+/// Makes an empty file, for the owner alone, unless there is something at `path`. SQLite gives the
+/// files that it keeps beside the database the same mode.
+///
+/// An existing file is not even opened: closing it would drop the locks that other connections of
+/// this process have on it.
+void createDatabaseFile(const std::string& path);
+
+/// Deletes the file and what SQLite keeps beside it. What cannot be deleted stays.
+void removeDatabaseFiles(const std::string& path);
+
+} // namespace kstd

@@ -1,0 +1,132 @@
+#include "kstd/Analytics/SQLite/FormatText.h"
+
+#include "base/Concat.h"
+#include "kstd/Analytics/SQLite/NumberText.h"
+
+#include <algorithm>
+#include <array>
+#include <charconv>
+#include <cstddef>
+#include <optional>
+
+namespace kstd {
+
+namespace {
+
+struct Conversion {
+    char letter = 0;
+    bool isLong = false;
+    /// With the percent sign.
+    std::size_t length = 0;
+};
+
+/// The conversion that `text`, which begins with a percent sign, begins with.
+std::optional<Conversion> conversionAt(std::string_view text) {
+    std::size_t letter = 1;
+    while (letter < 3 && letter < text.size() && text[letter] == 'l') {
+        ++letter;
+    }
+    if (letter == text.size()) {
+        return std::nullopt;
+    }
+    const bool isLong = letter > 1;
+    const std::string_view letters = isLong ? "diux" : "@sdiuxf%";
+    if (letters.find(text[letter]) == std::string_view::npos) {
+        return std::nullopt;
+    }
+    return Conversion{text[letter], isLong, letter + 1};
+}
+
+std::string shortestText(double number) {
+    std::array<char, 32> digits{};
+    const auto end = std::to_chars(digits.data(), digits.data() + digits.size(), number);
+    return {digits.data(), end.ptr};
+}
+
+std::string objectText(const FormatArgument& argument) {
+    if (const std::string_view* const text = argument.text()) {
+        return std::string(*text);
+    }
+    if (const std::int64_t* const number = argument.signedInteger()) {
+        return base::concat(*number);
+    }
+    if (const std::uint64_t* const number = argument.unsignedInteger()) {
+        return base::concat(*number);
+    }
+    return shortestText(*argument.real());
+}
+
+/// The bits of an integer argument, which are the same for either sign.
+std::optional<std::uint64_t> integerBits(const FormatArgument& argument) {
+    if (const std::int64_t* const number = argument.signedInteger()) {
+        return static_cast<std::uint64_t>(*number);
+    }
+    if (const std::uint64_t* const number = argument.unsignedInteger()) {
+        return *number;
+    }
+    return std::nullopt;
+}
+
+std::string integerText(const Conversion& conversion, std::uint64_t bits) {
+    const bool isSigned = conversion.letter == 'd' || conversion.letter == 'i';
+    if (isSigned) {
+        return conversion.isLong ? base::concat(static_cast<std::int64_t>(bits))
+                                 : base::concat(static_cast<std::int32_t>(bits));
+    }
+    const std::uint64_t number = conversion.isLong ? bits : static_cast<std::uint32_t>(bits);
+    return conversion.letter == 'x' ? base::concat(base::Hex{number}) : base::concat(number);
+}
+
+/// None when the argument is of another kind than the conversion wants.
+std::optional<std::string> convertedText(const Conversion& conversion,
+                                         const FormatArgument& argument) {
+    switch (conversion.letter) {
+    case '@':
+        return objectText(argument);
+    case 's':
+        return argument.text() ? std::optional(std::string(*argument.text())) : std::nullopt;
+    case 'f':
+        return argument.real() ? std::optional(fixedText(*argument.real())) : std::nullopt;
+    default:
+        break;
+    }
+    const std::optional<std::uint64_t> bits = integerBits(argument);
+    return bits ? std::optional(integerText(conversion, *bits)) : std::nullopt;
+}
+
+/// What stands in the result for the conversion. Uses up the argument that it wants.
+std::string replacement(const Conversion& conversion, std::string_view asWritten,
+                        std::span<const FormatArgument>& arguments) {
+    if (conversion.letter == '%') {
+        return "%";
+    }
+    if (arguments.empty()) {
+        return std::string(asWritten);
+    }
+    const FormatArgument& argument = arguments.front();
+    arguments = arguments.subspan(1);
+    return convertedText(conversion, argument).value_or(std::string(asWritten));
+}
+
+} // namespace
+
+std::string formatText(std::string_view format, std::span<const FormatArgument> arguments) {
+    std::string text;
+    while (!format.empty()) {
+        const std::size_t percent = std::min(format.find('%'), format.size());
+        text.append(format.substr(0, percent));
+        format.remove_prefix(percent);
+        if (format.empty()) {
+            break;
+        }
+        const std::optional<Conversion> conversion = conversionAt(format);
+        const std::size_t length = conversion ? conversion->length : 1;
+        const std::string_view asWritten = format.substr(0, length);
+        text.append(conversion ? replacement(*conversion, asWritten, arguments)
+                               : std::string(asWritten));
+        format.remove_prefix(length);
+    }
+    return text;
+}
+
+} // namespace kstd

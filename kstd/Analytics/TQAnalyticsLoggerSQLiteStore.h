@@ -1,0 +1,70 @@
+#pragma once
+
+#include "kstd/Analytics/SQLite/KSTDSQLite.h"
+#include "platform/Timestamp.h"
+#include "platform/Value.h"
+#include "platform/ValueSink.h"
+
+#include <functional>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+
+namespace kstd {
+
+/// The analytics events that wait for upload, one store for each database file in the process.
+///
+/// A store whose file could not be opened stays closed; every operation tries to open it first, so
+/// it recovers once the cause is gone. All operations but storeWithPath belong to the serial queue
+/// of the store's logger.
+class TQAnalyticsLoggerSQLiteStore final : public KSTDSQLite {
+  public:
+    /// The store for that path, opened once more by every call. Made by the first call for the
+    /// path, with that call's schema and environment. From any thread.
+    [[nodiscard]] static std::shared_ptr<TQAnalyticsLoggerSQLiteStore>
+    storeWithPath(const std::string& path, const std::string& schema,
+                  const DatabaseEnvironment& environment);
+
+    /// Forgets all stores: what their environments refer to is about to go.
+    static void releaseStores();
+
+    TQAnalyticsLoggerSQLiteStore(std::string path, std::string schema,
+                                 const DatabaseEnvironment& environment);
+
+    /// Whether the database is open after the call.
+    bool tryToOpenDatabase();
+
+    /// Adds one row, with the current time. An event that cannot be kept is dropped with a line.
+    void addEventDict(platform::ValueMap event, std::string_view toTable);
+
+    /// All events in the order in which they came. A row that holds none is left out.
+    [[nodiscard]] platform::ValueList allEvents();
+
+    /// Hands the stored form of each event to `visitor`, in the order in which they came. The
+    /// visitor uses the store for nothing.
+    void visitEvents(const std::function<void(const platform::Bytes& data)>& visitor);
+
+    [[nodiscard]] std::optional<platform::Timestamp> uploadDate();
+    /// None removes it.
+    void setUploadDate(const std::optional<platform::Timestamp>& date);
+
+    /// Deletes every event. The upload date stays.
+    void clearAllData();
+
+    /// Never filled: null.
+    [[nodiscard]] std::shared_ptr<const platform::ValueList> failureRecords() const {
+        return failureRecords_;
+    }
+
+  private:
+    const std::shared_ptr<const platform::ValueList> failureRecords_;
+};
+
+/// The table of the events, and the text that makes it. A changed text rebuilds the database.
+inline constexpr char kEventTable[] = "all_events";
+inline constexpr char kEventSchema[] =
+    "CREATE TABLE IF NOT EXISTS all_events (\nid INTEGER PRIMARY KEY AUTOINCREMENT,\n"
+    "timestamp REAL,data BLOB\n);\n";
+
+} // namespace kstd
