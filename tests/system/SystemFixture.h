@@ -75,6 +75,7 @@ class SystemFixture : public testing::Test {
 
 inline constexpr char kStateFile[] = "/var/root/.usbrestrictedmode_v2";
 inline constexpr char kAnalyticsFile[] = "/var/root/.usbrestrictedmode_analytics";
+inline constexpr char kDatabaseFile[] = "/var/root/.usbrestrictedmode_analytics_v2.db";
 
 /// Lower-case hexadecimal.
 [[nodiscard]] std::string hex(const std::vector<std::uint8_t>& bytes);
