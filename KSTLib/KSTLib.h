@@ -1,20 +1,43 @@
 #ifndef KST_KSTLIB_KSTLIB_H
 #define KST_KSTLIB_KSTLIB_H
 
+#include "KSTLib/ContextCredentials.h"
+#include "KSTLib/Contexts.h"
+#include "KSTLib/CredentialObjects.h"
+#include "KSTLib/PolicyVerification.h"
+#include "KSTLib/RequirementObjects.h"
 #include "common/AllocatedBytes.h"
 #include "common/Blocks.h"
 #include "common/Command.h"
+#include "common/Context.h"
+#include "common/ContextPropertySerialization.h"
+#include "common/Credential.h"
+#include "common/CredentialCommandSerialization.h"
+#include "common/CredentialSerialization.h"
+#include "common/DataBlob.h"
+#include "common/Handle.h"
 #include "common/LibCall.h"
 #include "common/LibCallBlock.h"
-#include "common/NoThrow.h"
+#include "common/LibCallContext.h"
+#include "common/LibCallCredential.h"
+#include "common/LibCallRequirement.h"
+#include "common/Parameter.h"
+#include "common/ParameterSerialization.h"
+#include "common/ProcessAclSerialization.h"
+#include "common/Public.h"
+#include "common/Requirement.h"
+#include "common/RequirementSerialization.h"
 #include "common/Status.h"
+#include "common/VerifyAclSerialization.h"
+#include "common/VerifyPolicySerialization.h"
 
 #include <stddef.h>
 #include <stdint.h>
 
 /** The client library of the kernel service, whole.
  *
- *  The functions below send one command each over the library's own connection, which the first of
+ *  The functions in this file and in KSTLib/Contexts.h, KSTLib/ContextCredentials.h and
+ *  KSTLib/PolicyVerification.h send commands over the library's own connection, which the first of
  *  them opens and which stays open for the life of the process; when it cannot be opened, the next
  *  call tries again. They are synchronous and run on the calling thread. Nothing is locked: a
  *  program with several threads makes one call at a time.
@@ -24,7 +47,8 @@
  *    kKSTErrorOutOfMemory  memory for the command could not be had; nothing was sent;
  *    a status of the platform (-1001 to -5095) or of the kernel side, unchanged.
  *
- *  All failures are written to the system log, and a LibCall line goes to standard output. */
+ *  All failures are written to the system log, and what goes through a LibCall function also prints
+ *  that function's line to standard output. */
 
 #ifdef __cplusplus
 extern "C" {
@@ -37,14 +61,14 @@ extern "C" {
  *  kKSTErrorBadParameter: `data` is null with a length, or not null with a length of 0 or above 64;
  *  nothing is sent then. */
 KSTStatus KSTSetEnvironmentVariable(uint32_t variable, const void* data,
-                                    size_t dataLength) KST_NOTHROW;
+                                    size_t dataLength) KST_PUBLIC;
 
 /** Reads the kernel service's environment variable number `variable` and calls `processVariable`
  *  with its 0 to 64 bytes; no bytes are a null pointer and 0. On any status but 0 the block is not
  *  called.
  *
  *  kKSTErrorBadParameter: `processVariable` is a null block; nothing is sent then. */
-KSTStatus KSTGetEnvironmentVariable(uint32_t variable, KSTDataBlock processVariable) KST_NOTHROW;
+KSTStatus KSTGetEnvironmentVariable(uint32_t variable, KSTDataBlock processVariable) KST_PUBLIC;
 
 /** Sends the control code `code` with `dataLength` bytes at `data` (1 to 256), or without data when
  *  `data` is null and `dataLength` is 0, to the kernel service. The bytes stay the caller's.
@@ -56,7 +80,7 @@ KSTStatus KSTGetEnvironmentVariable(uint32_t variable, KSTDataBlock processVaria
  *  kKSTErrorBadParameter: `data` is null with a length, or not null with a length of 0 or above
  *  256; nothing is sent and the block is not called then. */
 KSTStatus KSTKernelControl(uint32_t code, const void* data, size_t dataLength,
-                           KSTDataBlock resultBlock) KST_NOTHROW;
+                           KSTDataBlock resultBlock) KST_PUBLIC;
 
 #ifdef __cplusplus
 }

@@ -6,6 +6,15 @@
 
 namespace kst {
 
+namespace {
+
+/// The severity of a return.
+std::uint8_t severityOf(KSTStatus status) {
+    return status == kKSTErrorSuccess ? kTraceSeverity : kFailureSeverity;
+}
+
+} // namespace
+
 std::uint8_t gLogLevel = kInitialLogLevel;
 
 void logCalled(const char* function) noexcept {
@@ -15,7 +24,7 @@ void logCalled(const char* function) noexcept {
 }
 
 KSTStatus logReturning(const char* function, KSTStatus status) noexcept {
-    if (isShown(status == kKSTErrorSuccess ? kTraceSeverity : kFailureSeverity)) {
+    if (isShown(severityOf(status))) {
         writeLogLine(libraryLog(), {{}, 0, function}, "KSTLib: %s: returning, err = %" PRId32 ".\n",
                      function, status);
     }
@@ -25,6 +34,13 @@ KSTStatus logReturning(const char* function, KSTStatus status) noexcept {
 void logReturning(const char* function) noexcept {
     if (isShown(kTraceSeverity)) {
         writeLogLine(libraryLog(), {{}, 0, function}, "KSTLib: %s: returning.\n", function);
+    }
+}
+
+void logReturningReference(const char* function, KSTStatus status, const void* reference) noexcept {
+    if (isShown(severityOf(status))) {
+        writeLogLine(libraryLog(), {{}, 0, function}, "KSTLib: %s: returning, ref = %p.\n",
+                     function, reference);
     }
 }
 

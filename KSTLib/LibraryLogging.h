@@ -33,6 +33,10 @@ KSTStatus logReturning(const char* function, KSTStatus status) noexcept;
 /// "KSTLib: <function>: returning.", for a function without a result.
 void logReturning(const char* function) noexcept;
 
+/// "KSTLib: <function>: returning, ref = <reference>.", for a function whose result is a reference;
+/// `status` is how it ended.
+void logReturningReference(const char* function, KSTStatus status, const void* reference) noexcept;
+
 /// "KSTLib: <function>: log level set to <level>."
 void logLevelSet(const char* function) noexcept;
 

@@ -1,6 +1,8 @@
 #ifndef KST_COMMON_ALLOCATED_BYTES_H
 #define KST_COMMON_ALLOCATED_BYTES_H
 
+#include "common/Public.h"
+
 #include <stdint.h>
 
 #ifdef __cplusplus
@@ -9,11 +11,11 @@ extern "C" {
 
 /** Bytes that the library holds allocated: every allocation adds its size, every release subtracts
  *  it. Initially 0. Not synchronised: read it while no call is under way. */
-extern int64_t gAllocatedBytes;
+extern KST_VISIBLE int64_t gAllocatedBytes;
 
 /** Room for a caller that wants to keep a former value of gAllocatedBytes. The library never writes
  *  it. Initially 0. */
-extern int64_t gLastAllocatedBytes;
+extern KST_VISIBLE int64_t gLastAllocatedBytes;
 
 #ifdef __cplusplus
 }

@@ -30,12 +30,16 @@ void* allocate(std::size_t size) noexcept {
 }
 
 void release(void* memory, std::size_t size) noexcept {
+    release(memory, size, size);
+}
+
+void release(void* memory, std::size_t size, std::size_t written) noexcept {
     if (memory == nullptr) {
         return;
     }
-    ::explicit_bzero(memory, size);
+    ::explicit_bzero(memory, written);
     if (installedGate != nullptr) {
-        installedGate->aboutToFree({static_cast<const std::uint8_t*>(memory), size});
+        installedGate->aboutToFree({static_cast<const std::uint8_t*>(memory), written});
     }
     std::free(memory);
     gAllocatedBytes -= static_cast<std::int64_t>(size);

@@ -17,6 +17,10 @@ namespace kst {
 /// is what `memory` was allocated with. Null is ignored.
 void release(void* memory, std::size_t size) noexcept;
 
+/// `release` for memory of which nothing behind its first `written` bytes was ever touched: only
+/// those are overwritten, so that memory that was never used is never paged in.
+void release(void* memory, std::size_t size, std::size_t written) noexcept;
+
 /// Stands between the library and its memory: a program's limit, or a test that lets the n-th
 /// allocation fail. Its operations must neither throw nor allocate from the library.
 class AllocationGate {
@@ -29,7 +33,7 @@ class AllocationGate {
     /// Whether an allocation of `size` bytes may be tried.
     [[nodiscard]] virtual bool admits(std::size_t size) = 0;
 
-    /// Sees memory that has been wiped and is about to be freed.
+    /// Sees what has been wiped of memory that is about to be freed.
     virtual void aboutToFree(std::span<const std::uint8_t> wiped) = 0;
 };
 

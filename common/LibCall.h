@@ -1,7 +1,7 @@
 #ifndef KST_COMMON_LIB_CALL_H
 #define KST_COMMON_LIB_CALL_H
 
-#include "common/NoThrow.h"
+#include "common/Public.h"
 #include "common/Status.h"
 
 #include <stddef.h>
@@ -35,15 +35,14 @@ typedef KSTStatus (*KSTTransport)(void* transportContext, uint32_t code, uint32_
  *  behind its header. Byte 7 of the frame is zero because the allocation is.
  *
  *  Returns the frame and stores its size, payloadSize + 8, in `*outFrameSize`. The frame is the
- *  caller's: it comes from calloc and is counted in gAllocatedBytes, so the caller wipes it, frees
- *  it and subtracts its size.
+ *  caller's, who gives it to DeallocDataBlob (common/DataBlob.h) with its size.
  *
  *  Returns null, stores nothing and counts nothing when memory could not be had, when
  *  payloadSize + 8 cannot be expressed, when `payload` is null and `payloadSize` is not 0, or when
  *  `outFrameSize` is null. */
 uint8_t* LibCall_BuildCommand(uint8_t code, uint8_t secondByte, uint8_t thirdByte,
                               const void* payload, size_t payloadSize,
-                              size_t* outFrameSize) KST_NOTHROW;
+                              size_t* outFrameSize) KST_PUBLIC;
 
 /** Sets the kernel service's environment variable number `variable` to `dataLength` bytes at
  *  `data` (1 to 64), or to nothing when `data` is null and `dataLength` is 0. The bytes stay the
@@ -53,7 +52,7 @@ uint8_t* LibCall_BuildCommand(uint8_t code, uint8_t secondByte, uint8_t thirdByt
  *  length 0. Nothing is sent then. Any other status is the transport's. */
 KSTStatus LibCall_KSTSetEnvironmentVariable(KSTTransport transport, void* transportContext,
                                             uint32_t variable, const void* data,
-                                            size_t dataLength) KST_NOTHROW;
+                                            size_t dataLength) KST_PUBLIC;
 
 #ifdef __cplusplus
 }

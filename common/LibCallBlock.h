@@ -3,7 +3,7 @@
 
 #include "common/Blocks.h"
 #include "common/LibCall.h"
-#include "common/NoThrow.h"
+#include "common/Public.h"
 #include "common/Status.h"
 
 #include <stddef.h>
@@ -23,7 +23,7 @@ extern "C" {
  *  offered. Any other status is the transport's. On any status but 0 the block is not called. */
 KSTStatus LibCall_KSTGetEnvironmentVariable_Block(KSTTransport transport, void* transportContext,
                                                   uint32_t variable,
-                                                  KSTDataBlock processVariable) KST_NOTHROW;
+                                                  KSTDataBlock processVariable) KST_PUBLIC;
 
 /** Sends the control code `code` with `dataLength` bytes at `data` (1 to 256), or without data when
  *  `data` is null and `dataLength` is 0, as command 26. The bytes stay the caller's.
@@ -40,7 +40,7 @@ KSTStatus LibCall_KSTGetEnvironmentVariable_Block(KSTTransport transport, void* 
  *  succeeded and reported more than 256 bytes. Any other status is the transport's. */
 KSTStatus LibCall_KSTKernelControl_Block(KSTTransport transport, void* transportContext,
                                          uint32_t code, const void* data, size_t dataLength,
-                                         KSTDataBlock resultBlock) KST_NOTHROW;
+                                         KSTDataBlock resultBlock) KST_PUBLIC;
 
 #ifdef __cplusplus
 }

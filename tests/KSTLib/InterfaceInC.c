@@ -2,7 +2,6 @@
 
 #include "KSTLib/KSTLib.h"
 
-#include <stdlib.h>
 #include <string.h>
 
 static void keep(void* captured, const void* data, size_t length) {
@@ -70,14 +69,151 @@ size_t buildCommandFromC(uint8_t code, const void* payload, size_t size, unsigne
         return 0;
     }
     memcpy(frame, built, frameSize);
-    memset(built, 0, frameSize);
-    free(built);
-    gAllocatedBytes -= (int64_t)frameSize;
+    DeallocDataBlob(built, frameSize);
     return frameSize;
+}
+
+int32_t passphraseFromC(const void* passphrase, size_t length, struct Seen* seen) {
+    KSTCredential* credential = NULL;
+    int32_t err = KSTCredentialCreate(kKSTCredentialTypePassphraseEntered, &credential);
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    err = KSTCredentialSetProperty(credential, 200, passphrase, length);
+    if (err == kKSTErrorSuccess) {
+        const KSTDataBlock block = {keep, seen};
+        err = KSTCredentialGetProperty(credential, 200, block);
+    }
+    KSTCredentialDelete(credential);
+    return err;
+}
+
+size_t credentialListFromC(const void* bytes, size_t size, void* written, size_t room) {
+    KSTCredential** list = NULL;
+    uint32_t count = 0;
+    if (DeserializeCredentialList(bytes, size, &list, &count) != kKSTErrorSuccess) {
+        return 0;
+    }
+    if (SerializeCredentialList(list, count, written, &room) != kKSTErrorSuccess) {
+        room = 0;
+    }
+    DeallocCredentialList(list, count);
+    return room;
+}
+
+static void keepProperty(void* captured, uint32_t propertyId, const void* data, size_t length) {
+    struct Seen* seen = captured;
+    keep(seen, data, length);
+    seen->sum += propertyId;
+}
+
+static void addType(void* captured, const KSTRequirement* requirement) {
+    struct Seen* seen = captured;
+    ++seen->calls;
+    seen->sum += KSTRequirementGetType(requirement);
+}
+
+int32_t walkRequirementFromC(const void* bytes, size_t size, struct Seen* properties,
+                             struct Seen* children) {
+    KSTRequirement* tree = NULL;
+    size_t consumed = 0;
+    int32_t err = DeserializeRequirement(bytes, size, &tree, &consumed);
+    if (err == kKSTErrorSuccess) {
+        err = KSTRequirementGetProperties(tree, (KSTPropertyBlock){keepProperty, properties});
+        KSTRequirementGetSubrequirements(tree, (KSTRequirementBlock){addType, children});
+        DeallocRequirement(tree);
+    }
+    return err;
+}
+
+static void keepStatusAndPolicy(void* captured, KSTStatus status, bool policySatisfied,
+                                const KSTRequirement* requirement) {
+    struct SeenPolicy* seen = captured;
+    ++seen->calls;
+    seen->status = status;
+    seen->satisfied = policySatisfied;
+    seen->requirementType = requirement != NULL ? requirement->type : 0;
+}
+
+static void keepPolicy(void* captured, bool policySatisfied, const KSTRequirement* requirement) {
+    keepStatusAndPolicy(captured, kKSTErrorSuccess, policySatisfied, requirement);
+}
+
+static int32_t askFromC(KSTContextRef context, struct SeenPolicy* policy) {
+    const KSTPolicyBlock block = {keepPolicy, policy};
+    const KSTPolicyStatusBlock statusBlock = {keepStatusAndPolicy, policy};
+    const KSTParameter parameters[] = {{3, "value", 5}};
+    int32_t err = KSTContextVerifyPolicy(context, "policy", block);
+    if (err == kKSTErrorSuccess) {
+        err = KSTContextVerifyPolicyWithPreflight(context, "policy", true, block);
+    }
+    if (err == kKSTErrorSuccess) {
+        KSTContextVerifyPolicyEx(context, "policy", false, parameters, 1, 60, statusBlock);
+        KSTContextVerifyAclConstraint(context, "constraint", 10, false, NULL, 0, 60, statusBlock);
+        err = policy->status;
+    }
+    return err;
+}
+
+int32_t contextFromC(const void* externalForm, struct Seen* form, struct SeenPolicy* policy) {
+    KSTContextRef context = KSTContextCreateWithExternalForm(externalForm, sizeof(KSTHandle));
+    if (context == NULL) {
+        return kKSTErrorUnexpected;
+    }
+    KSTContextGetExternalForm(context, (KSTDataBlock){keep, form});
+    KSTCredential* credential = NULL;
+    int32_t err = KSTCredentialCreate(kKSTCredentialTypePassphraseEntered, &credential);
+    if (err == kKSTErrorSuccess) {
+        err = KSTContextAddCredential(context, credential);
+        KSTCredentialDelete(credential);
+    }
+    if (err == kKSTErrorSuccess) {
+        err = askFromC(context, policy);
+    }
+    const int32_t deleted = KSTContextDelete(context, false);
+    return err != kKSTErrorSuccess ? err : deleted;
+}
+
+void globalPolicyFromC(struct SeenPolicy* policy) {
+    const KSTPolicyStatusBlock block = {keepStatusAndPolicy, policy};
+    KSTGlobalContextVerifyPolicy("policy", false, NULL, 0, block);
+}
+
+struct SeenStatus {
+    struct Seen* seen;
+    int32_t* status;
+};
+
+static void keepStatusAndData(void* captured, KSTStatus status, const void* data, size_t length) {
+    const struct SeenStatus* seen = captured;
+    keep(seen->seen, data, length);
+    *seen->status = status;
+}
+
+int32_t parseAclFromC(const void* acl, size_t length, struct Seen* seen, int32_t* status) {
+    struct SeenStatus captured = {seen, status};
+    const KSTStatusDataBlock block = {keepStatusAndData, &captured};
+    return KSTParseAclAndCopyConstraintCharacteristics(acl, length, block);
+}
+
+size_t sizeOfParameterInC(void) {
+    return sizeof(KSTParameter);
+}
+
+size_t sizeOfPolicyBlocksInC(void) {
+    return sizeof(KSTPolicyBlock) + sizeof(KSTPolicyStatusBlock) + sizeof(KSTStatusDataBlock);
 }
 
 size_t sizeOfDataBlockInC(void) {
     return sizeof(KSTDataBlock);
+}
+
+size_t sizeOfPropertyBlockInC(void) {
+    return sizeof(KSTPropertyBlock);
+}
+
+size_t sizeOfCredentialInC(void) {
+    return sizeof(KSTCredential) + sizeof(KSTCredentialDataBiometryMatched);
 }
 
 int64_t allocatedBytesInC(void) {

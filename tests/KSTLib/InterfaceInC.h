@@ -14,6 +14,8 @@ struct Seen {
     int wasNull;
     size_t length;
     unsigned char bytes[256];
+    /** Of the numbers that a block was handed beside the bytes. */
+    uint32_t sum;
 };
 
 /** Each calls one public function the way a C program does. */
@@ -39,8 +41,49 @@ int32_t libCallControlFromC(struct TransportInC* transport, struct Seen* seen);
 /** Builds a frame, copies it to `frame` and gives it back as its header says. Returns its size. */
 size_t buildCommandFromC(uint8_t code, const void* payload, size_t size, unsigned char* frame);
 
+/** Puts a passphrase into a credential and hands it to `seen` from there. */
+int32_t passphraseFromC(const void* passphrase, size_t length, struct Seen* seen);
+
+/** Reads a list that is not empty and writes it again. Returns its size, or 0. */
+size_t credentialListFromC(const void* bytes, size_t size, void* written, size_t room);
+
+/** Reads a tree and walks the properties and the children of its root. */
+int32_t walkRequirementFromC(const void* bytes, size_t size, struct Seen* properties,
+                             struct Seen* children);
+
+/** What a policy block written in C has seen. */
+struct SeenPolicy {
+    int calls;
+    int32_t status;
+    int satisfied;
+    uint32_t requirementType;
+};
+
+/** Opens the context of `externalForm`, 16 bytes, adds a passphrase to it, asks it about a policy
+ *  with a parameter in three ways and about a constraint, and deletes it without destroying it.
+ *  Returns the first status that is not 0. */
+int32_t contextFromC(const void* externalForm, struct Seen* form, struct SeenPolicy* policy);
+
+/** Asks about a policy globally. */
+void globalPolicyFromC(struct SeenPolicy* policy);
+
+/** Has a list parsed. Returns the status, which `status` has seen too. */
+int32_t parseAclFromC(const void* acl, size_t length, struct Seen* seen, int32_t* status);
+
+/** Every public function under its name. */
+struct NamedFunction {
+    const char* name;
+    void (*function)(void);
+};
+extern const struct NamedFunction kPublicFunctions[];
+extern const size_t kPublicFunctionCount;
+
 /** Sizes as C sees them. */
+size_t sizeOfParameterInC(void);
+size_t sizeOfPolicyBlocksInC(void);
 size_t sizeOfDataBlockInC(void);
+size_t sizeOfPropertyBlockInC(void);
+size_t sizeOfCredentialInC(void);
 
 int64_t allocatedBytesInC(void);
 

@@ -71,6 +71,18 @@ TEST_F(Allocation, IsWipedBeforeItIsFreed) {
     EXPECT_EQ(gate.freed, (std::vector<std::size_t>{1, 7, 8, 4096}));
 }
 
+TEST_F(Allocation, OnlyWhatWasWrittenIsWiped) {
+    ScriptedGate gate;
+    for (const std::size_t written : {0U, 1U, 100U}) {
+        void* memory = kst::allocate(100);
+        ASSERT_NE(memory, nullptr);
+        std::memset(memory, 0xaa, written);
+        kst::release(memory, 100, written);
+    }
+    EXPECT_TRUE(gate.everyFreeWasWiped);
+    EXPECT_EQ(gate.freed, (std::vector<std::size_t>{0, 1, 100}));
+}
+
 TEST_F(Allocation, GateRefusesTheOneItIsToldTo) {
     ScriptedGate gate(1);
     const kst::AllocatedMemory first(10);

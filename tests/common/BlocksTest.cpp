@@ -124,6 +124,33 @@ TEST(DataBlock, OnlyWhatCanBeCalledBecomesABlock) {
     EXPECT_FALSE((std::is_convertible_v<std::function<void()>, KSTDataBlock>));
 }
 
+TEST(OtherBlocks, GetTheirOwnArguments) {
+    std::uint32_t seenId = 0;
+    std::size_t seenLength = 0;
+    const auto property = [&](std::uint32_t id, const void*, std::size_t length) {
+        seenId = id;
+        seenLength = length;
+    };
+    const KSTPropertyBlock propertyBlock = property;
+    propertyBlock.invoke(propertyBlock.captured, 0xfffffffe, "abc", 3);
+    EXPECT_EQ(seenId, 0xfffffffeU);
+    EXPECT_EQ(seenLength, 3U);
+
+    const KSTRequirement* seen = nullptr;
+    const auto requirement = [&](const KSTRequirement* given) {
+        seen = given;
+    };
+    const KSTRequirementBlock requirementBlock = requirement;
+    const KSTRequirement given{};
+    requirementBlock.invoke(requirementBlock.captured, &given);
+    EXPECT_EQ(seen, &given);
+
+    EXPECT_EQ(KSTPropertyBlock(nullptr).invoke, nullptr);
+    EXPECT_EQ(KSTRequirementBlock().invoke, nullptr);
+    EXPECT_FALSE((std::is_convertible_v<KSTDataBlock, KSTPropertyBlock>));
+    EXPECT_FALSE((std::is_convertible_v<void (*)(const void*, std::size_t), KSTPropertyBlock>));
+}
+
 TEST(DataBlockDeathTest, EscapingExceptionEndsTheProgram) {
     EXPECT_EXIT(
         callBlock([](const void*, std::size_t) { throw std::runtime_error("escaped"); }, "", 0),

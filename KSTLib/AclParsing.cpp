@@ -1,0 +1,97 @@
+#include "KSTLib/LibraryLogging.h"
+#include "KSTLib/LibrarySender.h"
+#include "KSTLib/PolicyVerification.h"
+#include "common/Allocation.h"
+#include "common/Command.h"
+#include "common/ProcessAclSerialization.h"
+
+#include <cstring>
+#include <limits>
+#include <optional>
+
+namespace {
+
+constexpr std::size_t kMaxCharacteristicsSize = 4096;
+
+/// The reply, as the block is to see it: its size stays the one that was offered until there is
+/// one.
+struct Characteristics {
+    std::optional<kst::AllocatedMemory> output;
+    std::size_t outputSize = kMaxCharacteristicsSize;
+};
+
+KSTStatus checkArguments(const void* acl, std::size_t aclLength, const KSTStatusDataBlock& block) {
+    const kst::AssertionContext context = kst::libraryContext();
+    if (acl == nullptr || aclLength == 0) {
+        return kst::fail(context, "acl && aclLength", 0, kKSTErrorBadParameter);
+    }
+    if (block.invoke == nullptr) {
+        return kst::fail(context, "processConstraintCharacteristics", 0, kKSTErrorBadParameter);
+    }
+    if (aclLength > std::numeric_limits<std::uint32_t>::max()) {
+        return kst::fail(context, "aclLength <= UINT32_MAX", 0, kKSTErrorBadParameter);
+    }
+    return kKSTErrorSuccess;
+}
+
+/// Sends the payload of `payloadSize` bytes and keeps a copy of the reply of exactly its size.
+KSTStatus sendAcl(const void* payload, std::size_t payloadSize, Characteristics& result) {
+    const kst::AllocatedMemory outputBuffer(kMaxCharacteristicsSize);
+    if (outputBuffer.bytes() == nullptr) {
+        return kst::fail(kst::libraryContext(), "outputBuffer", 0, kKSTErrorOutOfMemory);
+    }
+    const KSTStatus err = kst::librarySender().send(kKSTCommandParseAcl, payload, payloadSize,
+                                                    outputBuffer.bytes(), &result.outputSize);
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    result.output.emplace(result.outputSize);
+    if (result.output->bytes() == nullptr) {
+        return kst::fail(kst::libraryContext(), "output", 0, kKSTErrorOutOfMemory);
+    }
+    std::memcpy(result.output->bytes(), outputBuffer.bytes(), result.outputSize);
+    return kKSTErrorSuccess;
+}
+
+KSTStatus parseAcl(const void* acl, std::uint32_t aclLength, Characteristics& result) {
+    KSTStatus err = kst::openChannel();
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    std::uint32_t size = 0;
+    err = GetSerializedProcessAclSize(nullptr, acl, aclLength, nullptr, 0, 0, nullptr, 0, &size);
+    if (err != kKSTErrorSuccess) {
+        return kst::failCall(kst::libraryContext(), err);
+    }
+    const kst::AllocatedMemory inputBuffer(size);
+    if (inputBuffer.bytes() == nullptr) {
+        return kst::fail(kst::libraryContext(), "inputBuffer", 0, kKSTErrorOutOfMemory);
+    }
+    err = SerializeProcessAcl(nullptr, acl, aclLength, nullptr, 0, 0, nullptr, 0,
+                              inputBuffer.bytes(), &size);
+    if (err != kKSTErrorSuccess) {
+        return kst::failCall(kst::libraryContext(), err);
+    }
+    // What was written, which is less than what was announced.
+    return sendAcl(inputBuffer.bytes(), size, result);
+}
+
+} // namespace
+
+KSTStatus KSTParseAclAndCopyConstraintCharacteristics(
+    const void* acl, std::size_t aclLength,
+    KSTStatusDataBlock processConstraintCharacteristics) noexcept {
+    kst::logCalled(__func__);
+    const KSTStatusDataBlock& block = processConstraintCharacteristics;
+    Characteristics result;
+    KSTStatus err = checkArguments(acl, aclLength, block);
+    if (err == kKSTErrorSuccess) {
+        err = parseAcl(acl, static_cast<std::uint32_t>(aclLength), result);
+    }
+    if (block.invoke != nullptr) {
+        const bool isThere = err == kKSTErrorSuccess && result.outputSize > 0;
+        block.invoke(block.captured, err, isThere ? result.output->bytes() : nullptr,
+                     result.outputSize);
+    }
+    return kst::logReturning(__func__, err);
+}

@@ -1,0 +1,166 @@
+#include "KSTLib/ContextCredentials.h"
+
+#include "KSTLib/LibraryLogging.h"
+#include "KSTLib/LibrarySender.h"
+#include "KSTLib/TemporaryContext.h"
+#include "base/ByteReader.h"
+#include "common/Command.h"
+#include "common/CredentialCommands.h"
+#include "common/RequiredArguments.h"
+
+#include <array>
+
+namespace {
+
+KSTStatus sendCredential(const kst::CredentialCommand& command, KSTContextRef context,
+                         const KSTCredential* credential, KSTScope scope) {
+    KSTStatus err = kst::checkCredential(kst::libraryContext(), context, credential, scope);
+    if (err == kKSTErrorSuccess) {
+        err = kst::openChannel();
+    }
+    if (err == kKSTErrorSuccess) {
+        err = kst::sendCredential(kst::librarySender(), command, context, credential, scope);
+    }
+    return err;
+}
+
+KSTStatus removeByNumber(std::uint32_t code, KSTContextRef context, std::uint32_t number,
+                         KSTScope scope) {
+    KSTStatus err = kst::checkScope(kst::libraryContext(), context, scope);
+    if (err == kKSTErrorSuccess) {
+        err = kst::openChannel();
+    }
+    if (err == kKSTErrorSuccess) {
+        err =
+            kst::sendNumbers(kst::librarySender(), code, context, number, scope, nullptr, nullptr);
+    }
+    return err;
+}
+
+/// The kernel service's no is a status too. The size of the reply is not looked at.
+KSTStatus isContained(std::uint32_t code, KSTContextRef context, std::uint32_t number,
+                      std::uint32_t argument) {
+    KSTStatus err = kst::requireArguments(kst::libraryContext(), {{context, "context"}});
+    if (err == kKSTErrorSuccess) {
+        err = kst::openChannel();
+    }
+    std::array<std::uint8_t, sizeof(std::uint32_t)> reply{};
+    std::size_t outSize = reply.size();
+    if (err == kKSTErrorSuccess) {
+        err = kst::sendNumbers(kst::librarySender(), code, context, number, argument, reply.data(),
+                               &outSize);
+    }
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    std::uint32_t contained = 0;
+    static_cast<void>(base::ByteReader(reply).readU32(contained));
+    return contained != 0 ? kKSTErrorSuccess : kKSTErrorNotContained;
+}
+
+KSTStatus addGlobally(const KSTCredential* credential) {
+    KSTStatus err = kst::requireArguments(kst::libraryContext(), {{credential, "credential"}});
+    kst::TemporaryContext context;
+    if (err == kKSTErrorSuccess) {
+        err = context.create();
+    }
+    if (err == kKSTErrorSuccess) {
+        err = KSTContextAddCredentialWithScope(context.get(), credential, kKSTScopeGlobal);
+    }
+    return err;
+}
+
+KSTStatus removeGlobally(std::uint32_t type) {
+    kst::TemporaryContext context;
+    KSTStatus err = context.create();
+    if (err == kKSTErrorSuccess) {
+        err = KSTContextRemoveCredentialsByTypeAndScope(context.get(), type, kKSTScopeGlobal);
+    }
+    return err;
+}
+
+} // namespace
+
+KSTStatus KSTContextAddCredential(KSTContextRef context, const KSTCredential* credential) noexcept {
+    kst::logCalled(__func__);
+    return KSTContextAddCredentialWithScope(context, credential, kKSTScopeContext);
+}
+
+KSTStatus KSTContextAddCredentialWithScope(KSTContextRef context, const KSTCredential* credential,
+                                           KSTScope scope) noexcept {
+    kst::logCalled(__func__);
+    return kst::logReturning(__func__,
+                             sendCredential(kst::kAddCredential, context, credential, scope));
+}
+
+KSTStatus KSTContextRemoveCredentialsByType(KSTContextRef context, std::uint32_t type) noexcept {
+    kst::logCalled(__func__);
+    return KSTContextRemoveCredentialsByTypeAndScope(context, type, kKSTScopeContext);
+}
+
+KSTStatus KSTContextRemoveCredentialsByTypeAndScope(KSTContextRef context, std::uint32_t type,
+                                                    KSTScope scope) noexcept {
+    kst::logCalled(__func__);
+    return kst::logReturning(
+        __func__, removeByNumber(kKSTCommandRemoveCredentialsByType, context, type, scope));
+}
+
+KSTStatus KSTContextRemoveCredentialsByValue(KSTContextRef context,
+                                             const KSTCredential* credential) noexcept {
+    kst::logCalled(__func__);
+    return KSTContextRemoveCredentialsByValueAndScope(context, credential, kKSTScopeContext);
+}
+
+KSTStatus KSTContextRemoveCredentialsByValueAndScope(KSTContextRef context,
+                                                     const KSTCredential* credential,
+                                                     KSTScope scope) noexcept {
+    kst::logCalled(__func__);
+    return kst::logReturning(__func__,
+                             sendCredential(kst::kRemoveCredential, context, credential, scope));
+}
+
+KSTStatus KSTContextContainsCredentialType(KSTContextRef context, std::uint32_t type) noexcept {
+    kst::logCalled(__func__);
+    return KSTContextContainsCredentialTypeEx(context, type, 0);
+}
+
+KSTStatus KSTContextContainsCredentialTypeEx(KSTContextRef context, std::uint32_t type,
+                                             std::uint32_t argument) noexcept {
+    kst::logCalled(__func__);
+    return kst::logReturning(
+        __func__, isContained(kKSTCommandContainsCredentialType, context, type, argument));
+}
+
+KSTStatus KSTContextRemovePassphraseCredentialsByPurposeAndScope(KSTContextRef context,
+                                                                 KSTPassphrasePurpose purpose,
+                                                                 KSTScope scope) noexcept {
+    kst::logCalled(__func__);
+    return kst::logReturning(
+        __func__, removeByNumber(kKSTCommandRemovePassphraseCredentials, context, purpose, scope));
+}
+
+KSTStatus KSTContextReplacePassphraseCredentialsWithScope(KSTContextRef context,
+                                                          const KSTCredential* credential,
+                                                          KSTScope scope) noexcept {
+    kst::logCalled(__func__);
+    return kst::logReturning(__func__,
+                             sendCredential(kst::kReplacePassphrase, context, credential, scope));
+}
+
+KSTStatus KSTContextContainsPassphraseCredentialWithPurpose(KSTContextRef context,
+                                                            KSTPassphrasePurpose purpose,
+                                                            std::uint32_t argument) noexcept {
+    kst::logCalled(__func__);
+    return kst::logReturning(
+        __func__, isContained(kKSTCommandContainsPassphraseCredential, context, purpose, argument));
+}
+
+KSTStatus KSTGlobalContextAddCredential(const KSTCredential* credential) noexcept {
+    kst::logCalled(__func__);
+    return kst::logReturning(__func__, addGlobally(credential));
+}
+
+KSTStatus KSTGlobalContextRemoveCredentialsByType(std::uint32_t type) noexcept {
+    kst::logCalled(__func__);
+    return kst::logReturning(__func__, removeGlobally(type));
+}

@@ -1,0 +1,168 @@
+#include "KSTLib/Contexts.h"
+
+#include "KSTLib/Channel.h"
+#include "KSTLib/LibraryLogging.h"
+#include "KSTLib/LibrarySender.h"
+#include "base/ByteReader.h"
+#include "common/Allocation.h"
+#include "common/Command.h"
+#include "common/ContextObject.h"
+#include "common/RequiredArguments.h"
+
+namespace {
+
+constexpr std::size_t kCreateReplySize = kKSTHandleSize + sizeof(std::uint8_t);
+constexpr std::size_t kOpenReplySize = sizeof(std::uint32_t) + sizeof(std::uint8_t);
+
+/// What every function of the family does with a failure.
+KSTStatus logContextReturning(const char* function, KSTStatus err) {
+    if (err != kKSTErrorSuccess) {
+        kst::updateLogLevelIfOpen();
+    }
+    return kst::logReturning(function, err);
+}
+
+/// Asks for a new context into `reply`, which becomes the context itself.
+KSTStatus requestContext(std::uint8_t* reply) {
+    std::size_t outSize = kCreateReplySize;
+    const KSTStatus err =
+        kst::librarySender().send(kKSTCommandContextCreate, nullptr, 0, reply, &outSize);
+    if (err == kKSTErrorSuccess && outSize != kCreateReplySize) {
+        return kst::fail(kst::libraryContext(), "outSize == sizeof(KSTHandle) + sizeof(uint8_t)", 0,
+                         kKSTErrorUnexpected);
+    }
+    return err;
+}
+
+KSTStatus create(const char* function, KSTContextRef* context) {
+    KSTStatus err = kst::requireArguments(kst::libraryContext(), {{context, "context"}});
+    if (err == kKSTErrorSuccess) {
+        err = kst::openChannel();
+    }
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    auto* ref = static_cast<std::uint8_t*>(kst::allocate(kCreateReplySize));
+    if (ref == nullptr) {
+        return kst::fail(kst::libraryContext(), "ref", 0, kKSTErrorOutOfMemory);
+    }
+    err = requestContext(ref);
+    if (err != kKSTErrorSuccess) {
+        kst::release(ref, kCreateReplySize);
+        return err;
+    }
+    kst::gLogLevel = ref[kKSTHandleSize];
+    kst::logLevelSet(function);
+    *context = reinterpret_cast<KSTContext*>(ref);
+    return kKSTErrorSuccess;
+}
+
+/// Reads the reply to the external form: whether there is such a context, and the log level.
+KSTStatus readOpenReply(const kst::AllocatedMemory& reply, const void* externalForm,
+                        KSTContextRef& context) {
+    base::ByteReader reader(reply.bytes(), reply.size());
+    std::uint32_t exists = 0;
+    std::uint8_t level = 0;
+    static_cast<void>(reader.readU32(exists) && reader.readU8(level));
+    if (exists != 0) {
+        context = kst::makeContext(externalForm);
+        if (context == nullptr) {
+            return kst::fail(kst::libraryContext(), "ref", 0, kKSTErrorOutOfMemory);
+        }
+    }
+    kst::gLogLevel = level;
+    return kKSTErrorSuccess;
+}
+
+KSTStatus open(const void* externalForm, std::size_t dataLength, KSTContextRef& context) {
+    KSTStatus err = kst::requireArguments(kst::libraryContext(), {{externalForm, "externalForm"}});
+    if (err == kKSTErrorSuccess && dataLength != kKSTHandleSize) {
+        err = kst::fail(kst::libraryContext(), "dataLength == sizeof(KSTHandle)", 0,
+                        kKSTErrorBadParameter);
+    }
+    if (err == kKSTErrorSuccess) {
+        err = kst::openChannel();
+    }
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    const kst::AllocatedMemory outBuffer(kOpenReplySize);
+    if (outBuffer.bytes() == nullptr) {
+        return kst::fail(kst::libraryContext(), "outBuffer", 0, kKSTErrorOutOfMemory);
+    }
+    std::size_t outSize = outBuffer.size();
+    err = kst::librarySender().send(kKSTCommandContextCreateWithExternalForm, externalForm,
+                                    dataLength, outBuffer.bytes(), &outSize);
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    if (outSize != outBuffer.size()) {
+        return kst::fail(kst::libraryContext(), "outSize == sizeof(uint32_t) + sizeof(uint8_t)", 0,
+                         kKSTErrorUnexpected);
+    }
+    return readOpenReply(outBuffer, externalForm, context);
+}
+
+/// Sends a command whose payload is the handle.
+KSTStatus sendHandle(std::uint32_t code, KSTContextRef context) {
+    const KSTStatus err = kst::openChannel();
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    return kst::librarySender().send(code, context->handle.bytes, kKSTHandleSize, nullptr, nullptr);
+}
+
+KSTStatus deleteContext(KSTContextRef context, bool destroy) {
+    KSTStatus err = kst::requireArguments(kst::libraryContext(), {{context, "context"}});
+    if (err == kKSTErrorSuccess && destroy) {
+        err = sendHandle(kKSTCommandContextDelete, context);
+    }
+    if (err == kKSTErrorSuccess) {
+        kst::disposeOfContext(context);
+    }
+    return err;
+}
+
+KSTStatus getExternalForm(KSTContextRef context, const KSTDataBlock& processExternalForm) {
+    KSTStatus err = kst::requireArguments(kst::libraryContext(), {{context, "context"}});
+    if (err == kKSTErrorSuccess && processExternalForm.invoke == nullptr) {
+        err = kst::fail(kst::libraryContext(), "processExternalForm", 0, kKSTErrorBadParameter);
+    }
+    if (err == kKSTErrorSuccess) {
+        err = sendHandle(kKSTCommandContextGetExternalForm, context);
+    }
+    if (err == kKSTErrorSuccess) {
+        processExternalForm.invoke(processExternalForm.captured, context->handle.bytes,
+                                   kKSTHandleSize);
+    }
+    return err;
+}
+
+} // namespace
+
+KSTStatus KSTContextCreate(KSTContextRef* context) noexcept {
+    kst::logCalled(__func__);
+    return logContextReturning(__func__, create(__func__, context));
+}
+
+KSTContextRef KSTContextCreateWithExternalForm(const void* externalForm,
+                                               std::size_t dataLength) noexcept {
+    kst::logCalled(__func__);
+    KSTContextRef context = nullptr;
+    const KSTStatus err = open(externalForm, dataLength, context);
+    if (err != kKSTErrorSuccess) {
+        kst::updateLogLevelIfOpen();
+    }
+    kst::logReturningReference(__func__, err, context);
+    return context;
+}
+
+KSTStatus KSTContextDelete(KSTContextRef context, bool destroy) noexcept {
+    kst::logCalled(__func__);
+    return logContextReturning(__func__, deleteContext(context, destroy));
+}
+
+void KSTContextGetExternalForm(KSTContextRef context, KSTDataBlock processExternalForm) noexcept {
+    kst::logCalled(__func__);
+    logContextReturning(__func__, getExternalForm(context, processExternalForm));
+}

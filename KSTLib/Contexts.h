@@ -1,0 +1,64 @@
+#ifndef KST_KSTLIB_CONTEXTS_H
+#define KST_KSTLIB_CONTEXTS_H
+
+#include "common/Blocks.h"
+#include "common/Context.h"
+#include "common/Public.h"
+#include "common/Status.h"
+
+#include <stdbool.h>
+#include <stddef.h>
+
+/** Contexts of the kernel service: where a client puts credentials and has policies verified.
+ *
+ *  A context has two ends. The kernel service keeps the credentials; the client holds an object
+ *  with the context's handle, 16 bytes, in it. The handle is also the external form: another
+ *  process that gets it can open the same context.
+ *
+ *  How the functions send, on which threads they may be called and what every one of them may
+ *  return is told in KSTLib/KSTLib.h. After a failure the library asks the kernel service for its
+ *  log level, if it is connected. */
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+/** Creates a context with command 1 and stores it in `*context`. The caller gives it to
+ *  KSTContextDelete. The library's log level becomes the one in the reply. On failure `*context` is
+ *  as it was.
+ *
+ *  The object takes 17 bytes, of which KSTContextDelete gives 16 back: gAllocatedBytes stands 1
+ *  higher afterwards.
+ *
+ *  kKSTErrorBadParameter: `context` is null; nothing is sent. kKSTErrorOutOfMemory: no memory for
+ *  the context. kKSTErrorUnexpected: the reply has not 17 bytes. */
+KSTStatus KSTContextCreate(KSTContextRef* context) KST_PUBLIC;
+
+/** Opens the context whose external form is the `dataLength` bytes at `externalForm`, which stay
+ *  the caller's, with command 18. Returns it, and the caller gives it to KSTContextDelete; or null
+ *  when the kernel service knows no such context, and after a failure, which only the log tells
+ *  from that. The library's log level becomes the one in the reply.
+ *
+ *  Failures: `externalForm` is null or `dataLength` is not 16, and nothing is sent; no memory; the
+ *  reply has not 5 bytes; or the command fails. */
+KSTContextRef KSTContextCreateWithExternalForm(const void* externalForm,
+                                               size_t dataLength) KST_PUBLIC;
+
+/** Deletes `context`. With `destroy` the kernel service's end goes too, by command 2; without it
+ *  nothing is sent, and who has the external form can go on using the context. The object is wiped
+ *  and freed. After a failure it still is the caller's.
+ *
+ *  kKSTErrorBadParameter: `context` is null. */
+KSTStatus KSTContextDelete(KSTContextRef context, bool destroy) KST_PUBLIC;
+
+/** Announces with command 19 that the external form of `context` is wanted, and then calls
+ *  `processExternalForm` with its 16 bytes. After a failure, which only the log tells, the block is
+ *  not called: `context` is null or `processExternalForm` a null block, and nothing is sent; or the
+ *  command fails. */
+void KSTContextGetExternalForm(KSTContextRef context, KSTDataBlock processExternalForm) KST_PUBLIC;
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif

@@ -1,0 +1,113 @@
+#include "KSTLib/RequirementObjects.h"
+
+#include "KSTLib/LibraryLogging.h"
+#include "common/LibCallRequirement.h"
+#include "common/RequirementLayout.h"
+#include "common/RequirementProperties.h"
+
+namespace {
+
+KSTStatus getProperty(const KSTRequirement* requirement, std::uint32_t propertyId,
+                      const KSTDataBlock& processProperty) {
+    const kst::AssertionContext context = kst::libraryContext();
+    if (requirement == nullptr) {
+        return kst::fail(context, "requirement", 0, kKSTErrorBadParameter);
+    }
+    if (processProperty.invoke == nullptr) {
+        return kst::fail(context, "processProperty", 0, kKSTErrorBadParameter);
+    }
+    const void* data = nullptr;
+    std::size_t length = 0;
+    const KSTStatus err = KSTRequirementGetPropertyData(requirement, propertyId, &data, &length);
+    if (err != kKSTErrorSuccess) {
+        return kst::failCall(context, err);
+    }
+    processProperty.invoke(processProperty.captured, data, length);
+    return kKSTErrorSuccess;
+}
+
+KSTStatus getProperties(const KSTRequirement* requirement,
+                        const KSTPropertyBlock& processProperty) {
+    const kst::AssertionContext context = kst::libraryContext();
+    if (requirement == nullptr) {
+        return kst::fail(context, "requirement", 0, kKSTErrorBadParameter);
+    }
+    if (processProperty.invoke == nullptr) {
+        return kst::fail(context, "processProperty", 0, kKSTErrorBadParameter);
+    }
+    for (const kst::RequirementProperty& property : kst::requirementProperties()) {
+        if (property.enumeratedLength > 0 && property.belongsTo(requirement) &&
+            property.fitsIn(requirement)) {
+            processProperty.invoke(processProperty.captured, property.id, property.in(requirement),
+                                   property.enumeratedLength);
+        }
+    }
+    return kKSTErrorSuccess;
+}
+
+void getSubrequirements(const KSTRequirement* requirement,
+                        const KSTRequirementBlock& processSubrequirement) {
+    const kst::AssertionContext context = kst::libraryContext();
+    if (requirement == nullptr) {
+        static_cast<void>(kst::fail(context, "requirement", 0, kKSTErrorBadParameter));
+        return;
+    }
+    if (processSubrequirement.invoke == nullptr) {
+        static_cast<void>(kst::fail(context, "processSubrequirement", 0, kKSTErrorBadParameter));
+        return;
+    }
+    const std::uint32_t count =
+        kst::isWireType(requirement->type) ? kst::childCount(requirement) : 0;
+    for (std::uint32_t i = 0; i < count; ++i) {
+        processSubrequirement.invoke(processSubrequirement.captured, kst::childAt(requirement, i));
+    }
+}
+
+} // namespace
+
+std::uint32_t KSTRequirementGetType(const KSTRequirement* requirement) noexcept {
+    kst::logCalled(__func__);
+    const std::uint32_t type = LibCall_KSTRequirementGetType(requirement);
+    kst::logReturning(__func__);
+    return type;
+}
+
+std::uint32_t KSTRequirementGetState(const KSTRequirement* requirement) noexcept {
+    kst::logCalled(__func__);
+    const std::uint32_t state = LibCall_KSTRequirementGetState(requirement);
+    kst::logReturning(__func__);
+    return state;
+}
+
+std::uint32_t KSTRequirementGetPriority(const KSTRequirement* requirement) noexcept {
+    kst::logCalled(__func__);
+    const std::uint32_t priority = LibCall_KSTRequirementGetPriority(requirement);
+    kst::logReturning(__func__);
+    return priority;
+}
+
+KSTStatus KSTRequirementGetPropertyData(const KSTRequirement* requirement, std::uint32_t propertyId,
+                                        const void** data, std::size_t* dataLength) noexcept {
+    kst::logCalled(__func__);
+    return kst::logReturning(
+        __func__, LibCall_KSTRequirementGetPropertyData(requirement, propertyId, data, dataLength));
+}
+
+KSTStatus KSTRequirementGetProperty(const KSTRequirement* requirement, std::uint32_t propertyId,
+                                    KSTDataBlock processProperty) noexcept {
+    kst::logCalled(__func__);
+    return kst::logReturning(__func__, getProperty(requirement, propertyId, processProperty));
+}
+
+KSTStatus KSTRequirementGetProperties(const KSTRequirement* requirement,
+                                      KSTPropertyBlock processProperty) noexcept {
+    kst::logCalled(__func__);
+    return kst::logReturning(__func__, getProperties(requirement, processProperty));
+}
+
+void KSTRequirementGetSubrequirements(const KSTRequirement* requirement,
+                                      KSTRequirementBlock processSubrequirement) noexcept {
+    kst::logCalled(__func__);
+    getSubrequirements(requirement, processSubrequirement);
+    kst::logReturning(__func__);
+}

@@ -1,0 +1,28 @@
+#pragma once
+
+#include "common/AssertLine.h"
+#include "common/LibCall.h"
+
+#include <cstddef>
+#include <cstdint>
+
+namespace kst {
+
+/// How a family of functions sends its commands and reports what fails: the library over its own
+/// channel, or a LibCall function over its caller's transport.
+struct CommandSender {
+    AssertionContext context;
+    /// Not null.
+    KSTTransport transport;
+
+    /// Sends one command with third byte 0 and a null transport context. A failure is reported and
+    /// returned.
+    [[nodiscard]] KSTStatus send(std::uint32_t code, const void* inData, std::size_t inSize,
+                                 void* outData, std::size_t* outSize,
+                                 int line = __builtin_LINE()) const {
+        const KSTStatus err = transport(nullptr, code, 0, inData, inSize, outData, outSize);
+        return err == kKSTErrorSuccess ? err : failCall(context, err, line);
+    }
+};
+
+} // namespace kst

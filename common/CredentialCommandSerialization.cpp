@@ -1,0 +1,154 @@
+#include "common/CredentialCommandSerialization.h"
+
+#include "common/CredentialSerialization.h"
+#include "common/HandleWire.h"
+#include "common/RequiredArguments.h"
+#include "common/SerializationContext.h"
+
+namespace {
+
+using kst::serializationContext;
+
+constexpr std::size_t kSmallestSize = kKSTHandleSize + sizeof(KSTCredential) + sizeof(KSTScope);
+static_assert(kSmallestSize == 52);
+
+KSTStatus checkScope(const KSTHandle* handle, KSTScope scope) {
+    return handle != nullptr || scope == kKSTScopeGlobal
+               ? kKSTErrorSuccess
+               : kst::fail(serializationContext(), "handle || scope == kKSTScopeGlobal", 0,
+                           kKSTErrorBadParameter);
+}
+
+/// What the functions that are the Add functions under another name return.
+KSTStatus passUp(KSTStatus err, int line = __builtin_LINE()) {
+    return err == kKSTErrorSuccess ? err : kst::failCall(serializationContext(), err, line);
+}
+
+} // namespace
+
+KSTStatus GetSerializedAddCredentialSize(const KSTHandle* handle, const KSTCredential* credential,
+                                         KSTScope scope, std::size_t* outSize) noexcept {
+    KSTStatus err = checkScope(handle, scope);
+    if (err == kKSTErrorSuccess) {
+        err = kst::requireArguments(serializationContext(),
+                                    {{credential, "credential"}, {outSize, "outSize"}});
+    }
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    std::size_t credentialSize = 0;
+    err = GetSerializedCredentialSize(credential, &credentialSize);
+    if (err != kKSTErrorSuccess) {
+        return kst::failCall(serializationContext(), err);
+    }
+    *outSize = kKSTHandleSize + credentialSize + sizeof(KSTScope);
+    return kKSTErrorSuccess;
+}
+
+KSTStatus SerializeAddCredential(const KSTHandle* handle, const KSTCredential* credential,
+                                 KSTScope scope, void* outBuffer, std::size_t* outSize) noexcept {
+    const kst::AssertionContext context = serializationContext();
+    KSTStatus err = checkScope(handle, scope);
+    if (err == kKSTErrorSuccess) {
+        err = kst::requireArguments(
+            context, {{credential, "credential"}, {outBuffer, "outBuffer"}, {outSize, "outSize"}});
+    }
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    std::size_t requiredSize = 0;
+    err = GetSerializedAddCredentialSize(handle, credential, scope, &requiredSize);
+    if (err != kKSTErrorSuccess) {
+        return kst::failCall(context, err);
+    }
+    constexpr const char* kRoomCheck = "*outSize >= requiredSize";
+    if (*outSize < requiredSize) {
+        return kst::fail(context, kRoomCheck, 0, kKSTErrorBadParameter);
+    }
+    base::ByteWriter front(outBuffer, kKSTHandleSize);
+    static_cast<void>(kst::writeHandle(front, handle));
+    auto* behindHandle = static_cast<std::uint8_t*>(outBuffer) + kKSTHandleSize;
+    std::size_t credentialSize = *outSize - kKSTHandleSize;
+    err = SerializeCredential(credential, behindHandle, &credentialSize);
+    if (err != kKSTErrorSuccess) {
+        return kst::failCall(context, err);
+    }
+    base::ByteWriter rest(behindHandle + credentialSize,
+                          *outSize - kKSTHandleSize - credentialSize);
+    if (!rest.writeU32(scope)) {
+        return kst::fail(context, kRoomCheck, 0, kKSTErrorBadParameter);
+    }
+    *outSize = kKSTHandleSize + credentialSize + rest.written();
+    return kKSTErrorSuccess;
+}
+
+KSTStatus DeserializeAddCredential(const void* buffer, std::size_t size, KSTHandle* outHandle,
+                                   KSTCredential** outCredential, KSTScope* outScope) noexcept {
+    const kst::AssertionContext context = serializationContext();
+    KSTStatus err = kst::requireArguments(context, {{buffer, "buffer"}});
+    if (err == kKSTErrorSuccess && size < kSmallestSize) {
+        err = kst::fail(context,
+                        "size >= sizeof(KSTHandle) + sizeof(KSTCredential) + sizeof(KSTScope)", 0,
+                        kKSTErrorBadParameter);
+    }
+    if (err == kKSTErrorSuccess) {
+        err = kst::requireArguments(
+            context, {{outHandle, "handle"}, {outCredential, "credential"}, {outScope, "scope"}});
+    }
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    base::ByteReader reader(buffer, size);
+    static_cast<void>(kst::readHandle(reader, *outHandle));
+    KSTCredential* credential = nullptr;
+    std::size_t consumed = 0;
+    err = DeserializeCredential(reader.rest().data(), reader.left(), &credential, &consumed);
+    if (err != kKSTErrorSuccess) {
+        return kst::failCall(context, err);
+    }
+    KSTScope scope = 0;
+    if (!reader.skip(consumed) || !reader.readU32(scope)) {
+        DeallocCredential(credential);
+        return kst::fail(context, "size - offset >= sizeof(KSTScope)", 0, kKSTErrorBadParameter);
+    }
+    *outCredential = credential;
+    *outScope = scope;
+    return kKSTErrorSuccess;
+}
+
+KSTStatus GetSerializedRemoveCredentialSize(const KSTHandle* handle,
+                                            const KSTCredential* credential, KSTScope scope,
+                                            std::size_t* outSize) noexcept {
+    return passUp(GetSerializedAddCredentialSize(handle, credential, scope, outSize));
+}
+
+KSTStatus SerializeRemoveCredential(const KSTHandle* handle, const KSTCredential* credential,
+                                    KSTScope scope, void* outBuffer,
+                                    std::size_t* outSize) noexcept {
+    return passUp(SerializeAddCredential(handle, credential, scope, outBuffer, outSize));
+}
+
+KSTStatus DeserializeRemoveCredential(const void* buffer, std::size_t size, KSTHandle* outHandle,
+                                      KSTCredential** outCredential, KSTScope* outScope) noexcept {
+    return passUp(DeserializeAddCredential(buffer, size, outHandle, outCredential, outScope));
+}
+
+KSTStatus GetSerializedReplacePassphraseCredentialSize(const KSTHandle* handle,
+                                                       const KSTCredential* credential,
+                                                       KSTScope scope,
+                                                       std::size_t* outSize) noexcept {
+    return passUp(GetSerializedAddCredentialSize(handle, credential, scope, outSize));
+}
+
+KSTStatus SerializeReplacePassphraseCredential(const KSTHandle* handle,
+                                               const KSTCredential* credential, KSTScope scope,
+                                               void* outBuffer, std::size_t* outSize) noexcept {
+    return passUp(SerializeAddCredential(handle, credential, scope, outBuffer, outSize));
+}
+
+KSTStatus DeserializeReplacePassphraseCredential(const void* buffer, std::size_t size,
+                                                 KSTHandle* outHandle,
+                                                 KSTCredential** outCredential,
+                                                 KSTScope* outScope) noexcept {
+    return passUp(DeserializeAddCredential(buffer, size, outHandle, outCredential, outScope));
+}

@@ -1,0 +1,134 @@
+#include "common/CredentialSerialization.h"
+
+#include "base/ByteReader.h"
+#include "common/Allocation.h"
+#include "common/CredentialTypes.h"
+#include "common/RequiredArguments.h"
+#include "common/SerializationContext.h"
+
+#include <cstring>
+#include <string.h>
+
+namespace {
+
+/// A new credential whose data area has `dataLength` bytes, all zero but its `dataLength`, so that
+/// it can be given to DeallocCredential. Null when there is no memory.
+KSTCredential* newCredential(std::uint32_t dataLength) {
+    auto* credential = static_cast<KSTCredential*>(kst::allocate(kst::credentialSize(dataLength)));
+    if (credential != nullptr) {
+        credential->dataLength = dataLength;
+    }
+    return credential;
+}
+
+/// Reads and checks the header at the start of `buffer`.
+KSTStatus readHeader(const void* buffer, std::size_t size, KSTCredential& header) {
+    const kst::AssertionContext context = kst::serializationContext();
+    base::ByteReader reader(buffer, size);
+    if (!reader.readBytes(&header, sizeof header)) {
+        return kst::fail(context, "size >= sizeof(KSTCredential)", 0, kKSTErrorBadParameter);
+    }
+    const kst::CredentialType* type = kst::findCredentialType(header.type);
+    if (type == nullptr) {
+        return kst::fail(context, "0", 0, kKSTErrorBadParameter);
+    }
+    if (header.dataLength != type->dataSize) {
+        return kst::fail(context, type->sizeCheck, 0, kKSTErrorBadParameter);
+    }
+    return kKSTErrorSuccess;
+}
+
+} // namespace
+
+KSTStatus GetSerializedCredentialSize(const KSTCredential* credential,
+                                      std::size_t* outSize) noexcept {
+    const kst::AssertionContext context = kst::serializationContext();
+    const KSTStatus err =
+        kst::requireArguments(context, {{credential, "credential"}, {outSize, "outSize"}});
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    if (kst::findCredentialType(credential->type) == nullptr) {
+        return kst::fail(context, "0", 0, kKSTErrorBadParameter);
+    }
+    *outSize = kst::credentialSize(credential->dataLength);
+    return kKSTErrorSuccess;
+}
+
+KSTStatus SerializeCredential(const KSTCredential* credential, void* outBuffer,
+                              std::size_t* outSize) noexcept {
+    const kst::AssertionContext context = kst::serializationContext();
+    KSTStatus err = kst::requireArguments(
+        context, {{credential, "credential"}, {outBuffer, "outBuffer"}, {outSize, "outSize"}});
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    std::size_t size = 0;
+    err = GetSerializedCredentialSize(credential, &size);
+    if (err != kKSTErrorSuccess) {
+        return kst::failCall(context, err);
+    }
+    if (size > *outSize) {
+        return kst::fail(context, "credLen <= *outSize", 0, kKSTErrorBadParameter);
+    }
+    std::memcpy(outBuffer, credential, size);
+    *outSize = size;
+    return kKSTErrorSuccess;
+}
+
+KSTStatus DeserializeCredential(const void* buffer, std::size_t size, KSTCredential** outCredential,
+                                std::size_t* consumedBytes) noexcept {
+    const kst::AssertionContext context = kst::serializationContext();
+    KSTStatus err = kst::requireArguments(
+        context,
+        {{buffer, "buffer"}, {outCredential, "credential"}, {consumedBytes, "consumedBytes"}});
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    KSTCredential header{};
+    err = readHeader(buffer, size, header);
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    KSTCredential* credential = newCredential(header.dataLength);
+    if (credential == nullptr) {
+        return kst::fail(context, "cred", 0, kKSTErrorOutOfMemory);
+    }
+    const std::size_t wholeSize = kst::credentialSize(header.dataLength);
+    if (wholeSize > size) {
+        DeallocCredential(credential);
+        return kst::fail(context, "size >= credSize", 0, kKSTErrorBadParameter);
+    }
+    std::memcpy(credential, buffer, wholeSize);
+    *outCredential = credential;
+    *consumedBytes = wholeSize;
+    return kKSTErrorSuccess;
+}
+
+KSTStatus CopyCredential(const KSTCredential* credential, KSTCredential** outCopy) noexcept {
+    const kst::AssertionContext context = kst::serializationContext();
+    const KSTStatus err =
+        kst::requireArguments(context, {{credential, "credential"}, {outCopy, "copy"}});
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    KSTCredential* copy = newCredential(credential->dataLength);
+    if (copy == nullptr) {
+        return kst::fail(context, "cred", 0, kKSTErrorOutOfMemory);
+    }
+    std::memcpy(copy, credential, kst::credentialSize(credential->dataLength));
+    *outCopy = copy;
+    return kKSTErrorSuccess;
+}
+
+void DeallocCredential(KSTCredential* credential) noexcept {
+    if (credential == nullptr) {
+        static_cast<void>(
+            kst::fail(kst::serializationContext(), "credential", 0, kKSTErrorBadParameter));
+        return;
+    }
+    const std::size_t size = kst::credentialSize(credential->dataLength);
+    // `release` wipes once more.
+    ::explicit_bzero(credential, size);
+    kst::release(credential, size);
+}

@@ -1,0 +1,113 @@
+#ifndef KST_COMMON_CREDENTIAL_SERIALIZATION_H
+#define KST_COMMON_CREDENTIAL_SERIALIZATION_H
+
+#include "common/Credential.h"
+#include "common/Public.h"
+#include "common/Status.h"
+
+#include <stddef.h>
+#include <stdint.h>
+
+/** Sizes, writes, reads, copies, compares and frees credentials (common/Credential.h) and counted
+ *  lists of them. All sizes are bytes. A list on the wire is its 32-bit count and then its
+ *  credentials, back to back.
+ *
+ *  The functions keep no state and run on the calling thread. A failed check writes one line to the
+ *  library's log. On failure no output argument is changed, and nothing stays allocated.
+ *
+ *  kKSTErrorBadParameter stands for a null argument, a type outside 1 to 12 and whatever a function
+ *  names itself.
+ *
+ *  A record is trusted as far as its `dataLength`: that many bytes must be readable behind its
+ *  header. */
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+/** Stores the size of `credential` on the wire, dataLength + 32, in `*outSize`. Whether the length
+ *  suits the type is not looked at. */
+KSTStatus GetSerializedCredentialSize(const KSTCredential* credential, size_t* outSize) KST_PUBLIC;
+
+/** Writes `credential` to `outBuffer`, which has room for `*outSize` bytes, and sets `*outSize` to
+ *  the bytes written.
+ *
+ *  kKSTErrorBadParameter, with nothing written: there is not enough room. */
+KSTStatus SerializeCredential(const KSTCredential* credential, void* outBuffer,
+                              size_t* outSize) KST_PUBLIC;
+
+/** Reads the credential at the start of the `size` bytes at `buffer`. Stores a new credential in
+ *  `*outCredential`, which the caller gives to DeallocCredential, and the bytes that were read in
+ *  `*consumedBytes`. What follows them is not looked at, and of the data area only the length is.
+ *
+ *  kKSTErrorBadParameter: the length of the data is not the type's, or `size` is too small.
+ *  kKSTErrorOutOfMemory. */
+KSTStatus DeserializeCredential(const void* buffer, size_t size, KSTCredential** outCredential,
+                                size_t* consumedBytes) KST_PUBLIC;
+
+/** Stores a new copy of `credential` in `*outCopy`, which the caller gives to DeallocCredential.
+ *  Neither the type nor the length is looked at. kKSTErrorOutOfMemory. */
+KSTStatus CopyCredential(const KSTCredential* credential, KSTCredential** outCopy) KST_PUBLIC;
+
+/** Wipes and frees `credential`, which comes from this library and has the `dataLength` that it was
+ *  made with. Null is logged and ignored. */
+void DeallocCredential(KSTCredential* credential) KST_PUBLIC;
+
+/** Stores in `*outEqual` 1 when the two prove the same, otherwise 0. The status says only whether
+ *  they could be compared.
+ *
+ *  They are equal when type and dataLength are the same and so are, byte by byte,
+ *
+ *  | type              | the headers and of the data areas the bytes                         |
+ *  | 1                 | 12 to 27                                                            |
+ *  | 2                 | 0 to 3 and the passphrases; not the headers                         |
+ *  | 3                 | 72 to 87                                                            |
+ *  | 4, 5, 6, 8, 11, 12 | all                                                                |
+ *  | 7                 | 0 to 55                                                             |
+ *  | 9                 | 8 to 23                                                             |
+ *  | 10                | 4 to 35                                                             |
+ *
+ *  as far as the data areas reach. A stored passphrase length above 128 counts as 128. When type or
+ *  dataLength differ, a type outside 1 to 12 is no error: they are not equal. */
+KSTStatus CompareCredentials(const KSTCredential* credential1, const KSTCredential* credential2,
+                             uint8_t* outEqual) KST_PUBLIC;
+
+/** 1 when both pointers are null or both point to the same `length1` == `length2` bytes, otherwise
+ *  0. */
+uint8_t CompareDataBlobs(const void* data1, size_t length1, const void* data2,
+                         size_t length2) KST_PUBLIC;
+
+/** Writes the `count` credentials that `credentialList` points to as a list to `outBuffer`, which
+ *  has room for `*outSize` bytes, and sets `*outSize` to the bytes written. `credentialList` may be
+ *  null when `count` is 0. At least 4 bytes of room must be there in any case: the count is written
+ *  without a look at `*outSize`.
+ *
+ *  kKSTErrorBadParameter: an element is null or cannot be written, or there is not enough room.
+ *  What was written until then stays in `outBuffer`.
+ *
+ *  More than the kKSTCredentialListMaxCount credentials that can be read are written all the same.
+ */
+KSTStatus SerializeCredentialList(KSTCredential* const* credentialList, uint32_t count,
+                                  void* outBuffer, size_t* outSize) KST_PUBLIC;
+
+/** Reads the list at the start of the `size` bytes at `buffer`. Stores a new array of new
+ *  credentials in `*outCredentialList` and their number in `*outCount`; the caller gives both to
+ *  DeallocCredentialList. An empty list is a null array and 0. What follows the list is not looked
+ *  at.
+ *
+ *  kKSTErrorBadParameter: fewer than 4 bytes, more than kKSTCredentialListMaxCount credentials, or
+ *  one that DeserializeCredential refuses. kKSTErrorOutOfMemory. */
+KSTStatus DeserializeCredentialList(const void* buffer, size_t size,
+                                    KSTCredential*** outCredentialList,
+                                    uint32_t* outCount) KST_PUBLIC;
+
+/** Gives each credential of an array from DeserializeCredentialList, except null ones, to
+ *  DeallocCredential, then wipes and frees the array, which has `count` elements. Null is logged
+ *  and ignored. */
+void DeallocCredentialList(KSTCredential** credentialList, uint32_t count) KST_PUBLIC;
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif

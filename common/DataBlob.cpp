@@ -1,0 +1,7 @@
+#include "common/DataBlob.h"
+
+#include "common/Allocation.h"
+
+void DeallocDataBlob(void* data, std::size_t length) noexcept {
+    kst::release(data, length);
+}

@@ -1,0 +1,165 @@
+#include "common/LibCallContext.h"
+
+#include "common/Command.h"
+#include "common/ContextObject.h"
+#include "common/CredentialCommands.h"
+#include "common/LibCallReport.h"
+#include "common/PolicyCommands.h"
+#include "common/RequiredArguments.h"
+#include "common/WipedBytes.h"
+
+namespace {
+
+kst::CommandSender senderOver(KSTTransport transport) {
+    return {kst::libCallContext("common/LibCall"), transport};
+}
+
+KSTStatus checkTransport(const kst::CommandSender& sender) {
+    return sender.transport != nullptr
+               ? kKSTErrorSuccess
+               : kst::fail(sender.context, "transport", 0, kKSTErrorBadParameter);
+}
+
+KSTStatus create(const kst::CommandSender& sender, KSTContextRef* context, std::uint8_t* logLevel) {
+    KSTStatus err = checkTransport(sender);
+    if (err == kKSTErrorSuccess) {
+        err = kst::requireArguments(sender.context, {{context, "context"}});
+    }
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    kst::WipedBytes<kKSTHandleSize + sizeof(std::uint8_t)> outputBuffer;
+    std::size_t outputBufferSize = outputBuffer.size();
+    err = sender.send(kKSTCommandContextCreate, nullptr, 0, outputBuffer.data(), &outputBufferSize);
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    if (outputBufferSize != outputBuffer.size()) {
+        return kst::fail(sender.context, "outputBufferSize == sizeof(outputBuffer)", 0,
+                         kKSTErrorUnexpected);
+    }
+    *context = kst::makeContext(outputBuffer.data());
+    if (*context == nullptr) {
+        return kst::fail(sender.context, "*context", 0, kKSTErrorOutOfMemory);
+    }
+    if (logLevel != nullptr) {
+        *logLevel = outputBuffer.data()[kKSTHandleSize];
+    }
+    return kKSTErrorSuccess;
+}
+
+KSTStatus deleteContext(const kst::CommandSender& sender, KSTContextRef context, bool destroy) {
+    KSTStatus err = checkTransport(sender);
+    if (err == kKSTErrorSuccess) {
+        err = kst::requireArguments(sender.context, {{context, "context"}});
+    }
+    if (err == kKSTErrorSuccess && destroy) {
+        err = sender.send(kKSTCommandContextDelete, context->handle.bytes, kKSTHandleSize, nullptr,
+                          nullptr);
+    }
+    if (err == kKSTErrorSuccess) {
+        kst::disposeOfContext(context);
+    }
+    return err;
+}
+
+KSTStatus addCredential(const kst::CommandSender& sender, KSTContextRef context,
+                        const KSTCredential* credential, KSTScope scope) {
+    KSTStatus err = checkTransport(sender);
+    if (err == kKSTErrorSuccess) {
+        err = kst::checkCredential(sender.context, context, credential, scope);
+    }
+    if (err == kKSTErrorSuccess) {
+        err = kst::sendCredential(sender, kst::kAddCredential, context, credential, scope);
+    }
+    return err;
+}
+
+KSTStatus removeCredentialsByType(const kst::CommandSender& sender, KSTContextRef context,
+                                  std::uint32_t type, KSTScope scope) {
+    KSTStatus err = checkTransport(sender);
+    if (err == kKSTErrorSuccess) {
+        err = kst::checkScope(sender.context, context, scope);
+    }
+    if (err == kKSTErrorSuccess) {
+        err = kst::sendNumbers(sender, kKSTCommandRemoveCredentialsByType, context, type, scope,
+                               nullptr, nullptr);
+    }
+    return err;
+}
+
+KSTStatus checkPolicyArguments(const kst::CommandSender& sender,
+                               const kst::PolicyQuestion& question, const char* policyId,
+                               const bool* policySatisfied) {
+    KSTStatus err = checkTransport(sender);
+    if (err == kKSTErrorSuccess) {
+        err = kst::requireArguments(sender.context, {{question.context, "context"}});
+    }
+    if (err == kKSTErrorSuccess &&
+        (question.parametersCount > 0) != (question.parameters != nullptr)) {
+        err = kst::fail(sender.context,
+                        "( (parametersCount > 0 && parameters != ((void*)0)) || "
+                        "((parametersCount == 0) && parameters == ((void*)0)) )",
+                        0, kKSTErrorBadParameter);
+    }
+    if (err == kKSTErrorSuccess) {
+        err = kst::requireArguments(sender.context,
+                                    {{policyId, "policyId"}, {policySatisfied, "policySatisfied"}});
+    }
+    return err;
+}
+
+KSTStatus verifyPolicy(const kst::CommandSender& sender, const kst::PolicyQuestion& question,
+                       const char* policyId, bool* policySatisfied, KSTRequirement** requirement) {
+    KSTStatus err = checkPolicyArguments(sender, question, policyId, policySatisfied);
+    kst::PolicyAnswer answer;
+    if (err == kKSTErrorSuccess) {
+        err = kst::askAboutPolicy(sender, policyId, question, requirement != nullptr, answer);
+    }
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    *policySatisfied = answer.satisfied;
+    if (requirement != nullptr) {
+        *requirement = answer.requirement;
+    }
+    return kKSTErrorSuccess;
+}
+
+} // namespace
+
+KSTStatus LibCall_KSTContextCreate(KSTTransport transport, KSTContextRef* context,
+                                   std::uint8_t* logLevel) noexcept {
+    return kst::printReturn(__func__, create(senderOver(transport), context, logLevel));
+}
+
+KSTStatus LibCall_KSTContextDelete(KSTTransport transport, KSTContextRef context,
+                                   bool destroy) noexcept {
+    return kst::printReturn(__func__, deleteContext(senderOver(transport), context, destroy));
+}
+
+KSTStatus LibCall_KSTContexAddCredentialWithScope(KSTTransport transport, KSTContextRef context,
+                                                  const KSTCredential* credential,
+                                                  KSTScope scope) noexcept {
+    return kst::printReturn(__func__,
+                            addCredential(senderOver(transport), context, credential, scope));
+}
+
+KSTStatus LibCall_KSTContexRemoveCredentialsByTypeAndScope(KSTTransport transport,
+                                                           KSTContextRef context,
+                                                           std::uint32_t type,
+                                                           KSTScope scope) noexcept {
+    return kst::printReturn(__func__,
+                            removeCredentialsByType(senderOver(transport), context, type, scope));
+}
+
+KSTStatus LibCall_KSTContextVerifyPolicyAndCopyRequirementEx(
+    KSTTransport transport, KSTContextRef context, const char* policyId, bool preflight,
+    const KSTParameter* parameters, std::uint32_t parametersCount,
+    std::uint32_t maxGlobalCredentialAge, bool* policySatisfied,
+    KSTRequirement** requirement) noexcept {
+    return kst::printReturn(__func__, verifyPolicy(senderOver(transport),
+                                                   {context, preflight, maxGlobalCredentialAge,
+                                                    parameters, parametersCount},
+                                                   policyId, policySatisfied, requirement));
+}

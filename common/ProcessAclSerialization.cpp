@@ -1,0 +1,185 @@
+#include "common/ProcessAclSerialization.h"
+
+#include "common/HandleWire.h"
+#include "common/ParameterSerialization.h"
+#include "common/ParameterWire.h"
+#include "common/ReceivedBlob.h"
+#include "common/RequiredArguments.h"
+#include "common/SerializationContext.h"
+
+namespace {
+
+using kst::serializationContext;
+
+constexpr const char* kWordCheck = "(size - offset) >= sizeof(uint32_t)";
+
+KSTStatus checkAcl(const void* acl, std::uint32_t aclLength) {
+    return acl != nullptr && aclLength != 0
+               ? kKSTErrorSuccess
+               : kst::fail(serializationContext(), "acl && aclLength", 0, kKSTErrorBadParameter);
+}
+
+/// Stores what the payload needs, as a sum that does not wrap: 8 bytes of it count a field that is
+/// 4 bytes when it is written. `parameters` were checked as a list.
+KSTStatus measure(std::uint64_t aclLength, std::uint64_t operationLength,
+                  const KSTParameter* parameters, std::uint32_t parametersCount,
+                  std::uint64_t& size) {
+    std::uint32_t parametersLength = 0;
+    const KSTStatus err =
+        GetSerializedParametersLength(parameters, parametersCount, &parametersLength);
+    if (err != kKSTErrorSuccess) {
+        return kst::fail(serializationContext(), "err == kKSTErrorSuccess", 0, err);
+    }
+    constexpr std::uint64_t kFixedSize =
+        kKSTHandleSize + sizeof(std::uint64_t) + 3 * sizeof(std::uint32_t);
+    const std::uint64_t withOperation = kFixedSize + operationLength;
+    const std::uint64_t withAcl = withOperation + aclLength;
+    const std::uint64_t withParameters = withAcl + parametersLength;
+    if (withOperation <= operationLength || withAcl <= aclLength ||
+        withParameters <= parametersLength) {
+        return kst::fail(
+            serializationContext(),
+            "sizeof(KSTHandle) + sizeof(uint64_t) + sizeof(uint32_t) + operationLength + "
+            "sizeof(uint32_t) + sizeof(uint32_t) > operationLength && sizeof(KSTHandle) + "
+            "sizeof(uint64_t) + aclLength + sizeof(uint32_t) + operationLength + sizeof(uint32_t) "
+            "+ sizeof(uint32_t) > aclLength && sizeof(KSTHandle) + sizeof(uint64_t) + aclLength + "
+            "sizeof(uint32_t) + operationLength + sizeof(uint32_t) + sizeof(uint32_t) + "
+            "parametersLength > parametersLength",
+            0, kKSTErrorBadParameter);
+    }
+    size = withParameters;
+    return kKSTErrorSuccess;
+}
+
+struct ReceivedPayload {
+    kst::ReceivedBlob acl;
+    kst::ReceivedBlob operation;
+    kst::ReceivedParameters parameters;
+};
+
+KSTStatus readPayload(base::ByteReader& reader, KSTHandle& handle, ReceivedPayload& payload) {
+    const kst::AssertionContext context = serializationContext();
+    if (!kst::readHandle(reader, handle)) {
+        return kst::fail(context, "(size - offset) >= sizeof(KSTHandle)", 0, kKSTErrorBadParameter);
+    }
+    std::uint32_t aclLength = 0;
+    if (!reader.readU32(aclLength)) {
+        return kst::fail(context, kWordCheck, 0, kKSTErrorBadParameter);
+    }
+    KSTStatus err =
+        payload.acl.read(reader, aclLength, "tmpAcl", "(size - offset) >= tmpAclLength");
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    std::uint32_t operationLength = 0;
+    if (!reader.readU32(operationLength)) {
+        return kst::fail(context, kWordCheck, 0, kKSTErrorBadParameter);
+    }
+    err = payload.operation.read(reader, operationLength, "op", "(size - offset) >= opLen");
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    return payload.parameters.read(reader);
+}
+
+} // namespace
+
+KSTStatus GetSerializedProcessAclSize(const KSTHandle* /*handle*/, const void* acl,
+                                      std::uint32_t aclLength, const void* /*operation*/,
+                                      std::uint32_t operationLength,
+                                      std::uint32_t /*maxGlobalCredentialAge*/,
+                                      const KSTParameter* parameters, std::uint32_t parametersCount,
+                                      std::uint32_t* outSize) noexcept {
+    KSTStatus err = checkAcl(acl, aclLength);
+    if (err == kKSTErrorSuccess) {
+        err = kst::requireArguments(serializationContext(), {{outSize, "outSize"}});
+    }
+    if (err == kKSTErrorSuccess) {
+        err = kst::checkParameterList(parameters, parametersCount);
+    }
+    std::uint64_t size = 0;
+    if (err == kKSTErrorSuccess) {
+        err = measure(aclLength, operationLength, parameters, parametersCount, size);
+    }
+    if (err == kKSTErrorSuccess) {
+        *outSize = static_cast<std::uint32_t>(size);
+    }
+    return err;
+}
+
+KSTStatus SerializeProcessAcl(const KSTHandle* handle, const void* acl, std::uint32_t aclLength,
+                              const void* operation, std::uint32_t operationLength,
+                              std::uint32_t maxGlobalCredentialAge, const KSTParameter* parameters,
+                              std::uint32_t parametersCount, void* outBuffer,
+                              std::uint32_t* outSize) noexcept {
+    const kst::AssertionContext context = serializationContext();
+    KSTStatus err = checkAcl(acl, aclLength);
+    if (err == kKSTErrorSuccess) {
+        err = kst::checkParameterList(parameters, parametersCount);
+    }
+    if (err == kKSTErrorSuccess) {
+        err = kst::requireArguments(context, {{outBuffer, "outBuffer"}, {outSize, "outSize"}});
+    }
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    std::uint64_t requiredSize = 0;
+    err = measure(aclLength, operationLength, parameters, parametersCount, requiredSize);
+    if (err != kKSTErrorSuccess) {
+        return kst::failCall(context, err);
+    }
+    constexpr const char* kRoomCheck = "*outSize >= requiredSize";
+    if (*outSize < requiredSize) {
+        return kst::fail(context, kRoomCheck, 0, kKSTErrorBadParameter);
+    }
+    if (operation == nullptr && operationLength != 0) {
+        return kst::fail(context, "operation || !operationLength", 0, kKSTErrorBadParameter);
+    }
+    err = kst::checkParameters(parameters, parametersCount);
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    base::ByteWriter writer(outBuffer, *outSize);
+    if (!kst::writeHandle(writer, handle) || !writer.writeU32(aclLength) ||
+        !writer.writeBytes(acl, aclLength) || !writer.writeU32(operationLength) ||
+        !writer.writeBytes(operation, operationLength) ||
+        !writer.writeU32(maxGlobalCredentialAge) ||
+        !kst::writeParameters(writer, parameters, parametersCount)) {
+        return kst::fail(context, kRoomCheck, 0, kKSTErrorBadParameter);
+    }
+    *outSize = static_cast<std::uint32_t>(writer.written());
+    return kKSTErrorSuccess;
+}
+
+KSTStatus DeserializeProcessAcl(const void* buffer, std::uint32_t size, KSTHandle* outHandle,
+                                void** outAcl, std::uint32_t* outAclLength, void** outOperation,
+                                std::uint32_t* outOperationLength,
+                                std::uint32_t* outMaxGlobalCredentialAge,
+                                KSTParameter** outParameters,
+                                std::uint32_t* outParametersCount) noexcept {
+    KSTStatus err = kst::requireArguments(serializationContext(),
+                                          {{buffer, "buffer"},
+                                           {outHandle, "handle"},
+                                           {outAcl, "acl"},
+                                           {outAclLength, "aclLength"},
+                                           {outOperation, "operation"},
+                                           {outOperationLength, "operationLength"},
+                                           {outMaxGlobalCredentialAge, "maxGlobalCredentialAge"},
+                                           {outParameters, "parameters"},
+                                           {outParametersCount, "parametersCount"}});
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    base::ByteReader reader(buffer, size);
+    ReceivedPayload payload;
+    err = readPayload(reader, *outHandle, payload);
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    *outAclLength = static_cast<std::uint32_t>(payload.acl.length());
+    *outAcl = payload.acl.handOut();
+    *outOperationLength = static_cast<std::uint32_t>(payload.operation.length());
+    *outOperation = payload.operation.handOut();
+    payload.parameters.handOut(*outMaxGlobalCredentialAge, *outParameters, *outParametersCount);
+    return kKSTErrorSuccess;
+}

@@ -1,0 +1,40 @@
+#pragma once
+
+#include "base/ByteReader.h"
+#include "common/Status.h"
+
+#include <cstddef>
+#include <cstdint>
+
+namespace kst {
+
+/// A copy of bytes from a payload, released with the object unless it was handed out.
+class ReceivedBlob {
+  public:
+    ReceivedBlob() = default;
+    ReceivedBlob(const ReceivedBlob&) = delete;
+    ReceivedBlob& operator=(const ReceivedBlob&) = delete;
+    ~ReceivedBlob();
+
+    /// Copies the next `length` bytes; none are a null pointer.
+    ///
+    /// The memory is had before the bytes are looked for: kKSTErrorOutOfMemory, with a line that
+    /// says `memoryCheck`, comes before kKSTErrorBadParameter, with `sizeCheck`. A length that the
+    /// payload does not have costs address space only, because nothing is written then. To be
+    /// called once.
+    [[nodiscard]] KSTStatus read(base::ByteReader& reader, std::size_t length,
+                                 const char* memoryCheck, const char* sizeCheck,
+                                 int line = __builtin_LINE()) noexcept;
+
+    [[nodiscard]] std::size_t length() const { return length_; }
+
+    /// The caller owns the bytes from now on.
+    [[nodiscard]] std::uint8_t* handOut() noexcept;
+
+  private:
+    std::uint8_t* bytes_ = nullptr;
+    std::size_t length_ = 0;
+    std::size_t written_ = 0;
+};
+
+} // namespace kst

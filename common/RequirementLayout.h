@@ -1,0 +1,105 @@
+#pragma once
+
+#include "common/AssertLine.h"
+#include "common/Requirement.h"
+
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+
+/// Where the parts of a requirement are in memory. All offsets are from the start of its header.
+namespace kst {
+
+/// What a slot for a child takes, aligned or not.
+inline constexpr std::size_t kChildSize = sizeof(KSTRequirement*);
+static_assert(kChildSize == 8, "a dataLength on the wire says so");
+static_assert(sizeof(KSTRequirement) == 16);
+
+struct CompositeLayout {
+    std::size_t countOffset;
+    std::size_t childrenOffset;
+};
+
+inline constexpr CompositeLayout kListLayout{16, 20};
+inline constexpr CompositeLayout kKofNLayout{20, 24};
+inline constexpr CompositeLayout kInMemoryLayout{33, 37};
+
+/// Null for a leaf and for a type that does not exist.
+[[nodiscard]] constexpr const CompositeLayout* findCompositeLayout(std::uint32_t type) noexcept {
+    switch (type) {
+    case kKSTRequirementTypeAnd:
+    case kKSTRequirementTypeOr:
+        return &kListLayout;
+    case kKSTRequirementTypeKofN:
+        return &kKofNLayout;
+    case kKSTRequirementTypeInMemory:
+        return &kInMemoryLayout;
+    default:
+        return nullptr;
+    }
+}
+
+/// Whether a requirement of that type can be on the wire.
+[[nodiscard]] constexpr bool isWireType(std::uint32_t type) noexcept {
+    return type >= 1 && type <= kKSTRequirementTypeMax;
+}
+
+[[nodiscard]] constexpr std::size_t compositeSize(const CompositeLayout& layout,
+                                                  std::uint32_t childCount) noexcept {
+    return layout.childrenOffset + childCount * kChildSize;
+}
+
+[[nodiscard]] inline std::size_t nodeSize(const KSTRequirement* node) noexcept {
+    return sizeof(KSTRequirement) + node->dataLength;
+}
+
+/// The count as it is stored; 0 when the node is too short to have one.
+[[nodiscard]] inline std::uint32_t storedChildCount(const KSTRequirement* node,
+                                                    const CompositeLayout& layout) noexcept {
+    std::uint32_t count = 0;
+    if (nodeSize(node) >= layout.childrenOffset) {
+        std::memcpy(&count, reinterpret_cast<const std::uint8_t*>(node) + layout.countOffset,
+                    sizeof count);
+    }
+    return count;
+}
+
+/// How many children the node has: what it says, as far as it has slots for them.
+[[nodiscard]] inline std::uint32_t childCount(const KSTRequirement* node) noexcept {
+    const CompositeLayout* layout = findCompositeLayout(node->type);
+    if (layout == nullptr || nodeSize(node) < layout->childrenOffset) {
+        return 0;
+    }
+    const std::size_t slots = (nodeSize(node) - layout->childrenOffset) / kChildSize;
+    return std::min(storedChildCount(node, *layout), static_cast<std::uint32_t>(slots));
+}
+
+/// `index` is below `childCount`.
+[[nodiscard]] inline KSTRequirement* childAt(const KSTRequirement* node,
+                                             std::uint32_t index) noexcept {
+    const CompositeLayout& layout = *findCompositeLayout(node->type);
+    KSTRequirement* child = nullptr;
+    std::memcpy(&child, reinterpret_cast<const std::uint8_t*>(node) + compositeSize(layout, index),
+                kChildSize);
+    return child;
+}
+
+inline void setChildAt(KSTRequirement* node, std::uint32_t index,
+                       const KSTRequirement* child) noexcept {
+    const CompositeLayout& layout = *findCompositeLayout(node->type);
+    std::memcpy(reinterpret_cast<std::uint8_t*>(node) + compositeSize(layout, index), &child,
+                kChildSize);
+}
+
+/// Writes the line "err == 0 " once for each of `levels` levels that a failure passes on its way
+/// up. Hands `status` back.
+inline KSTStatus failLevels(const AssertionContext& context, KSTStatus status,
+                            std::size_t levels) noexcept {
+    for (std::size_t level = 0; level < levels; ++level) {
+        static_cast<void>(failCall(context, status));
+    }
+    return status;
+}
+
+} // namespace kst

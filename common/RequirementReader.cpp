@@ -1,0 +1,200 @@
+#include "base/ByteReader.h"
+#include "common/Allocation.h"
+#include "common/LevelStack.h"
+#include "common/RequiredArguments.h"
+#include "common/RequirementLayout.h"
+#include "common/RequirementSerialization.h"
+#include "common/SerializationContext.h"
+
+#include <limits>
+#include <span>
+#include <utility>
+
+namespace {
+
+using Bytes = std::span<const std::uint8_t>;
+
+constexpr const char* kFitsCheck = "size >= reqSize";
+
+/// What a requirement on the wire says about itself.
+struct Announcement {
+    /// In memory.
+    std::size_t nodeSize = 0;
+    /// On the wire, without the children.
+    std::size_t wireSize = 0;
+    std::uint32_t childCount = 0;
+};
+
+KSTStatus readCompositeSizes(Bytes bytes, const kst::CompositeLayout& layout,
+                             Announcement& announcement) {
+    const kst::AssertionContext context = kst::serializationContext();
+    base::ByteReader reader(bytes);
+    std::uint32_t count = 0;
+    if (bytes.size() < layout.childrenOffset || !reader.skip(layout.countOffset) ||
+        !reader.readU32(count) || kst::compositeSize(layout, count) > bytes.size()) {
+        return kst::fail(context, kFitsCheck, 0, kKSTErrorBadParameter);
+    }
+    announcement = {kst::compositeSize(layout, count), layout.childrenOffset, count};
+    if (announcement.nodeSize - sizeof(KSTRequirement) >
+        std::numeric_limits<std::uint32_t>::max()) {
+        return kst::fail(context, "reqSize - sizeof(KSTRequirement) <= UINT32_MAX", 0,
+                         kKSTErrorBadParameter);
+    }
+    return kKSTErrorSuccess;
+}
+
+/// Reads and checks the requirement at the start of `bytes`.
+KSTStatus readAnnouncement(Bytes bytes, Announcement& announcement) {
+    const kst::AssertionContext context = kst::serializationContext();
+    KSTRequirement header{};
+    base::ByteReader reader(bytes);
+    if (!reader.readBytes(&header, sizeof header)) {
+        return kst::fail(context, "size >= sizeof(KSTRequirement)", 0, kKSTErrorBadParameter);
+    }
+    if (!kst::isWireType(header.type)) {
+        return kst::fail(context, "0", 0, kKSTErrorBadParameter);
+    }
+    if (const kst::CompositeLayout* layout = kst::findCompositeLayout(header.type)) {
+        return readCompositeSizes(bytes, *layout, announcement);
+    }
+    const std::size_t size = kst::nodeSize(&header);
+    if (size > bytes.size()) {
+        return kst::fail(context, kFitsCheck, 0, kKSTErrorBadParameter);
+    }
+    announcement = {size, size, 0};
+    return kKSTErrorSuccess;
+}
+
+/// A composite and its children that have been read already. Without a node when it is read only to
+/// find the failure.
+struct Level {
+    KSTRequirement* node;
+    std::uint32_t childCount;
+    std::uint32_t next;
+};
+
+/// Builds the tree at the start of a buffer. What has been built belongs to the builder until it is
+/// taken.
+class TreeBuilder {
+  public:
+    explicit TreeBuilder(Bytes bytes) : rest_(bytes) {}
+    TreeBuilder(const TreeBuilder&) = delete;
+    TreeBuilder& operator=(const TreeBuilder&) = delete;
+    ~TreeBuilder() { DeallocRequirement(root_); }
+
+    [[nodiscard]] KSTStatus build() {
+        do {
+            const KSTStatus err = readNode();
+            if (err != kKSTErrorSuccess) {
+                return kst::failLevels(kst::serializationContext(), err, levels_.size());
+            }
+        } while (nextSlot());
+        return kKSTErrorSuccess;
+    }
+
+    [[nodiscard]] KSTRequirement* take() { return std::exchange(root_, nullptr); }
+
+    /// What has not been read.
+    [[nodiscard]] Bytes rest() const { return rest_; }
+
+  private:
+    /// Reads one requirement into the slot that `nextSlot` has gone to.
+    KSTStatus readNode() {
+        const kst::AssertionContext context = kst::serializationContext();
+        Announcement announcement;
+        const KSTStatus err = readAnnouncement(rest_, announcement);
+        if (err != kKSTErrorSuccess) {
+            return err;
+        }
+        canSucceed_ = canSucceed_ && hasBytesForAll(announcement);
+        KSTRequirement* node = nullptr;
+        if (canSucceed_) {
+            node = makeNode(announcement);
+            if (node == nullptr) {
+                return kst::fail(context, "req", 0, kKSTErrorOutOfMemory);
+            }
+        }
+        rest_ = rest_.subspan(announcement.wireSize);
+        if (announcement.childCount == 0) {
+            return kKSTErrorSuccess;
+        }
+        if (!levels_.push({node, announcement.childCount, 0})) {
+            return kst::fail(context, "levels", 0, kKSTErrorOutOfMemory);
+        }
+        missing_ += announcement.childCount;
+        return kKSTErrorSuccess;
+    }
+
+    /// Whether the buffer can hold all requirements that are still missing. When it cannot, the
+    /// tree is only read to its failure and no longer built: counts that nothing stands behind must
+    /// not cost memory, not even when every level has one.
+    [[nodiscard]] bool hasBytesForAll(const Announcement& announcement) const {
+        const std::size_t left = rest_.size() - announcement.wireSize;
+        return missing_ + announcement.childCount <= left / sizeof(KSTRequirement);
+    }
+
+    /// A node with all but its children, in its slot. Null when there is no memory.
+    KSTRequirement* makeNode(const Announcement& announcement) {
+        auto* node = static_cast<KSTRequirement*>(kst::allocate(announcement.nodeSize));
+        if (node == nullptr) {
+            return nullptr;
+        }
+        std::memcpy(node, rest_.data(), announcement.wireSize);
+        node->dataLength =
+            static_cast<std::uint32_t>(announcement.nodeSize - sizeof(KSTRequirement));
+        if (levels_.empty()) {
+            root_ = node;
+        } else {
+            kst::setChildAt(levels_.top().node, levels_.top().next - 1, node);
+        }
+        return node;
+    }
+
+    /// Goes to the next slot without a child, out of the levels that are full. False when the tree
+    /// is complete.
+    bool nextSlot() {
+        while (!levels_.empty()) {
+            Level& level = levels_.top();
+            if (level.next < level.childCount) {
+                ++level.next;
+                --missing_;
+                return true;
+            }
+            levels_.pop();
+        }
+        return false;
+    }
+
+    Bytes rest_;
+    kst::LevelStack<Level> levels_;
+    KSTRequirement* root_ = nullptr;
+    /// Children of the open levels that have not been begun.
+    std::uint64_t missing_ = 0;
+    bool canSucceed_ = true;
+};
+
+} // namespace
+
+KSTStatus DeserializeRequirement(const void* buffer, std::size_t size,
+                                 KSTRequirement** outRequirement,
+                                 std::size_t* consumedBytes) noexcept {
+    const kst::AssertionContext context = kst::serializationContext();
+    if (buffer == nullptr) {
+        return kst::fail(context, "buffer", 0, kKSTErrorBadParameter);
+    }
+    if (size < sizeof(KSTRequirement)) {
+        return kst::fail(context, "size >= sizeof(KSTRequirement)", 0, kKSTErrorBadParameter);
+    }
+    KSTStatus err = kst::requireArguments(
+        context, {{outRequirement, "requirement"}, {consumedBytes, "consumedBytes"}});
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    TreeBuilder builder({static_cast<const std::uint8_t*>(buffer), size});
+    err = builder.build();
+    if (err == kKSTErrorSuccess) {
+        *consumedBytes = size - builder.rest().size();
+        *outRequirement = builder.take();
+    }
+    return err;
+}

@@ -1,0 +1,164 @@
+#include "common/VerifyPolicySerialization.h"
+
+#include "common/HandleWire.h"
+#include "common/ParameterSerialization.h"
+#include "common/ParameterWire.h"
+#include "common/ReceivedBlob.h"
+#include "common/RequiredArguments.h"
+#include "common/SerializationContext.h"
+
+#include <algorithm>
+#include <string.h>
+
+namespace {
+
+using kst::serializationContext;
+
+static_assert(kKSTPolicyIdMaxLength == 128, "the texts below name it");
+
+/// Handle, zero byte, preflight, age and count.
+constexpr std::uint64_t kFixedSize =
+    kKSTHandleSize + 1 + sizeof(std::uint8_t) + sizeof(std::uint32_t) + sizeof(std::uint32_t);
+
+/// The length of a policy's name, looking at one byte more than it may have.
+std::size_t policyIdLength(const void* policyId, std::size_t size) {
+    return ::strnlen(static_cast<const char*>(policyId),
+                     std::min<std::size_t>(size, kKSTPolicyIdMaxLength + 1));
+}
+
+KSTStatus readPolicyId(base::ByteReader& reader, kst::ReceivedBlob& policyId) {
+    const std::size_t length = policyIdLength(reader.rest().data(), reader.left());
+    if (length > kKSTPolicyIdMaxLength) {
+        return kst::fail(serializationContext(), "(policyLength <= 128)", 0, kKSTErrorBadParameter);
+    }
+    constexpr const char* kSizeCheck = "(size - offset) >= (policyLength + 1)";
+    if (reader.left() < length + 1) {
+        return kst::fail(serializationContext(), kSizeCheck, 0, kKSTErrorBadParameter);
+    }
+    return policyId.read(reader, length + 1, "policy", kSizeCheck);
+}
+
+struct ReceivedPayload {
+    kst::ReceivedBlob policyId;
+    std::uint8_t preflight = 0;
+    kst::ReceivedParameters parameters;
+};
+
+KSTStatus readPayload(base::ByteReader& reader, KSTHandle& handle, ReceivedPayload& payload) {
+    const kst::AssertionContext context = serializationContext();
+    if (!kst::readHandle(reader, handle)) {
+        return kst::fail(context, "(size - offset) >= sizeof(KSTHandle)", 0, kKSTErrorBadParameter);
+    }
+    const KSTStatus err = readPolicyId(reader, payload.policyId);
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    if (!reader.readU8(payload.preflight)) {
+        return kst::fail(context, "(size - offset) >= sizeof(uint8_t)", 0, kKSTErrorBadParameter);
+    }
+    return payload.parameters.read(reader);
+}
+
+} // namespace
+
+KSTStatus GetSerializedVerifyPolicySize(const KSTHandle* handle, const char* policyId,
+                                        std::uint8_t /*preflight*/,
+                                        std::uint32_t /*maxGlobalCredentialAge*/,
+                                        const KSTParameter* parameters,
+                                        std::uint32_t parametersCount,
+                                        std::size_t* outSize) noexcept {
+    const KSTStatus missing = kst::requireArguments(
+        serializationContext(), {{handle, "handle"}, {policyId, "policyId"}, {outSize, "outSize"}});
+    if (missing != kKSTErrorSuccess) {
+        return missing;
+    }
+    const std::size_t policyLength = policyIdLength(policyId, SIZE_MAX);
+    if (policyLength > kKSTPolicyIdMaxLength) {
+        return kst::fail(serializationContext(), "policyLength <= 128", 0, kKSTErrorBadParameter);
+    }
+    std::uint32_t parametersLength = 0;
+    const KSTStatus err =
+        GetSerializedParametersLength(parameters, parametersCount, &parametersLength);
+    if (err != kKSTErrorSuccess) {
+        return kst::fail(serializationContext(), "err == kKSTErrorSuccess", 0, err);
+    }
+    const std::uint64_t size = policyLength + kFixedSize + parametersLength;
+    if (size <= parametersLength) {
+        return kst::fail(serializationContext(),
+                         "sizeof(KSTHandle) + policyLength + 1 + sizeof(uint8_t) + "
+                         "sizeof(uint32_t) + sizeof(uint32_t) + parametersLength > "
+                         "parametersLength",
+                         0, kKSTErrorBadParameter);
+    }
+    *outSize = size;
+    return kKSTErrorSuccess;
+}
+
+KSTStatus SerializeVerifyPolicy(const KSTHandle* handle, const char* policyId,
+                                std::uint8_t preflight, std::uint32_t maxGlobalCredentialAge,
+                                const KSTParameter* parameters, std::uint32_t parametersCount,
+                                void* outBuffer, std::size_t* outSize) noexcept {
+    const kst::AssertionContext context = serializationContext();
+    KSTStatus err = kst::requireArguments(context, {{handle, "handle"}, {policyId, "policyId"}});
+    if (err == kKSTErrorSuccess) {
+        err = kst::checkParameterList(parameters, parametersCount);
+    }
+    if (err == kKSTErrorSuccess) {
+        err = kst::requireArguments(context, {{outBuffer, "outBuffer"}, {outSize, "outSize"}});
+    }
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    std::size_t requiredSize = 0;
+    err = GetSerializedVerifyPolicySize(handle, policyId, preflight, maxGlobalCredentialAge,
+                                        parameters, parametersCount, &requiredSize);
+    if (err != kKSTErrorSuccess) {
+        return kst::failCall(context, err);
+    }
+    constexpr const char* kRoomCheck = "*outSize >= requiredSize";
+    if (*outSize < requiredSize) {
+        return kst::fail(context, kRoomCheck, 0, kKSTErrorBadParameter);
+    }
+    err = kst::checkParameters(parameters, parametersCount);
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    base::ByteWriter writer(outBuffer, *outSize);
+    const std::size_t policyLength = policyIdLength(policyId, SIZE_MAX);
+    if (!kst::writeHandle(writer, handle) || !writer.writeBytes(policyId, policyLength) ||
+        !writer.writeU8(0) || !writer.writeU8(preflight) ||
+        !writer.writeU32(maxGlobalCredentialAge) ||
+        !kst::writeParameters(writer, parameters, parametersCount)) {
+        return kst::fail(context, kRoomCheck, 0, kKSTErrorBadParameter);
+    }
+    *outSize = writer.written();
+    return kKSTErrorSuccess;
+}
+
+KSTStatus DeserializeVerifyPolicy(const void* buffer, std::size_t size, KSTHandle* outHandle,
+                                  char** outPolicyId, std::uint8_t* outPreflight,
+                                  std::uint32_t* outMaxGlobalCredentialAge,
+                                  KSTParameter** outParameters,
+                                  std::uint32_t* outParametersCount) noexcept {
+    KSTStatus err = kst::requireArguments(serializationContext(),
+                                          {{buffer, "buffer"},
+                                           {outHandle, "handle"},
+                                           {outPolicyId, "policyId"},
+                                           {outPreflight, "preflight"},
+                                           {outMaxGlobalCredentialAge, "maxGlobalCredentialAge"},
+                                           {outParameters, "parameters"},
+                                           {outParametersCount, "parametersCount"}});
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    base::ByteReader reader(buffer, size);
+    ReceivedPayload payload;
+    err = readPayload(reader, *outHandle, payload);
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    *outPolicyId = reinterpret_cast<char*>(payload.policyId.handOut());
+    *outPreflight = payload.preflight != 0 ? 1 : 0;
+    payload.parameters.handOut(*outMaxGlobalCredentialAge, *outParameters, *outParametersCount);
+    return kKSTErrorSuccess;
+}

@@ -1,0 +1,85 @@
+// Trees of requirements from outside: what can be read can be walked, comes back the same after it
+// was written, and nothing stays allocated.
+
+#include "KSTLib/RequirementObjects.h"
+#include "common/AllocatedBytes.h"
+#include "common/RequirementSerialization.h"
+
+#include <cstdint>
+#include <cstdlib>
+#include <vector>
+
+namespace {
+
+void require(bool condition) {
+    if (!condition) {
+        std::abort();
+    }
+}
+
+/// The properties are inside the node.
+void checkProperties(const KSTRequirement* node) {
+    const auto* begin = reinterpret_cast<const std::uint8_t*>(node);
+    const auto check = [&](std::uint32_t /*propertyId*/, const void* data, std::size_t length) {
+        const auto offset =
+            static_cast<std::size_t>(static_cast<const std::uint8_t*>(data) - begin);
+        require(offset + length <= sizeof(KSTRequirement) + node->dataLength);
+    };
+    require(KSTRequirementGetProperties(node, check) == 0);
+}
+
+/// Every node once. Each takes at least its header on the wire.
+void walk(const KSTRequirement* tree, std::size_t consumed) {
+    std::size_t nodes = 0;
+    std::vector<const KSTRequirement*> pending = {tree};
+    while (!pending.empty()) {
+        const KSTRequirement* node = pending.back();
+        pending.pop_back();
+        ++nodes;
+        checkProperties(node);
+        const auto enter = [&pending](const KSTRequirement* child) {
+            pending.push_back(child);
+        };
+        KSTRequirementGetSubrequirements(node, enter);
+    }
+    require(nodes * sizeof(KSTRequirement) <= consumed);
+}
+
+std::vector<std::uint8_t> written(const KSTRequirement* tree, std::size_t consumed) {
+    std::size_t size = 0;
+    require(GetSerializedRequirementSize(tree, &size) == 0 && size == consumed);
+    std::vector<std::uint8_t> bytes(size);
+    require(SerializeRequirement(tree, bytes.data(), &size) == 0 && size == consumed);
+    return bytes;
+}
+
+/// What was written is what a second reader writes.
+void checkBytes(const KSTRequirement* tree, std::size_t consumed) {
+    const std::vector<std::uint8_t> bytes = written(tree, consumed);
+    KSTRequirement* again = nullptr;
+    std::size_t consumedAgain = 0;
+    require(DeserializeRequirement(bytes.data(), bytes.size(), &again, &consumedAgain) == 0);
+    require(consumedAgain == consumed && written(again, consumed) == bytes);
+    DeallocRequirement(again);
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+    // An empty input may come without an address, which is another failure than one without bytes.
+    static const std::uint8_t kNothing = 0;
+    const std::uint8_t* bytes = size > 0 ? data : &kNothing;
+    const std::int64_t allocatedBefore = gAllocatedBytes;
+    KSTRequirement* tree = nullptr;
+    std::size_t consumed = 0;
+    if (DeserializeRequirement(bytes, size, &tree, &consumed) == 0) {
+        require(consumed <= size);
+        walk(tree, consumed);
+        checkBytes(tree, consumed);
+        DeallocRequirement(tree);
+    } else {
+        require(tree == nullptr && consumed == 0);
+    }
+    require(gAllocatedBytes == allocatedBefore);
+    return 0;
+}
