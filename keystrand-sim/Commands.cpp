@@ -26,15 +26,15 @@ struct NumberedPayload {
     Payload rest;
 };
 
-CommandResult setVariable(EnvironmentVariables& environment, Payload payload) {
+CommandResult setVariable(NumberedValues& environment, Payload payload) {
     const NumberedPayload variable(payload);
     if (!environment.set(variable.number, variable.rest)) {
-        return {.status = kKernelTableFull, .output = {}};
+        return endedWith(kKernelTableFull);
     }
     return {};
 }
 
-CommandResult getVariable(const EnvironmentVariables& environment, Payload payload) {
+CommandResult getVariable(const NumberedValues& environment, Payload payload) {
     const Payload value = environment.get(NumberedPayload(payload).number);
     return {.status = kKernelSuccess, .output = {value.begin(), value.end()}};
 }
@@ -46,13 +46,18 @@ CommandResult kernelControl(const DispatchTable& controls, Payload payload) {
 
 } // namespace
 
-DispatchTable makeCommands(EnvironmentVariables& environment, const DispatchTable& kernelControls) {
+DispatchTable makeCommands(KernelState& kernel, const Now& now,
+                           const DispatchTable& kernelControls) {
     DispatchTable table;
+    addContextCommands(table, kernel);
+    addCredentialCommands(table, kernel, now);
+    addPolicyCommands(table, kernel, now);
+    addAccessListCommand(table, kernel);
     table.add(kKSTCommandSetEnvironmentVariable,
               {.min = kNumberSize, .max = kNumberSize + kKSTEnvironmentVariableMaxSize},
-              [&](Payload payload) { return setVariable(environment, payload); });
+              [&](Payload payload) { return setVariable(kernel.environment, payload); });
     table.add(kKSTCommandGetEnvironmentVariable, {.min = kNumberSize, .max = kNumberSize},
-              [&](Payload payload) { return getVariable(environment, payload); });
+              [&](Payload payload) { return getVariable(kernel.environment, payload); });
     table.add(kKSTCommandKernelControl,
               {.min = kNumberSize, .max = kNumberSize + kKSTKernelControlMaxSize},
               [&](Payload payload) { return kernelControl(kernelControls, payload); });

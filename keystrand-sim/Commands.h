@@ -1,12 +1,29 @@
 #pragma once
 
 #include "keystrand-sim/DispatchTable.h"
-#include "keystrand-sim/EnvironmentVariables.h"
+#include "keystrand-sim/KernelState.h"
+
+#include <cstdint>
+#include <functional>
 
 namespace sim {
 
-/// The commands of a frame. The table refers to its arguments.
-[[nodiscard]] DispatchTable makeCommands(EnvironmentVariables& environment,
+/// The time in seconds, which ages are counted in.
+using Now = std::function<CredentialSet::Seconds()>;
+
+/// The commands of a frame. The table refers to the state and to the controls.
+[[nodiscard]] DispatchTable makeCommands(KernelState& kernel, const Now& now,
                                          const DispatchTable& kernelControls);
+
+/// The groups of commands, a file of source for each.
+void addContextCommands(DispatchTable& table, KernelState& kernel);
+void addCredentialCommands(DispatchTable& table, KernelState& kernel, const Now& now);
+void addPolicyCommands(DispatchTable& table, KernelState& kernel, const Now& now);
+void addAccessListCommand(DispatchTable& table, KernelState& kernel);
+
+/// A result without output.
+[[nodiscard]] inline CommandResult endedWith(KernelStatus status) {
+    return {.status = status, .output = {}};
+}
 
 } // namespace sim

@@ -25,8 +25,8 @@ constexpr std::array kProgramCommands = {
     ControlCommand{"quit", "", quit},
 };
 
-std::array<std::span<const ControlCommand>, 6> allCommands() {
-    return {timerCommands(),   publishCommands(), kernelStateCommands(),
+std::array<std::span<const ControlCommand>, 7> allCommands() {
+    return {timerCommands(),   publishCommands(), kernelStateCommands(), clientStateCommands(),
             requestCommands(), faultCommands(),   kProgramCommands};
 }
 

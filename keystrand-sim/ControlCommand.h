@@ -65,6 +65,7 @@ struct ControlCommand {
 [[nodiscard]] std::span<const ControlCommand> timerCommands();
 [[nodiscard]] std::span<const ControlCommand> publishCommands();
 [[nodiscard]] std::span<const ControlCommand> kernelStateCommands();
+[[nodiscard]] std::span<const ControlCommand> clientStateCommands();
 [[nodiscard]] std::span<const ControlCommand> requestCommands();
 [[nodiscard]] std::span<const ControlCommand> faultCommands();
 

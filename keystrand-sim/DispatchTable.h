@@ -5,6 +5,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <functional>
+#include <limits>
 #include <map>
 #include <span>
 #include <vector>
@@ -25,14 +26,18 @@ class DispatchTable {
     struct Lengths {
         std::size_t min = 0;
         std::size_t max = 0;
+        /// The least room for output that the caller must offer.
+        std::size_t output = 0;
     };
+    static constexpr std::size_t kAnyRoom = std::numeric_limits<std::size_t>::max();
 
     void add(std::uint32_t code, Lengths lengths, Handler handler);
 
     /// kKernelUnknownCommand for a number that is not in the table, kKernelBadPayload for a length
-    /// that the command does not take; otherwise what its handler says.
-    [[nodiscard]] CommandResult run(std::uint32_t code,
-                                    std::span<const std::uint8_t> payload) const;
+    /// that the command does not take, kKernelReplyDoesNotFit for less room than it needs;
+    /// otherwise what its handler says.
+    [[nodiscard]] CommandResult run(std::uint32_t code, std::span<const std::uint8_t> payload,
+                                    std::size_t offered = kAnyRoom) const;
 
   private:
     struct Entry {

@@ -2,6 +2,7 @@
 
 #include <cerrno>
 #include <ctime>
+#include <string.h>
 #include <sys/epoll.h>
 #include <sys/socket.h>
 #include <utility>
@@ -37,7 +38,11 @@ KernelConnection::Alive KernelConnection::receive() {
     if (size == 0) {
         return Alive::no;
     }
-    return carryOut(handler_.handle(packetBuffer_.first(static_cast<std::size_t>(size)), state_));
+    const auto packet = packetBuffer_.first(static_cast<std::size_t>(size));
+    RequestOutcome outcome = handler_.handle(packet, state_);
+    // There may be a credential in it.
+    ::explicit_bzero(packet.data(), packet.size());
+    return carryOut(std::move(outcome));
 }
 
 KernelConnection::Alive KernelConnection::carryOut(RequestOutcome outcome) {

@@ -1,6 +1,9 @@
 #pragma once
 
-#include "keystrand-sim/EnvironmentVariables.h"
+#include "keystrand-sim/ContextTable.h"
+#include "keystrand-sim/CredentialSet.h"
+#include "keystrand-sim/NumberedValues.h"
+#include "keystrand-sim/PolicyTable.h"
 #include "keystrand-sim/Registry.h"
 
 #include <cstdint>
@@ -10,7 +13,10 @@ namespace sim {
 /// What the kernel service holds besides the restricted-mode timer.
 struct KernelState {
     Registry registry;
-    EnvironmentVariables environment;
+    NumberedValues environment;
+    ContextTable contexts;
+    CredentialSet globalCredentials;
+    PolicyTable policies;
     std::uint8_t logLevel = 40;
 };
 

@@ -17,5 +17,10 @@ inline constexpr KernelStatus kKernelUnknownCommand = -6006;
 inline constexpr KernelStatus kKernelBadPayload = -6007;
 inline constexpr KernelStatus kKernelReplyDoesNotFit = -6008;
 inline constexpr KernelStatus kKernelTableFull = -6009;
+inline constexpr KernelStatus kKernelNoSuchContext = -6010;
+inline constexpr KernelStatus kKernelTooManyContexts = -6011;
+inline constexpr KernelStatus kKernelTooManyCredentials = -6012;
+inline constexpr KernelStatus kKernelNoSuchPolicy = -6013;
+inline constexpr KernelStatus kKernelBadConstraint = -6014;
 
 } // namespace sim

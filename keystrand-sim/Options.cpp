@@ -31,6 +31,8 @@ std::optional<Options> parseOptions(int argc, const char* const* argv, int& exit
 
     app.add_flag("--quiet", settings.quiet, "Publish nothing but what a command asks for");
 
+    app.add_option("--policies", settings.policies, "The policies are in this file");
+
     std::vector<std::string> words;
     CLI::App* control = app.add_subcommand("ctl", "Send one command to a running simulator");
     control->add_option("--root", settings.root, "The running simulator's root directory")

@@ -25,9 +25,14 @@ std::string describe(const LoggedRequest& request) {
     if (request.control) {
         line += base::concat(" control ", *request.control);
     }
-    line += base::concat(" payload ", toHexWord(request.payload), " status ",
-                         numberOrNone(request.status));
-    return line;
+    line += base::concat(" payload ", toHexWord(request.payload));
+    if (request.credentialType) {
+        line += base::concat(" credential ", *request.credentialType);
+    }
+    if (request.withheld > 0) {
+        line += base::concat(" withheld ", request.withheld);
+    }
+    return base::concat(line, " status ", numberOrNone(request.status));
 }
 
 ControlOutcome listRequests(ControlContext& context, ControlArguments& arguments) {

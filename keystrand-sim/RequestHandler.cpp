@@ -3,6 +3,7 @@
 #include "base/ByteWriter.h"
 #include "common/Command.h"
 #include "keystrand-sim/CommandFrame.h"
+#include "keystrand-sim/Withholding.h"
 #include "wire/RestrictedMode.h"
 
 #include <cassert>
@@ -21,11 +22,13 @@ constexpr std::uint8_t kGarbageByte = 0xa5;
 struct CallDescription {
     RequestKind kind;
     std::span<const std::uint8_t> payload;
+    std::optional<Withholding> withholding;
 };
 
 CallDescription describe(KernelOperation operation, std::span<const std::uint8_t> body) {
     CallDescription call{.kind = {.operation = operation, .command = {}, .control = {}},
-                         .payload = body};
+                         .payload = body,
+                         .withholding = {}};
     if (operation != KernelOperation::structCall) {
         return call;
     }
@@ -35,7 +38,14 @@ CallDescription describe(KernelOperation operation, std::span<const std::uint8_t
     }
     call.payload = request->input;
     const auto frame = decodeCommandFrame(request->input);
-    if (!frame || request->selector != kKSTSelectorCommand) {
+    if (!frame) {
+        return call;
+    }
+    call.withholding = withholdingFrom(frame->code, frame->payload);
+    if (request->selector != kKSTSelectorCommand) {
+        if (call.withholding) {
+            call.withholding->kept += kKSTCommandHeaderSize;
+        }
         return call;
     }
     call.kind.command = frame->code;
@@ -46,10 +56,13 @@ CallDescription describe(KernelOperation operation, std::span<const std::uint8_t
 
 LoggedRequest logEntry(const CallDescription& call, std::optional<KernelStatus> sent,
                        std::optional<KernelStatus> performed) {
+    const auto kept = call.withholding ? call.payload.first(call.withholding->kept) : call.payload;
     return {.index = 0,
             .command = call.kind.command,
             .control = call.kind.control,
-            .payload = {call.payload.begin(), call.payload.end()},
+            .payload = {kept.begin(), kept.end()},
+            .withheld = call.payload.size() - kept.size(),
+            .credentialType = call.withholding ? call.withholding->credentialType : std::nullopt,
             .status = sent,
             .acknowledged = call.kind.control == wire::rm::kKSTKernelControlRMNotificationAck &&
                             performed == kKernelSuccess};
@@ -209,7 +222,7 @@ RequestHandler::Reply RequestHandler::structCall(Bytes body,
     if (!frame) {
         return failed(kKernelMalformedFrame);
     }
-    CommandResult result = parts_.commands.run(frame->code, frame->payload);
+    CommandResult result = parts_.commands.run(frame->code, frame->payload, request->offeredSize);
     if (result.status != kKernelSuccess) {
         return failed(result.status);
     }

@@ -17,7 +17,11 @@ struct LoggedRequest {
     /// None when the input was not a command frame; the payload is then the whole input.
     std::optional<std::uint8_t> command;
     std::optional<std::uint32_t> control;
+    /// Without the bytes that are withheld from its end.
     std::vector<std::uint8_t> payload;
+    /// How many bytes are not kept, because there is a credential in them.
+    std::size_t withheld = 0;
+    std::optional<std::uint8_t> credentialType;
     /// None when no status was sent.
     std::optional<std::int32_t> status;
     /// A notification was acknowledged by it.

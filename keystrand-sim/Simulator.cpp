@@ -31,6 +31,13 @@ bool makeDirectory(const std::string& path, std::string& error) {
 } // namespace
 
 std::unique_ptr<Simulator> Simulator::create(const Settings& settings, std::string& error) {
+    PolicyTable policies;
+    if (!settings.policies.empty()) {
+        if (const auto problem = policies.load(settings.policies)) {
+            error = *problem;
+            return nullptr;
+        }
+    }
     const Paths paths(settings.root);
     if (!makeDirectory(paths.runDirectory, error) ||
         !makeDirectory(paths.serviceDirectory, error)) {
@@ -49,8 +56,9 @@ std::unique_ptr<Simulator> Simulator::create(const Settings& settings, std::stri
     if (!control) {
         return nullptr;
     }
-    std::unique_ptr<Simulator> simulator(
-        new Simulator(settings, paths, std::move(loop), std::move(*service), std::move(*control)));
+    std::unique_ptr<Simulator> simulator(new Simulator(settings, paths, std::move(policies),
+                                                       std::move(loop), std::move(*service),
+                                                       std::move(*control)));
     if (!simulator->deadline_ || !simulator->terminate_ || !simulator->interrupt_) {
         error = "cannot watch for signals and time";
         return nullptr;
@@ -58,14 +66,16 @@ std::unique_ptr<Simulator> Simulator::create(const Settings& settings, std::stri
     return simulator;
 }
 
-Simulator::Simulator(const Settings& settings, const Paths& paths, std::unique_ptr<EventLoop> loop,
-                     ListeningSocket service, ListeningSocket control)
+Simulator::Simulator(const Settings& settings, const Paths& paths, PolicyTable policies,
+                     std::unique_ptr<EventLoop> loop, ListeningSocket service,
+                     ListeningSocket control)
     : loop_(std::move(loop)),
       events_(*loop_, paths.eventSocket),
       publisher_(kernel_.registry, events_),
       restrictedMode_(settings.periods, Clock(settings.clock), kernel_.registry, publisher_),
       kernelControls_(makeKernelControls(restrictedMode_, kernel_.registry)),
-      commands_(makeCommands(kernel_.environment, kernelControls_)),
+      commands_(makeCommands(
+          kernel_, [this] { return restrictedMode_.clock().now(); }, kernelControls_)),
       handler_({.registry = kernel_.registry,
                 .commands = commands_,
                 .logLevel = kernel_.logLevel,
@@ -83,6 +93,7 @@ Simulator::Simulator(const Settings& settings, const Paths& paths, std::unique_p
       deadline_(loop_->timer(CLOCK_REALTIME, [this] { restrictedMode_.catchUp(); })),
       terminate_(loop_->signal(SIGTERM, [this] { loop_->stop(); })),
       interrupt_(loop_->signal(SIGINT, [this] { loop_->stop(); })) {
+    kernel_.policies = std::move(policies);
     kernel_.logLevel = settings.logLevel;
     restrictedMode_.setQuiet(settings.quiet);
     restrictedMode_.setRearm([this] { armDeadline(); });

@@ -32,6 +32,8 @@ class Simulator {
         std::optional<RestrictedModeTimer::Seconds> clock;
         std::uint8_t logLevel = 40;
         bool quiet = false;
+        /// The file with the policies; empty for no policies.
+        std::string policies = {};
     };
 
     /// A simulator whose sockets listen, or none with a reason for people in `error`.
@@ -43,8 +45,8 @@ class Simulator {
     [[nodiscard]] bool run();
 
   private:
-    Simulator(const Settings& settings, const Paths& paths, std::unique_ptr<EventLoop> loop,
-              ListeningSocket service, ListeningSocket control);
+    Simulator(const Settings& settings, const Paths& paths, PolicyTable policies,
+              std::unique_ptr<EventLoop> loop, ListeningSocket service, ListeningSocket control);
     void armDeadline();
 
     std::unique_ptr<EventLoop> loop_;

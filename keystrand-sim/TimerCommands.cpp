@@ -97,17 +97,21 @@ ControlOutcome status(ControlContext& context, ControlArguments& arguments) {
     }
     ControlOutcome outcome;
     outcome.lines = timerStatus(context.restrictedMode);
-    for (std::string line : {concat("published ", context.publisher.publishedCount()),
-                             concat("events-queued ", context.events.queued()),
-                             concat("events-sent ", context.events.sent()),
-                             concat("events-refused ", context.events.refused()),
-                             concat("requests ", context.requests.count()),
-                             concat("acks ", context.requests.acknowledgements()),
-                             concat("connections ", context.server.connectionCount()),
-                             concat("properties ", context.kernel.registry.count()),
-                             concat("environment-variables ", context.kernel.environment.count()),
-                             concat("log-level ", context.kernel.logLevel),
-                             concat("faults ", context.faults.pending())}) {
+    for (std::string line :
+         {concat("published ", context.publisher.publishedCount()),
+          concat("events-queued ", context.events.queued()),
+          concat("events-sent ", context.events.sent()),
+          concat("events-refused ", context.events.refused()),
+          concat("requests ", context.requests.count()),
+          concat("acks ", context.requests.acknowledgements()),
+          concat("connections ", context.server.connectionCount()),
+          concat("properties ", context.kernel.registry.count()),
+          concat("environment-variables ", context.kernel.environment.count()),
+          concat("contexts ", context.kernel.contexts.all().size()),
+          concat("global-credentials ", context.kernel.globalCredentials.members().size()),
+          concat("policies ", context.kernel.policies.all().size()),
+          concat("log-level ", context.kernel.logLevel),
+          concat("faults ", context.faults.pending())}) {
         outcome.lines.push_back(std::move(line));
     }
     return outcome;

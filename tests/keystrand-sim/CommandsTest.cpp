@@ -28,13 +28,14 @@ class CommandsTest : public testing::Test {
         return run(26, Bytes().u32(code).bytes(input));
     }
 
-    EnvironmentVariables environment_;
-    Registry registry_;
+    KernelState kernel_;
+    Registry& registry_ = kernel_.registry;
     SilentPoster poster_;
     NotificationPublisher publisher_{registry_, poster_};
     RestrictedModeController restrictedMode_{{}, Clock(1000), registry_, publisher_};
     DispatchTable controls_ = makeKernelControls(restrictedMode_, registry_);
-    DispatchTable commands_ = makeCommands(environment_, controls_);
+    DispatchTable commands_ = makeCommands(
+        kernel_, [] { return CredentialSet::Seconds{1000}; }, controls_);
 };
 
 TEST(CommandFrameTest, HeaderAloneIsAFrameWithoutPayload) {
@@ -74,7 +75,7 @@ TEST(CommandFrameTest, ControlCodeIsOnlyInKernelControl) {
 }
 
 TEST_F(CommandsTest, UnknownCommands) {
-    for (const std::uint32_t code : {0U, 1U, 7U, 23U, 27U, 255U}) {
+    for (const std::uint32_t code : {0U, 7U, 8U, 10U, 12U, 14U, 17U, 23U, 27U, 255U}) {
         EXPECT_EQ(run(code, {1, 2, 3, 4}), -6006) << code;
     }
 }
@@ -95,12 +96,15 @@ TEST_P(CommandLengthTest, PayloadBelowOrAboveIsRefused) {
     EXPECT_EQ(run(code, Payload(min - 1)), -6007);
     EXPECT_EQ(run(code, Payload(max + 1)), -6007);
     EXPECT_NE(run(code, Payload(min)), -6007);
-    EXPECT_NE(run(code, Payload(max - 1)), code == 25 ? 0 : -6007);
+    EXPECT_EQ(run(code, Payload(max - 1)) == -6007, min == max);
     EXPECT_NE(run(code, Payload(max)), -6007);
 }
 
 INSTANTIATE_TEST_SUITE_P(All, CommandLengthTest,
-                         testing::Values(std::tuple(24U, 4U, 68U), std::tuple(25U, 4U, 4U),
+                         testing::Values(std::tuple(2U, 16U, 16U), std::tuple(13U, 24U, 24U),
+                                         std::tuple(18U, 16U, 16U), std::tuple(19U, 16U, 16U),
+                                         std::tuple(21U, 20U, 20U), std::tuple(22U, 20U, 84U),
+                                         std::tuple(24U, 4U, 68U), std::tuple(25U, 4U, 4U),
                                          std::tuple(26U, 4U, 260U)));
 
 /// Control code and the one length of input that it takes.
@@ -128,7 +132,7 @@ TEST_F(CommandsTest, SetVariableIsGotBack) {
 }
 
 TEST_F(CommandsTest, OneVariableTooMany) {
-    for (std::uint32_t id = 0; id < EnvironmentVariables::kMaxCount; ++id) {
+    for (std::uint32_t id = 0; id < NumberedValues::kMaxCount; ++id) {
         ASSERT_EQ(run(24, Bytes().u32(id).u8(1)), 0);
     }
     EXPECT_EQ(run(24, Bytes().u32(1000).u8(1)), -6009);

@@ -135,6 +135,18 @@ TEST_F(LifecycleTest, RootThatCannotBeUsed) {
                   "/run/keystrand/service.sock: too long for a socket\n");
 }
 
+TEST_F(LifecycleTest, DoesNotStartWithAWrongPolicyFile) {
+    const std::string file = path("policies.conf");
+    const std::vector<std::string> words = commandLine({"--policies", file});
+    EXPECT_EQ(runToEnd(words, 1), "keystrand-sim: " + file + ": cannot be read, or is too large\n");
+    std::ofstream(file) << "# one\npolicy a = passwort\n";
+    EXPECT_EQ(runToEnd(words, 1), "keystrand-sim: " + file + ":2: unknown requirement passwort\n");
+    EXPECT_FALSE(std::filesystem::exists(path("run/keystrand")));
+    std::ofstream(file) << "policy a = passcode\n";
+    start({"--policies", file});
+    EXPECT_EQ(tell("policies").lines, std::vector<std::string>{"policy a = passcode"});
+}
+
 TEST_F(LifecycleTest, OptionsOutsideTheirRange) {
     const std::vector<std::pair<std::string, std::string>> bad = {{"--period", "0"},
                                                                   {"--period", "4294967296"},

@@ -102,7 +102,7 @@ TEST_F(OperationsTest, StructCallStatuses) {
     EXPECT_EQ(call(client, {}), reply(5, 2, -6005, 0));
     EXPECT_EQ(call(client, Bytes().text("DRCS").u8(24).u16(0)), reply(5, 2, -6005, 0));
     EXPECT_EQ(call(client, Bytes().text("DRCX").u32(24).u32(1)), reply(5, 2, -6005, 0));
-    EXPECT_EQ(call(client, frame(1, {})), reply(5, 2, -6006, 0));
+    EXPECT_EQ(call(client, frame(7, {})), reply(5, 2, -6006, 0));
     EXPECT_EQ(call(client, control(4, {})), reply(5, 2, -6006, 0));
     EXPECT_EQ(call(client, control(5, {})), reply(5, 2, -6007, 0));
 }

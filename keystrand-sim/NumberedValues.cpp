@@ -1,8 +1,8 @@
-#include "keystrand-sim/EnvironmentVariables.h"
+#include "keystrand-sim/NumberedValues.h"
 
 namespace sim {
 
-bool EnvironmentVariables::set(std::uint32_t id, std::span<const std::uint8_t> value) {
+bool NumberedValues::set(std::uint32_t id, std::span<const std::uint8_t> value) {
     if (value.size() > kMaxValueSize) {
         return false;
     }
@@ -17,7 +17,7 @@ bool EnvironmentVariables::set(std::uint32_t id, std::span<const std::uint8_t> v
     return true;
 }
 
-std::span<const std::uint8_t> EnvironmentVariables::get(std::uint32_t id) const {
+std::span<const std::uint8_t> NumberedValues::get(std::uint32_t id) const {
     const auto found = values_.find(id);
     if (found == values_.end()) {
         return {};

@@ -1,0 +1,244 @@
+// The real library against the program, over the kernel socket.
+
+#include "KSTLib/KSTLib.h"
+#include "KSTLib/Platform.h"
+#include "platform/linux/LinuxKernelChannel.h"
+#include "platform/linux/LinuxServiceRegistry.h"
+#include "tests/keystrand-sim/SimulatorProcess.h"
+#include "tests/support/RecordingLog.h"
+
+#include <algorithm>
+#include <fstream>
+
+namespace sim::test {
+
+namespace {
+
+using Words = std::vector<std::string>;
+
+/// The requirement as text: its type, its state where it is not 1, its children.
+std::string textOf(const KSTRequirement* requirement) {
+    if (requirement == nullptr) {
+        return "none";
+    }
+    std::string text = std::to_string(KSTRequirementGetType(requirement));
+    if (KSTRequirementGetState(requirement) != 1) {
+        text += "!";
+    }
+    std::string children;
+    KSTRequirementGetSubrequirements(requirement, [&](const KSTRequirement* child) {
+        children += (children.empty() ? "" : " ") + textOf(child);
+    });
+    return children.empty() ? text : text + "(" + children + ")";
+}
+
+struct CredentialDeletion {
+    void operator()(KSTCredential* credential) const { KSTCredentialDelete(credential); }
+};
+using OwnedCredential = std::unique_ptr<KSTCredential, CredentialDeletion>;
+
+OwnedCredential make(std::uint32_t type) {
+    KSTCredential* credential = nullptr;
+    EXPECT_EQ(KSTCredentialCreate(type, &credential), 0);
+    return OwnedCredential(credential);
+}
+
+OwnedCredential makePassphrase(const std::string& text, KSTPassphrasePurpose purpose) {
+    OwnedCredential credential = make(kKSTCredentialTypePassphraseEntered);
+    EXPECT_EQ(KSTCredentialSetProperty(credential.get(), 200, text.data(), text.size()), 0);
+    EXPECT_EQ(KSTCredentialSetProperty(credential.get(), 201, &purpose, sizeof purpose), 0);
+    return credential;
+}
+
+class ClientStoryTest : public SimulatorProcess {
+  protected:
+    void SetUp() override {
+        SimulatorProcess::SetUp();
+        const std::string file = path("policies.conf");
+        std::ofstream(file) << "policy open = any-of(passcode(age=60),\n"
+                               "                     all-of(biometry, passphrase(purpose=1)))\n"
+                               "policy pay = passphrase(once)\n";
+        start({"--clock", "1000000", "--policies", file});
+        registry_.emplace(servicePath(), log_);
+        channel_.emplace(servicePath(), *registry_, log_);
+        connect();
+    }
+
+    void TearDown() override { kst::removePlatform(); }
+
+    /// Lets the library connect anew; what it had open stays open.
+    void connect() { kst::installPlatform({log_, *registry_, *channel_}); }
+
+    static std::string ask(KSTContextRef context, const char* policy) {
+        std::string answer = "no answer";
+        const KSTStatus status = KSTContextVerifyPolicy(
+            context, policy, [&](bool satisfied, const KSTRequirement* requirement) {
+                answer = satisfied ? "satisfied" : textOf(requirement);
+            });
+        return status == 0 ? answer : std::to_string(status);
+    }
+
+    std::size_t contexts() { return tell("contexts").lines.size(); }
+
+    support::RecordingLog log_;
+    std::optional<platform::LinuxServiceRegistry> registry_;
+    std::optional<platform::LinuxKernelChannel> channel_;
+};
+
+TEST_F(ClientStoryTest, FromWhatIsMissingToSatisfied) {
+    KSTContextRef context = nullptr;
+    ASSERT_EQ(KSTContextCreate(&context), 0);
+    EXPECT_EQ(ask(context, "open"), "5(1 4(3 2))");
+
+    const OwnedCredential biometry = make(kKSTCredentialTypeBiometryMatched);
+    ASSERT_EQ(KSTContextAddCredential(context, biometry.get()), 0);
+    EXPECT_EQ(ask(context, "open"), "5(1 4(2))");
+    EXPECT_EQ(KSTContextContainsCredentialType(context, 3), 0);
+    EXPECT_EQ(KSTContextContainsCredentialType(context, 1), kKSTErrorNotContained);
+
+    const OwnedCredential passphrase = makePassphrase("open sesame", 1);
+    ASSERT_EQ(KSTContextAddCredential(context, passphrase.get()), 0);
+    EXPECT_EQ(ask(context, "open"), "satisfied");
+
+    ASSERT_EQ(KSTContextRemoveCredentialsByType(context, 3), 0);
+    EXPECT_EQ(ask(context, "open"), "5(1 4(3))");
+    ASSERT_EQ(KSTContextAddCredential(context, make(1).get()), 0);
+    EXPECT_EQ(ask(context, "open"), "satisfied");
+    tell("clock advance 61");
+    EXPECT_EQ(ask(context, "open"), "5(1! 4(3))");
+
+    EXPECT_EQ(contexts(), 1U);
+    EXPECT_EQ(KSTContextDelete(context, true), 0);
+    EXPECT_EQ(contexts(), 0U);
+}
+
+TEST_F(ClientStoryTest, PreflightUsesNothingUp) {
+    KSTContextRef context = nullptr;
+    ASSERT_EQ(KSTContextCreate(&context), 0);
+    ASSERT_EQ(KSTContextAddCredential(context, makePassphrase("a", 7).get()), 0);
+    for (int i = 0; i < 2; ++i) {
+        bool isSatisfied = false;
+        ASSERT_EQ(KSTContextVerifyPolicyWithPreflight(
+                      context, "pay", true,
+                      [&](bool satisfied, const KSTRequirement*) { isSatisfied = satisfied; }),
+                  0);
+        EXPECT_TRUE(isSatisfied);
+    }
+    EXPECT_EQ(KSTContextContainsPassphraseCredentialWithPurpose(context, 7, 0), 0);
+    EXPECT_EQ(ask(context, "pay"), "satisfied");
+    EXPECT_EQ(ask(context, "pay"), "2");
+    EXPECT_EQ(KSTContextDelete(context, true), 0);
+}
+
+TEST_F(ClientStoryTest, ContextIsHandedToAnotherConnection) {
+    KSTContextRef context = nullptr;
+    ASSERT_EQ(KSTContextCreate(&context), 0);
+    ByteVector form;
+    KSTContextGetExternalForm(context, [&](const void* data, std::size_t length) {
+        const auto* bytes = static_cast<const std::uint8_t*>(data);
+        form.assign(bytes, bytes + length);
+    });
+    ASSERT_EQ(form.size(), 16U);
+    const auto connections = [this] {
+        return std::stoi(SimulatorProcess::ask("status", "connections"));
+    };
+    const int before = connections();
+
+    connect();
+    KSTContextRef same = KSTContextCreateWithExternalForm(form.data(), form.size());
+    ASSERT_NE(same, nullptr);
+    EXPECT_EQ(connections(), before + 1);
+    EXPECT_EQ(contexts(), 1U);
+    ASSERT_EQ(KSTContextAddCredential(same, make(1).get()), 0);
+    EXPECT_EQ(ask(context, "open"), "satisfied");
+
+    EXPECT_EQ(KSTContextDelete(same, true), 0);
+    EXPECT_EQ(ask(context, "open"), "-6010");
+    EXPECT_EQ(KSTContextCreateWithExternalForm(form.data(), form.size()), nullptr);
+    EXPECT_EQ(KSTContextDelete(context, true), -6010);
+    EXPECT_EQ(KSTContextDelete(context, false), 0);
+}
+
+TEST_F(ClientStoryTest, GlobalCredentials) {
+    ASSERT_EQ(KSTGlobalContextAddCredential(make(1).get()), 0);
+    EXPECT_EQ(contexts(), 0U);
+    std::string answer;
+    KSTGlobalContextVerifyPolicy(
+        "open", false, nullptr, 0,
+        [&](KSTStatus status, bool satisfied, const KSTRequirement* requirement) {
+            answer =
+                std::to_string(status) + (satisfied ? " satisfied " : " ") + textOf(requirement);
+        });
+    EXPECT_EQ(answer, "0 satisfied none");
+    KSTContextRef context = nullptr;
+    ASSERT_EQ(KSTContextCreate(&context), 0);
+    EXPECT_EQ(ask(context, "open"), "5(1 4(3 2))");
+    ASSERT_EQ(KSTGlobalContextRemoveCredentialsByType(1), 0);
+    EXPECT_EQ(tell("credentials").lines, Words());
+    EXPECT_EQ(KSTContextDelete(context, true), 0);
+}
+
+TEST_F(ClientStoryTest, PassphrasesAreReplacedAndRemoved) {
+    KSTContextRef context = nullptr;
+    ASSERT_EQ(KSTContextCreate(&context), 0);
+    ASSERT_EQ(KSTContextAddCredential(context, makePassphrase("old", 1).get()), 0);
+    const OwnedCredential renewed = makePassphrase("new", 1);
+    ASSERT_EQ(KSTContextReplacePassphraseCredentialsWithScope(context, renewed.get(), 1), 0);
+    ASSERT_EQ(KSTContextRemoveCredentialsByValue(context, makePassphrase("old", 1).get()), 0);
+    EXPECT_EQ(KSTContextContainsPassphraseCredentialWithPurpose(context, 1, 0), 0);
+    ASSERT_EQ(KSTContextRemoveCredentialsByValue(context, renewed.get()), 0);
+    EXPECT_EQ(KSTContextContainsPassphraseCredentialWithPurpose(context, 1, 0),
+              kKSTErrorNotContained);
+    ASSERT_EQ(KSTContextAddCredential(context, renewed.get()), 0);
+    ASSERT_EQ(KSTContextRemovePassphraseCredentialsByPurposeAndScope(context, 1, 1), 0);
+    EXPECT_EQ(KSTContextContainsCredentialType(context, 2), kKSTErrorNotContained);
+    EXPECT_EQ(KSTContextDelete(context, true), 0);
+}
+
+TEST_F(ClientStoryTest, ConstraintsAndAccessLists) {
+    KSTContextRef context = nullptr;
+    ASSERT_EQ(KSTContextCreate(&context), 0);
+    const auto verify = [context](const std::string& constraint) {
+        std::string answer;
+        KSTContextVerifyAclConstraint(
+            context, constraint.data(), constraint.size(), false, nullptr, 0, 0,
+            [&](KSTStatus status, bool satisfied, const KSTRequirement* requirement) {
+                answer = std::to_string(status) + (satisfied ? " satisfied" : "") +
+                         (requirement == nullptr ? "" : " " + textOf(requirement));
+            });
+        return answer;
+    };
+    EXPECT_EQ(verify("policy pay"), "0 2");
+    EXPECT_EQ(verify("2-of(marker-4, marker-5, never)"), "0 7(14 15 16)");
+    ASSERT_EQ(KSTContextAddCredential(context, make(4).get()), 0);
+    EXPECT_EQ(verify("marker-4"), "0 satisfied");
+    EXPECT_EQ(verify("policy no-such-policy"), "-6013");
+    EXPECT_EQ(verify("open sesame"), "-6014");
+    const std::string acl = "allow sign = policy pay";
+    ByteVector characteristics;
+    EXPECT_EQ(KSTParseAclAndCopyConstraintCharacteristics(
+                  acl.data(), acl.size(),
+                  [&](KSTStatus, const void* data, std::size_t length) {
+                      const auto* bytes = static_cast<const std::uint8_t*>(data);
+                      characteristics.assign(bytes, bytes + length);
+                  }),
+              0);
+    EXPECT_EQ(characteristics, Bytes().u32(1).u32(4).u32(4).get());
+    EXPECT_EQ(KSTContextDelete(context, true), 0);
+}
+
+TEST_F(ClientStoryTest, FaultReachesTheCaller) {
+    KSTContextRef context = nullptr;
+    tell("fault command=1 reply=16");
+    EXPECT_EQ(KSTContextCreate(&context), kKSTErrorUnexpected);
+    ASSERT_EQ(KSTContextCreate(&context), 0);
+    tell("fault command=3 reply=3");
+    EXPECT_EQ(ask(context, "open"), std::to_string(kKSTErrorUnexpected));
+    tell("fault command=5 status=-42");
+    EXPECT_EQ(KSTContextAddCredential(context, make(4).get()), -42);
+    EXPECT_EQ(KSTContextDelete(context, true), 0);
+}
+
+} // namespace
+
+} // namespace sim::test
