@@ -1,0 +1,25 @@
+// What the installed library stands on without being told: this machine's log and kernel service.
+
+#include "KSTLib/Platform.h"
+#include "platform/linux/LinuxKernelChannel.h"
+#include "platform/linux/LinuxServiceRegistry.h"
+#include "platform/linux/LinuxSystemLog.h"
+#include "platform/linux/Paths.h"
+
+namespace {
+
+struct DefaultPlatform {
+    platform::Paths paths{"/"};
+    platform::LinuxSystemLog log{paths};
+    platform::LinuxServiceRegistry registry{paths.kernelSocket(), log};
+    platform::LinuxKernelChannel channel{paths.kernelSocket(), registry, log};
+};
+
+/// Runs when the library is loaded, before any function of it can be called. What it makes is never
+/// destroyed: a program may call the library from its own last destructor.
+[[gnu::constructor]] void installDefaultPlatform() {
+    auto* const made = new DefaultPlatform;
+    kst::installPlatform({made->log, made->registry, made->channel});
+}
+
+} // namespace
