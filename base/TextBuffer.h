@@ -3,15 +3,16 @@
 #include <cstddef>
 #include <cstdlib>
 #include <cstring>
-#include <memory>
 #include <new>
 #include <string_view>
+#include <sys/mman.h>
 #include <utility>
 
 namespace base {
 
-/// A text that grows to any length without being copied: a large block is grown by moving its
-/// pages, so that the text is never held twice, as it would be while a std::string grows.
+/// A text that grows to any length without being copied: a large one lies in pages of its own,
+/// which are moved when it grows, so that the text is never held twice, as it would be while a
+/// std::string grows. Nor does a large text leave a hole in the heap.
 class TextBuffer {
   public:
     TextBuffer() = default;
@@ -22,7 +23,7 @@ class TextBuffer {
     }
     TextBuffer(const TextBuffer&) = delete;
     TextBuffer& operator=(const TextBuffer&) = delete;
-    ~TextBuffer() = default;
+    ~TextBuffer() { release(); }
 
     void append(std::string_view text) {
         if (!text.empty()) {
@@ -51,12 +52,12 @@ class TextBuffer {
     void truncate(std::size_t size) { size_ = size; }
 
     [[nodiscard]] std::size_t size() const { return size_; }
-    [[nodiscard]] std::string_view view() const { return {data_.get(), size_}; }
+    [[nodiscard]] std::string_view view() const { return {data_, size_}; }
 
   private:
-    struct Release {
-        void operator()(char* data) const { std::free(data); }
-    };
+    /// The least capacity that is mapped. The allocator maps large blocks too, but from which size
+    /// on depends on what was freed before.
+    static constexpr std::size_t kLeastMapped = 256UL * 1024;
 
     void swap(TextBuffer& other) noexcept {
         std::swap(data_, other.data_);
@@ -64,12 +65,22 @@ class TextBuffer {
         std::swap(capacity_, other.capacity_);
     }
 
+    void release() {
+        if (isMapped()) {
+            ::munmap(data_, capacity_);
+        } else {
+            std::free(data_);
+        }
+    }
+
+    [[nodiscard]] bool isMapped() const { return capacity_ >= kLeastMapped; }
+
     /// Where `more` bytes can be written behind the text.
     char* extend(std::size_t more) {
         if (more > capacity_ - size_) {
             grow(size_ + more);
         }
-        return data_.get() + size_;
+        return data_ + size_;
     }
 
     void grow(std::size_t needed) {
@@ -77,16 +88,35 @@ class TextBuffer {
         if (capacity < needed) {
             capacity = needed;
         }
-        void* const grown = std::realloc(data_.get(), capacity);
-        if (grown == nullptr) {
-            throw std::bad_alloc();
-        }
-        static_cast<void>(data_.release());
-        data_.reset(static_cast<char*>(grown));
+        data_ = capacity < kLeastMapped ? reallocated(capacity) : mapped(capacity);
         capacity_ = capacity;
     }
 
-    std::unique_ptr<char, Release> data_;
+    [[nodiscard]] char* reallocated(std::size_t capacity) {
+        void* const block = std::realloc(data_, capacity);
+        if (block == nullptr) {
+            throw std::bad_alloc();
+        }
+        return static_cast<char*>(block);
+    }
+
+    [[nodiscard]] char* mapped(std::size_t capacity) {
+        void* const pages = isMapped() ? ::mremap(data_, capacity_, capacity, MREMAP_MAYMOVE)
+                                       : ::mmap(nullptr, capacity, PROT_READ | PROT_WRITE,
+                                                MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+        if (pages == MAP_FAILED) {
+            throw std::bad_alloc();
+        }
+        if (!isMapped()) {
+            if (size_ > 0) {
+                std::memcpy(pages, data_, size_);
+            }
+            std::free(data_);
+        }
+        return static_cast<char*>(pages);
+    }
+
+    char* data_ = nullptr;
     std::size_t size_ = 0;
     std::size_t capacity_ = 0;
 };

@@ -183,5 +183,5 @@ void measure(const bench::Options& options, const std::filesystem::path& directo
 int main(int argc, char** argv) {
     return bench::runBenchmark(argc, argv,
                                "The cost of a kernel control over that of its two packets.",
-                               kDefaultRounds, measure);
+                               {.rounds = kDefaultRounds}, measure);
 }

@@ -240,5 +240,5 @@ int main(int argc, char** argv) {
     return bench::runBenchmark(
         argc, argv,
         "The cost of a notification over that of its durable write and its acknowledgement.",
-        kDefaultRounds, measureAll);
+        {.rounds = kDefaultRounds}, measureAll);
 }

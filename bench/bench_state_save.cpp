@@ -74,5 +74,5 @@ void measure(const bench::Options& options, const std::filesystem::path& directo
 int main(int argc, char** argv) {
     return bench::runBenchmark(argc, argv,
                                "The cost of saving the state file over that of its write and sync.",
-                               kDefaultRounds, measure);
+                               {.rounds = kDefaultRounds}, measure);
 }

@@ -17,6 +17,7 @@ namespace bench {
 namespace {
 
 constexpr int kMaxRounds = 1000000;
+constexpr int kMaxEvents = 10000000;
 
 class PrivateDirectory {
   public:
@@ -61,16 +62,21 @@ void pinToOneCpu() {
 
 } // namespace
 
-int runBenchmark(int argc, char** argv, const std::string& description, int defaultRounds,
+int runBenchmark(int argc, char** argv, const std::string& description, const Options& defaults,
                  const Measure& measure) {
     std::signal(SIGPIPE, SIG_IGN);
     CLI::App app(description);
-    Options options{.rounds = defaultRounds};
+    Options options = defaults;
     app.add_option("--rounds", options.rounds, "Rounds of the interleaved measurement")
         ->check(CLI::Range(1, kMaxRounds))
         ->capture_default_str();
     app.add_option("--dir", options.directory, "Where the private directory is made")
         ->capture_default_str();
+    if (defaults.events > 0) {
+        app.add_option("--events", options.events, "How many events are stored")
+            ->check(CLI::Range(1, kMaxEvents))
+            ->capture_default_str();
+    }
     app.add_flag("!--no-pin", options.pinned, "Let the processes run on any CPU");
     CLI11_PARSE(app, argc, argv);
     try {

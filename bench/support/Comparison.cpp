@@ -61,11 +61,14 @@ Sample sample(int calls, const Work& work, const WaitingTime& waiting) {
     return {time, waiting.soFar() - before > kDisturbedShare * time * calls};
 }
 
-const char* verdict(const Comparison& comparison, double target) {
+const char* verdict(const Comparison& comparison, std::optional<double> target) {
     if (comparison.disturbed) {
-        return "disturbed";
+        return " disturbed";
     }
-    return comparison.ratioMedian <= target ? "met" : "missed";
+    if (!target) {
+        return "";
+    }
+    return comparison.ratioMedian <= *target ? " met" : " missed";
 }
 
 } // namespace
@@ -115,11 +118,17 @@ void printHead(const std::string& title) {
                 "min .. max", "target");
 }
 
-void printRow(const std::string& name, const Comparison& comparison, double target) {
-    std::printf("%-*s %8.2f us %8.2f us %7.3f %6.2f .. %5.2f %7.2f %s\n", kNameWidth, name.c_str(),
+void printRow(const std::string& name, const Comparison& comparison, std::optional<double> target) {
+    std::printf("%-*s %8.2f us %8.2f us %7.3f %6.2f .. %5.2f", kNameWidth, name.c_str(),
                 comparison.floorMedian / kNanosecondsPerMicrosecond,
                 comparison.productMedian / kNanosecondsPerMicrosecond, comparison.ratioMedian,
-                comparison.ratioMin, comparison.ratioMax, target, verdict(comparison, target));
+                comparison.ratioMin, comparison.ratioMax);
+    if (target) {
+        std::printf(" %7.2f", *target);
+    } else {
+        std::printf(" %7s", "-");
+    }
+    std::printf("%s\n", verdict(comparison, target));
     std::fflush(stdout);
 }
 

@@ -2,6 +2,7 @@
 
 #include <cstddef>
 #include <functional>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -43,8 +44,9 @@ struct Comparison {
 [[nodiscard]] double median(Samples values);
 
 /// The table's head, which shows how busy the machine was, and a row of it, which says whether the
-/// median of the ratios is at most `target`, or that others disturbed it.
+/// median of the ratios is at most `target`, if there is one, or that others disturbed it.
 void printHead(const std::string& title);
-void printRow(const std::string& name, const Comparison& comparison, double target);
+void printRow(const std::string& name, const Comparison& comparison,
+              std::optional<double> target = std::nullopt);
 
 } // namespace bench

@@ -52,6 +52,25 @@ TEST(TextBufferTest, KeepsWhatIsThereWhileItGrows) {
     EXPECT_EQ(buffer.view(), expected + large);
 }
 
+TEST(TextBufferTest, FromTheHeapIntoPagesOfItsOwn) {
+    constexpr std::size_t kLeastMapped = 256UL * 1024;
+    for (const std::size_t size : {kLeastMapped - 1, kLeastMapped, kLeastMapped + 1}) {
+        SCOPED_TRACE(size);
+        TextBuffer buffer;
+        std::string expected(size, 'x');
+        buffer.append(expected);
+        EXPECT_EQ(buffer.view(), expected);
+        for (const std::size_t more : {std::size_t{1}, size, 4 * size}) {
+            expected.append(more, 'y');
+            buffer.append(std::string(more, 'y'));
+            EXPECT_EQ(buffer.view(), expected);
+        }
+        buffer.truncate(1);
+        const TextBuffer moved(std::move(buffer));
+        EXPECT_EQ(moved.view(), "x");
+    }
+}
+
 TEST(TextBufferTest, ShortenedToEveryLength) {
     for (std::size_t size = 0; size <= 3; ++size) {
         TextBuffer buffer;
