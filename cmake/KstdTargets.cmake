@@ -12,8 +12,12 @@ target_compile_options(kstd_options INTERFACE
     # What is unique to the process cannot be hidden in the static library.
     $<$<COMPILE_LANG_AND_ID:CXX,GNU>:-fno-gnu-unique>)
 if(KSTD_SANITIZE)
+    # A target with the property KSTD_PLAIN is linked with the sanitizer, but its own code goes unchecked.
+    set(plain "$<BOOL:$<TARGET_PROPERTY:KSTD_PLAIN>>")
     target_compile_options(kstd_options INTERFACE
-        -fsanitize=${KSTD_SANITIZE} -fno-sanitize-recover=all -fno-omit-frame-pointer)
+        "$<$<NOT:${plain}>:-fsanitize=${KSTD_SANITIZE};-fno-sanitize-recover=all>"
+        -fno-omit-frame-pointer)
+    target_compile_definitions(kstd_options INTERFACE KSTD_SANITIZED)
     target_link_options(kstd_options INTERFACE -fsanitize=${KSTD_SANITIZE})
 endif()
 

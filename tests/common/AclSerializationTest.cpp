@@ -24,10 +24,8 @@ const Bytes kAclPayload = {1, 2,   3,   4,   5,   6,   7, 8, 9, 10, 11, 12, 13, 
 
 /// Lengths that a payload of some 40 bytes announces. A sanitizer keeps shadow memory for what is
 /// only announced, which takes it seconds.
-#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
+#ifdef KSTD_SANITIZED
 constexpr bool kIsSanitized = true;
-#elif defined(__has_feature)
-constexpr bool kIsSanitized = __has_feature(address_sanitizer) || __has_feature(thread_sanitizer);
 #else
 constexpr bool kIsSanitized = false;
 #endif

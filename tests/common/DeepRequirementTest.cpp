@@ -12,14 +12,8 @@ using support::Bytes;
 using support::ExactBuffer;
 using support::ScriptedGate;
 
-#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
+#ifdef KSTD_SANITIZED
 constexpr std::size_t kManyLevels = 100'000;
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
-constexpr std::size_t kManyLevels = 100'000;
-#else
-constexpr std::size_t kManyLevels = 1'000'000;
-#endif
 #else
 constexpr std::size_t kManyLevels = 1'000'000;
 #endif

@@ -8,12 +8,6 @@
 #include <sys/socket.h>
 #include <unistd.h>
 
-#if defined(__has_feature)
-#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
-#define KSTD_SANITIZED 1
-#endif
-#endif
-
 namespace system_tests {
 namespace {
 

@@ -1,0 +1,45 @@
+# How a test program of the tree is made.
+
+find_package(GTest REQUIRED)
+find_package(Threads REQUIRED)
+include(GoogleTest)
+
+# What every test may use: GoogleTest's main, the helpers in tests/support.
+add_library(kstd_test_base INTERFACE)
+target_link_libraries(kstd_test_base INTERFACE kstd_options GTest::gmock GTest::gtest_main)
+# What is tested is optimised; optimising the tests would cost most of the build's time.
+target_compile_options(kstd_test_base INTERFACE -O0 -g0)
+
+# kstd_test_code(TARGETS...): code that only tests. A sanitizer checks what it calls; to check the tests
+# themselves as well doubles the time that they take to build, so that can be switched off.
+function(kstd_test_code)
+    if(NOT KSTD_INSTRUMENT_TESTS)
+        set_target_properties(${ARGN} PROPERTIES KSTD_PLAIN ON)
+    endif()
+endfunction()
+
+# GoogleTest's headers, compiled once for all test programs.
+add_executable(kstd_test_headers "${CMAKE_SOURCE_DIR}/tests/support/GoogleTestHeaders.cpp")
+kstd_test_code(kstd_test_headers)
+target_link_libraries(kstd_test_headers PRIVATE kstd_test_base)
+target_precompile_headers(kstd_test_headers PRIVATE
+    "$<$<COMPILE_LANGUAGE:CXX>:<gmock/gmock.h$<ANGLE-R>>"
+    "$<$<COMPILE_LANGUAGE:CXX>:<gtest/gtest.h$<ANGLE-R>>")
+
+# kstd_test(NAME SOURCES... [LINK targets...] [LABELS label] [TIMEOUT seconds]): a test program; each of
+# its tests is a test of CTest, in a process of its own.
+function(kstd_test name)
+    cmake_parse_arguments(ARG "" "LABELS;TIMEOUT" "SOURCES;LINK" ${ARGN})
+    if(NOT ARG_TIMEOUT)
+        set(ARG_TIMEOUT 120)
+    endif()
+    add_executable(${name} ${ARG_SOURCES})
+    kstd_test_code(${name})
+    target_link_libraries(${name} PRIVATE kstd_test_base ${ARG_LINK})
+    target_precompile_headers(${name} REUSE_FROM kstd_test_headers)
+    set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY "${CMAKE_BINARY_DIR}/tests")
+    gtest_discover_tests(${name}
+        DISCOVERY_MODE PRE_TEST
+        NO_PRETTY_VALUES
+        PROPERTIES TIMEOUT ${ARG_TIMEOUT} LABELS "${ARG_LABELS}")
+endfunction()
