@@ -1,4 +1,5 @@
-// The daemon killed at every system call between a notification's arrival and its acknowledgement.
+// The daemon killed at every system call between a notification's arrival and its acknowledgement, or
+// at every KSTD_KILL_STEP-th stop of those.
 
 #include "tests/support/SystemCallStepper.h"
 #include "tests/system/SystemFixture.h"
@@ -79,7 +80,7 @@ class KilledSaveTest : public SystemFixture {
 TEST_F(KilledSaveTest, StateFileOverAnOlderOneIsOldOrNewAtEveryStage) {
     startKernel();
     int rounds = 0;
-    for (Ended ended = Ended::killed; ended == Ended::killed; ++rounds) {
+    for (Ended ended = Ended::killed; ended == Ended::killed; rounds += KSTD_KILL_STEP) {
         removeState();
         putFile(kStateFile, stateOf(1));
         ended = killAt(rounds);
@@ -95,7 +96,7 @@ TEST_F(KilledSaveTest, StateFileOverAnOlderOneIsOldOrNewAtEveryStage) {
 TEST_F(KilledSaveTest, NewStateFileIsMissingEmptyOrWholeAtEveryStage) {
     startKernel();
     int rounds = 0;
-    for (Ended ended = Ended::killed; ended == Ended::killed; ++rounds) {
+    for (Ended ended = Ended::killed; ended == Ended::killed; rounds += KSTD_KILL_STEP) {
         removeState();
         ended = killAt(rounds);
         const auto saved = file(kStateFile);
