@@ -1,5 +1,5 @@
-// The daemon killed at every system call between a notification's arrival and its acknowledgement, or
-// at every KSTD_KILL_STEP-th stop of those.
+// The daemon killed at every system call between a notification's arrival and its acknowledgement,
+// or at every KSTD_KILL_STEP-th stop of those.
 
 #include "tests/support/SystemCallStepper.h"
 #include "tests/system/SystemFixture.h"
