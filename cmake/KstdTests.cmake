@@ -38,7 +38,13 @@ function(kstd_test name)
     target_link_libraries(${name} PRIVATE kstd_test_base ${ARG_LINK})
     target_precompile_headers(${name} REUSE_FROM kstd_test_headers)
     set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY "${CMAKE_BINARY_DIR}/tests")
+    # Two programs may hold the same tests; CTest tells tests apart by their names alone.
+    set(prefix "")
+    if(ARG_LABELS)
+        set(prefix "${ARG_LABELS}.")
+    endif()
     gtest_discover_tests(${name}
+        TEST_PREFIX "${prefix}"
         DISCOVERY_MODE PRE_TEST
         NO_PRETTY_VALUES
         PROPERTIES TIMEOUT ${ARG_TIMEOUT} LABELS "${ARG_LABELS}")
