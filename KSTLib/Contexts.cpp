@@ -125,12 +125,13 @@ KSTStatus deleteContext(KSTContextRef context, bool destroy) {
 
 KSTStatus getExternalForm(KSTContextRef context, const KSTDataBlock& processExternalForm) {
     KSTStatus err = kst::requireArguments(kst::libraryContext(), {{context, "context"}});
-    if (err == kKSTErrorSuccess && processExternalForm.invoke == nullptr) {
-        err = kst::fail(kst::libraryContext(), "processExternalForm", 0, kKSTErrorBadParameter);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = sendHandle(kKSTCommandContextGetExternalForm, context);
+    if (processExternalForm.invoke == nullptr) {
+        return kst::fail(kst::libraryContext(), "processExternalForm", 0, kKSTErrorBadParameter);
     }
+    err = sendHandle(kKSTCommandContextGetExternalForm, context);
     if (err == kKSTErrorSuccess) {
         processExternalForm.invoke(processExternalForm.captured, context->handle.bytes,
                                    kKSTHandleSize);

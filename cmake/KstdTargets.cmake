@@ -11,6 +11,9 @@ target_compile_options(kstd_options INTERFACE
     $<$<COMPILE_LANGUAGE:CXX>:-Wold-style-cast -Woverloaded-virtual -Wnon-virtual-dtor>
     # What is unique to the process cannot be hidden in the static library.
     $<$<COMPILE_LANG_AND_ID:CXX,GNU>:-fno-gnu-unique>)
+# A function that is bound at its first call has all registers saved on the stack, also those through
+# which a credential has just been copied.
+target_link_options(kstd_options INTERFACE LINKER:-z,relro,-z,now)
 if(KSTD_SANITIZE)
     # A target with the property KSTD_PLAIN is linked with the sanitizer, but its own code goes unchecked.
     set(plain "$<BOOL:$<TARGET_PROPERTY:KSTD_PLAIN>>")

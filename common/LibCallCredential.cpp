@@ -97,6 +97,7 @@ KSTStatus setProperty(KSTCredential* credential, std::uint32_t propertyId, const
     if (err != kKSTErrorSuccess) {
         return err;
     }
+    // A null property was refused with the place. NOLINTNEXTLINE(clang-analyzer-core.*)
     if (!hasLength(*property, dataLength)) {
         return kst::fail(context, property->lengthCheck, 0, kKSTErrorBadParameter);
     }

@@ -48,6 +48,7 @@ KSTStatus getPropertyData(const KSTRequirement* requirement, std::uint32_t prope
     if (err != kKSTErrorSuccess) {
         return err;
     }
+    // What is not found has a status. NOLINTNEXTLINE(clang-analyzer-core.*)
     if (!property->fitsIn(requirement)) {
         return kst::fail(context, "offset + length <= requirement->dataLength", 0,
                          kKSTErrorBadParameter);

@@ -72,6 +72,7 @@ KSTStatus GetSerializedParametersLength(const KSTParameter* parameters,
             return kst::failCall(context, err);
         }
         length += kParameterHeaderSize;
+        // A null parameter is not valid. NOLINTNEXTLINE(clang-analyzer-core.*)
         if (length + parameter->parameterDataLength <= length) {
             return kst::fail(context,
                              "parametersLength + param->parameterDataLength > parametersLength", 0,

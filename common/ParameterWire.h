@@ -43,7 +43,8 @@ class ReceivedParameters {
                  std::uint32_t& parametersCount) noexcept;
 
   private:
-    [[nodiscard]] KSTStatus readElement(base::ByteReader& reader, KSTParameter& element) noexcept;
+    [[nodiscard]] static KSTStatus readElement(base::ByteReader& reader,
+                                               KSTParameter& element) noexcept;
 
     std::uint32_t maxGlobalCredentialAge_ = 0;
     KSTParameter* parameters_ = nullptr;

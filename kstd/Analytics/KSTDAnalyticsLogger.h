@@ -134,7 +134,7 @@ class KSTDAnalyticsLogger : public platform::HTTPSessionDelegate,
     template <typename Logger>
     [[nodiscard]] static std::shared_ptr<Logger> instanceOf(const platform::Host& host) {
         return std::static_pointer_cast<Logger>(LoggerInstances::instance(typeid(Logger), [&host] {
-            const auto logger = std::make_shared<Logger>(Creation(), host);
+            auto logger = std::make_shared<Logger>(Creation(), host);
             logger->init(*Logger::databasePath());
             return logger;
         }));

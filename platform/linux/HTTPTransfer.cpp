@@ -3,6 +3,8 @@
 #include "base/Concat.h"
 #include "platform/shared/HTTPRequestCheck.h"
 
+#include <algorithm>
+#include <iterator>
 #include <mutex>
 #include <sys/socket.h>
 #include <utility>
@@ -193,17 +195,12 @@ bool HTTPTransfer::addHeader(const std::string& line) {
 }
 
 bool HTTPTransfer::makeHeaders() {
-    for (const char* unwanted : kUnwantedHeaders) {
-        if (!addHeader(unwanted)) {
-            return false;
-        }
-    }
-    for (const auto& [name, value] : settings_.headers) {
-        if (!addHeader(headerLine(name, value))) {
-            return false;
-        }
-    }
-    return true;
+    return std::all_of(std::begin(kUnwantedHeaders), std::end(kUnwantedHeaders),
+                       [this](const char* unwanted) { return addHeader(unwanted); }) &&
+           std::all_of(settings_.headers.begin(), settings_.headers.end(),
+                       [this](const auto& header) {
+                           return addHeader(headerLine(header.first, header.second));
+                       });
 }
 
 HTTPReply HTTPTransfer::replyFor(CURLcode code) {

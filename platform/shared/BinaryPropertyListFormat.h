@@ -39,6 +39,6 @@ inline constexpr std::uint8_t kCountFollows = 0xf;
 
 inline constexpr std::size_t kMagicSize = 8;
 inline constexpr std::size_t kUnusedTrailerSize = 6;
-inline constexpr std::size_t kTrailerSize = kUnusedTrailerSize + 2 + 3 * 8;
+inline constexpr std::size_t kTrailerSize = kUnusedTrailerSize + 2 + 3 * sizeof(std::uint64_t);
 
 } // namespace platform::binary_property_list

@@ -147,6 +147,7 @@ void KSTDSQLite::update(std::string_view table, std::string_view set, Where wher
     stepThrough(*this, text, bindings);
 }
 
+// The values are moved out of their map. NOLINTNEXTLINE(performance-unnecessary-value-param)
 std::int64_t KSTDSQLite::insertOrReplaceInto(std::string_view table, platform::ValueMap values) {
     if (const auto statement = statementForSQL(insertText(table, values))) {
         const StatementUse use(*statement);
