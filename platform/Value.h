@@ -11,8 +11,6 @@
 #include <map>
 #include <string>
 #include <string_view>
-#include <type_traits>
-#include <utility>
 #include <variant>
 #include <vector>
 
@@ -44,21 +42,6 @@ inline constexpr bool isKind = false;
 template <typename Kind, typename... Kinds>
 inline constexpr bool isKind<Kind, std::variant<Kinds...>> = (std::same_as<Kind, Kinds> || ...);
 
-struct Namer {
-    std::string_view operator()(const Null& /*null*/) const { return "null"; }
-    std::string_view operator()(bool /*value*/) const { return "boolean"; }
-    std::string_view operator()(std::integral auto /*value*/) const { return "integer"; }
-    std::string_view operator()(std::floating_point auto /*value*/) const { return "real"; }
-    std::string_view operator()(const std::string& /*value*/) const { return "text"; }
-    std::string_view operator()(const Bytes& /*value*/) const { return "bytes"; }
-    std::string_view operator()(const Timestamp& /*value*/) const { return "date"; }
-    std::string_view operator()(const UniqueIdentifier& /*value*/) const { return "identifier"; }
-    std::string_view operator()(const Link& /*value*/) const { return "link"; }
-    std::string_view operator()(const Error& /*value*/) const { return "error"; }
-    std::string_view operator()(const ValueList& /*value*/) const { return "list"; }
-    std::string_view operator()(const ValueMap& /*value*/) const { return "map"; }
-};
-
 } // namespace value_kinds
 
 /// A value that knows its kind, numbers included: an unsigned 8-bit 1 is neither `true` nor a
@@ -70,15 +53,20 @@ class Value {
                                  double, std::string, Bytes, Timestamp, UniqueIdentifier, Link,
                                  Error, ValueList, ValueMap>;
 
-    Value() = default;
+    // Written out in Value.cpp, so that not every source that has a value compiles them.
+    Value();
+    Value(const Value& other);
+    Value(Value&& other) noexcept;
+    Value& operator=(const Value& other);
+    Value& operator=(Value&& other) noexcept;
+    ~Value();
 
     /// Any of the kinds by its own type, with no conversion.
     // NOLINTBEGIN(google-explicit-constructor): maps of values are written as they read.
     template <typename Kind>
-    requires value_kinds::isKind<Kind, Content> Value(Kind content)
-        : content_(std::in_place_type<Kind>, std::move(content)) {}
-    Value(const char* text) : content_(std::in_place_type<std::string>, text) {}
-    Value(std::string_view text) : content_(std::in_place_type<std::string>, text) {}
+    requires value_kinds::isKind<Kind, Content> Value(Kind content);
+    Value(const char* text);
+    Value(std::string_view text);
     // NOLINTEND(google-explicit-constructor)
 
     /// The content when it is of that kind, else null.
@@ -94,7 +82,7 @@ class Value {
 
     [[nodiscard]] const Content& content() const { return content_; }
 
-    friend bool operator==(const Value&, const Value&) = default;
+    friend bool operator==(const Value& left, const Value& right);
 
   private:
     Content content_;
@@ -102,8 +90,6 @@ class Value {
 
 /// The name of the value's kind, for messages: "null", "boolean", "integer", "real", "text",
 /// "bytes", "date", "identifier", "link", "error", "list" or "map".
-[[nodiscard]] inline std::string_view kindName(const Value& value) {
-    return std::visit(value_kinds::Namer(), value.content());
-}
+[[nodiscard]] std::string_view kindName(const Value& value);
 
 } // namespace platform

@@ -40,21 +40,8 @@ class ValueBuilder final : public ValueSink {
         std::string key;
     };
 
-    void closeInnermost() {
-        Open innermost = std::move(open_.back());
-        open_.pop_back();
-        std::visit([this](auto& content) { add(std::move(content)); }, innermost.content);
-    }
-
-    void add(Value value) {
-        if (open_.empty()) {
-            value_ = std::move(value);
-        } else if (auto* map = std::get_if<ValueMap>(&open_.back().content)) {
-            map->insert_or_assign(std::move(open_.back().key), std::move(value));
-        } else {
-            std::get<ValueList>(open_.back().content).push_back(std::move(value));
-        }
-    }
+    void closeInnermost();
+    void add(Value value);
 
     std::vector<Open> open_;
     Value value_;

@@ -114,7 +114,7 @@ class Measurer {
 
     template <typename Kind>
     bool refuseKind(const Kind& kind) {
-        return refuse(base::concat("a value of the kind ", value_kinds::Namer()(kind)));
+        return refuse(base::concat("a value of the kind ", kindName(Value(kind))));
     }
 
     bool refuse(std::string_view what) {
