@@ -36,13 +36,20 @@ file(WRITE "${CMAKE_BINARY_DIR}/StandardHeaders.cpp" "")
 add_library(kstd_headers OBJECT "${CMAKE_BINARY_DIR}/StandardHeaders.cpp")
 target_link_libraries(kstd_headers PRIVATE kstd_options)
 target_precompile_headers(kstd_headers PRIVATE
-    <algorithm> <functional> <map> <memory> <optional> <string> <string_view> <variant> <vector>)
+    <algorithm> <array> <chrono> <functional> <map> <memory> <optional> <set> <span> <string> <string_view>
+    <utility> <variant> <vector>)
+# What the headers instantiate is instantiated once, too.
+target_compile_options(kstd_headers PRIVATE $<$<CXX_COMPILER_ID:Clang>:-fpch-instantiate-templates>)
 
-# kstd_unoptimised(SOURCES...): sources that are full of CLI11's templates, whose optimising costs
-# minutes under a sanitizer and gains nothing.
+# kstd_unoptimised(SOURCES...): sources that are full of CLI11's templates. Optimising them, and having
+# a sanitizer check them, costs minutes and gains nothing.
 function(kstd_unoptimised)
+    set(options -O0)
+    if(KSTD_SANITIZE)
+        list(APPEND options -fno-sanitize=all)
+    endif()
     set_source_files_properties(${ARGN} PROPERTIES
-        COMPILE_OPTIONS -O0 SKIP_PRECOMPILE_HEADERS ON)
+        COMPILE_OPTIONS "${options}" SKIP_PRECOMPILE_HEADERS ON)
 endfunction()
 
 # kstd_library(NAME SOURCES... [LINK targets...]): a static library of the tree.
