@@ -18,13 +18,17 @@ function(kstd_test_code)
     endif()
 endfunction()
 
-# GoogleTest's headers, compiled once for all test programs.
+# GoogleTest's headers and those of the standard library, compiled once for all test programs. For C++
+# alone: some test programs have sources in C.
 add_executable(kstd_test_headers "${CMAKE_SOURCE_DIR}/tests/support/GoogleTestHeaders.cpp")
 kstd_test_code(kstd_test_headers)
 target_link_libraries(kstd_test_headers PRIVATE kstd_test_base)
-target_precompile_headers(kstd_test_headers PRIVATE
-    "$<$<COMPILE_LANGUAGE:CXX>:<gmock/gmock.h$<ANGLE-R>>"
-    "$<$<COMPILE_LANGUAGE:CXX>:<gtest/gtest.h$<ANGLE-R>>")
+set(headers gmock/gmock.h gtest/gtest.h
+    algorithm array chrono functional map memory optional set span string string_view utility variant vector)
+list(TRANSFORM headers REPLACE "(.+)" "$<$<COMPILE_LANGUAGE:CXX>:<\\1$<ANGLE-R>>")
+target_precompile_headers(kstd_test_headers PRIVATE ${headers})
+target_compile_options(kstd_test_headers PRIVATE
+    $<$<COMPILE_LANG_AND_ID:CXX,Clang>:-fpch-instantiate-templates>)
 
 # kstd_test(NAME SOURCES... [LINK targets...] [LABELS label] [TIMEOUT seconds]): a test program; each of
 # its tests is a test of CTest, in a process of its own.

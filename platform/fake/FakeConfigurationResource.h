@@ -11,20 +11,13 @@ namespace platform {
 /// Configuration resources that a test puts, before anybody on another thread loads them.
 class FakeConfigurationResource final : public ConfigurationResource {
   public:
+    FakeConfigurationResource();
+    ~FakeConfigurationResource() override;
+
     [[nodiscard]] std::optional<ValueMap> load(std::string_view component,
-                                               std::string_view name) override {
-        const auto entry = resources_.find({std::string(component), std::string(name)});
-        return entry == resources_.end() ? std::nullopt : std::optional(entry->second);
-    }
-
-    void put(std::string_view component, std::string_view name, ValueMap content) {
-        resources_.insert_or_assign({std::string(component), std::string(name)},
-                                    std::move(content));
-    }
-
-    void remove(std::string_view component, std::string_view name) {
-        resources_.erase({std::string(component), std::string(name)});
-    }
+                                               std::string_view name) override;
+    void put(std::string_view component, std::string_view name, ValueMap content);
+    void remove(std::string_view component, std::string_view name);
 
   private:
     /// By component and name.

@@ -19,6 +19,8 @@ FakeHost::FakeHost(FakeMachine& machine)
       events(machine.clock, machine.alarms),
       machine_(machine) {}
 
+FakeHost::~FakeHost() = default;
+
 Host FakeHost::host() {
     return {.log = log,
             .registry = registry,

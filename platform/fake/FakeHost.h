@@ -24,6 +24,9 @@ namespace platform {
 class FakeHost {
   public:
     explicit FakeHost(FakeMachine& machine);
+    FakeHost(const FakeHost&) = delete;
+    FakeHost& operator=(const FakeHost&) = delete;
+    ~FakeHost();
 
     /// The host as a program gets it. It lasts as long as this.
     [[nodiscard]] Host host();

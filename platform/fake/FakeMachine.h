@@ -12,7 +12,10 @@ namespace platform {
 
 /// What outlives a process. It begins with an empty state directory, as an installed system does.
 struct FakeMachine {
-    FakeMachine() { disk.makeDirectory("/var/root"); }
+    FakeMachine();
+    FakeMachine(const FakeMachine&) = delete;
+    FakeMachine& operator=(const FakeMachine&) = delete;
+    ~FakeMachine();
 
     FakeClock clock;
     FakeAlarmStore alarms;

@@ -19,21 +19,14 @@ class RecordingLog : public platform::SystemLog {
         std::string function;
     };
 
+    RecordingLog();
+    ~RecordingLog() override;
+
     void write(platform::LogLevel level, std::string_view text,
-               const platform::CodePlace& place) override {
-        lines_.push_back({level, std::string(text), std::string(place.file), place.line,
-                          std::string(place.function)});
-    }
+               const platform::CodePlace& place) override;
 
     [[nodiscard]] const std::vector<Line>& lines() const { return lines_; }
-
-    [[nodiscard]] std::vector<std::string> texts() const {
-        std::vector<std::string> texts;
-        for (const Line& line : lines_) {
-            texts.push_back(line.text);
-        }
-        return texts;
-    }
+    [[nodiscard]] std::vector<std::string> texts() const;
 
     void clear() { lines_.clear(); }
 
