@@ -2,8 +2,10 @@
 #include "KSTLib/LibrarySender.h"
 #include "KSTLib/PolicyVerification.h"
 #include "common/Allocation.h"
+#include "common/BuiltPayload.h"
 #include "common/Command.h"
 #include "common/ProcessAclSerialization.h"
+#include "common/RequiredFunction.h"
 
 #include <cstring>
 #include <limits>
@@ -25,23 +27,22 @@ KSTStatus checkArguments(const void* acl, std::size_t aclLength, const KSTStatus
     if (acl == nullptr || aclLength == 0) {
         return kst::fail(context, "acl && aclLength", 0, kKSTErrorBadParameter);
     }
-    if (block.invoke == nullptr) {
-        return kst::fail(context, "processConstraintCharacteristics", 0, kKSTErrorBadParameter);
-    }
-    if (aclLength > std::numeric_limits<std::uint32_t>::max()) {
+    const KSTStatus err = kst::requireBlock(context, block, "processConstraintCharacteristics");
+    if (err == kKSTErrorSuccess && aclLength > std::numeric_limits<std::uint32_t>::max()) {
         return kst::fail(context, "aclLength <= UINT32_MAX", 0, kKSTErrorBadParameter);
     }
-    return kKSTErrorSuccess;
+    return err;
 }
 
-/// Sends the payload of `payloadSize` bytes and keeps a copy of the reply of exactly its size.
-KSTStatus sendAcl(const void* payload, std::size_t payloadSize, Characteristics& result) {
+/// Sends the payload and keeps a copy of the reply of exactly its size.
+KSTStatus sendAcl(const kst::BuiltPayload& payload, Characteristics& result) {
     const kst::AllocatedMemory outputBuffer(kMaxCharacteristicsSize);
     if (outputBuffer.bytes() == nullptr) {
         return kst::fail(kst::libraryContext(), "outputBuffer", 0, kKSTErrorOutOfMemory);
     }
-    const KSTStatus err = kst::librarySender().send(kKSTCommandParseAcl, payload, payloadSize,
-                                                    outputBuffer.bytes(), &result.outputSize);
+    const KSTStatus err =
+        kst::librarySender().send(kKSTCommandParseAcl, payload.bytes(), payload.size(),
+                                  outputBuffer.bytes(), &result.outputSize);
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -58,22 +59,18 @@ KSTStatus parseAcl(const void* acl, std::uint32_t aclLength, Characteristics& re
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    std::uint32_t size = 0;
-    err = GetSerializedProcessAclSize(nullptr, acl, aclLength, nullptr, 0, 0, nullptr, 0, &size);
-    if (err != kKSTErrorSuccess) {
-        return kst::failCall(kst::libraryContext(), err);
-    }
-    const kst::AllocatedMemory inputBuffer(size);
-    if (inputBuffer.bytes() == nullptr) {
-        return kst::fail(kst::libraryContext(), "inputBuffer", 0, kKSTErrorOutOfMemory);
-    }
-    err = SerializeProcessAcl(nullptr, acl, aclLength, nullptr, 0, 0, nullptr, 0,
-                              inputBuffer.bytes(), &size);
-    if (err != kKSTErrorSuccess) {
-        return kst::failCall(kst::libraryContext(), err);
-    }
-    // What was written, which is less than what was announced.
-    return sendAcl(inputBuffer.bytes(), size, result);
+    kst::BuiltPayload payload;
+    err = payload.build<std::uint32_t>(
+        kst::libraryContext(),
+        [&](std::uint32_t* size) {
+            return GetSerializedProcessAclSize(nullptr, acl, aclLength, nullptr, 0, 0, nullptr, 0,
+                                               size);
+        },
+        [&](void* buffer, std::uint32_t* size) {
+            return SerializeProcessAcl(nullptr, acl, aclLength, nullptr, 0, 0, nullptr, 0, buffer,
+                                       size);
+        });
+    return err != kKSTErrorSuccess ? err : sendAcl(payload, result);
 }
 
 } // namespace

@@ -8,6 +8,7 @@
 #include "common/Command.h"
 #include "common/ContextObject.h"
 #include "common/RequiredArguments.h"
+#include "common/RequiredFunction.h"
 
 namespace {
 
@@ -125,13 +126,12 @@ KSTStatus deleteContext(KSTContextRef context, bool destroy) {
 
 KSTStatus getExternalForm(KSTContextRef context, const KSTDataBlock& processExternalForm) {
     KSTStatus err = kst::requireArguments(kst::libraryContext(), {{context, "context"}});
-    if (err != kKSTErrorSuccess) {
-        return err;
+    if (err == kKSTErrorSuccess) {
+        err = kst::requireBlock(kst::libraryContext(), processExternalForm, "processExternalForm");
     }
-    if (processExternalForm.invoke == nullptr) {
-        return kst::fail(kst::libraryContext(), "processExternalForm", 0, kKSTErrorBadParameter);
+    if (err == kKSTErrorSuccess) {
+        err = sendHandle(kKSTCommandContextGetExternalForm, context);
     }
-    err = sendHandle(kKSTCommandContextGetExternalForm, context);
     if (err == kKSTErrorSuccess) {
         processExternalForm.invoke(processExternalForm.captured, context->handle.bytes,
                                    kKSTHandleSize);

@@ -5,6 +5,7 @@
 #include "KSTLib/TemporaryContext.h"
 #include "common/PolicyCommands.h"
 #include "common/RequiredArguments.h"
+#include "common/RequiredFunction.h"
 #include "common/RequirementSerialization.h"
 
 #include <limits>
@@ -13,12 +14,9 @@ namespace {
 
 constexpr std::uint32_t kAnyAge = std::numeric_limits<std::uint32_t>::max();
 
-/// A block has no address of its own: what it calls stands for it.
 template <typename Block>
-KSTStatus requireBlock(const Block& block) {
-    return block.invoke != nullptr
-               ? kKSTErrorSuccess
-               : kst::fail(kst::libraryContext(), "processRequirement", 0, kKSTErrorBadParameter);
+KSTStatus requireBlock(const Block& block, int line = __builtin_LINE()) {
+    return kst::requireBlock(kst::libraryContext(), block, "processRequirement", line);
 }
 
 /// Context, policy and block are checked in this order, then the question is sent.

@@ -1,39 +1,19 @@
 #include "KSTLib/RequirementObjects.h"
 
 #include "KSTLib/LibraryLogging.h"
+#include "KSTLib/ObjectArguments.h"
 #include "common/LibCallRequirement.h"
 #include "common/RequirementLayout.h"
 #include "common/RequirementProperties.h"
 
 namespace {
 
-KSTStatus getProperty(const KSTRequirement* requirement, std::uint32_t propertyId,
-                      const KSTDataBlock& processProperty) {
-    const kst::AssertionContext context = kst::libraryContext();
-    if (requirement == nullptr) {
-        return kst::fail(context, "requirement", 0, kKSTErrorBadParameter);
-    }
-    if (processProperty.invoke == nullptr) {
-        return kst::fail(context, "processProperty", 0, kKSTErrorBadParameter);
-    }
-    const void* data = nullptr;
-    std::size_t length = 0;
-    const KSTStatus err = KSTRequirementGetPropertyData(requirement, propertyId, &data, &length);
-    if (err != kKSTErrorSuccess) {
-        return kst::failCall(context, err);
-    }
-    processProperty.invoke(processProperty.captured, data, length);
-    return kKSTErrorSuccess;
-}
-
 KSTStatus getProperties(const KSTRequirement* requirement,
                         const KSTPropertyBlock& processProperty) {
-    const kst::AssertionContext context = kst::libraryContext();
-    if (requirement == nullptr) {
-        return kst::fail(context, "requirement", 0, kKSTErrorBadParameter);
-    }
-    if (processProperty.invoke == nullptr) {
-        return kst::fail(context, "processProperty", 0, kKSTErrorBadParameter);
+    const KSTStatus err = kst::requireObjectAndBlock({requirement, "requirement"}, processProperty,
+                                                     "processProperty");
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
     for (const kst::RequirementProperty& property : kst::requirementProperties()) {
         if (property.enumeratedLength > 0 && property.belongsTo(requirement) &&
@@ -47,13 +27,8 @@ KSTStatus getProperties(const KSTRequirement* requirement,
 
 void getSubrequirements(const KSTRequirement* requirement,
                         const KSTRequirementBlock& processSubrequirement) {
-    const kst::AssertionContext context = kst::libraryContext();
-    if (requirement == nullptr) {
-        static_cast<void>(kst::fail(context, "requirement", 0, kKSTErrorBadParameter));
-        return;
-    }
-    if (processSubrequirement.invoke == nullptr) {
-        static_cast<void>(kst::fail(context, "processSubrequirement", 0, kKSTErrorBadParameter));
+    if (kst::requireObjectAndBlock({requirement, "requirement"}, processSubrequirement,
+                                   "processSubrequirement") != kKSTErrorSuccess) {
         return;
     }
     const std::uint32_t count =
@@ -96,7 +71,9 @@ KSTStatus KSTRequirementGetPropertyData(const KSTRequirement* requirement, std::
 KSTStatus KSTRequirementGetProperty(const KSTRequirement* requirement, std::uint32_t propertyId,
                                     KSTDataBlock processProperty) noexcept {
     kst::logCalled(__func__);
-    return kst::logReturning(__func__, getProperty(requirement, propertyId, processProperty));
+    return kst::logReturning(__func__,
+                             kst::handOverProperty(requirement, "requirement", propertyId,
+                                                   KSTRequirementGetPropertyData, processProperty));
 }
 
 KSTStatus KSTRequirementGetProperties(const KSTRequirement* requirement,

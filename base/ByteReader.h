@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/LittleEndian.h"
+
 #include <concepts>
 #include <cstddef>
 #include <cstdint>
@@ -83,11 +85,8 @@ class ByteReader {
         if (sizeof(Integer) > left_) {
             return false;
         }
-        std::uint64_t result = 0;
-        for (std::size_t i = sizeof(Integer); i > 0; --i) {
-            result = (result << 8U) | cursor_[i - 1];
-        }
-        value = static_cast<Integer>(result);
+        std::memcpy(&value, cursor_, sizeof value);
+        value = littleEndian(value);
         advance(sizeof(Integer));
         return true;
     }

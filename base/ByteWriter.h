@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/LittleEndian.h"
+
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
@@ -50,11 +52,8 @@ class ByteWriter {
         if (sizeof(Integer) > left_) {
             return false;
         }
-        auto rest = static_cast<std::uint64_t>(value);
-        for (std::size_t i = 0; i < sizeof(Integer); ++i) {
-            cursor_[i] = static_cast<std::uint8_t>(rest & 0xffU);
-            rest >>= 8U;
-        }
+        const Integer stored = littleEndian(value);
+        std::memcpy(cursor_, &stored, sizeof stored);
         advance(sizeof(Integer));
         return true;
     }

@@ -13,6 +13,22 @@ namespace {
 
 AllocationGate* installedGate = nullptr;
 
+/// Up to this size the C library's malloc has memory at hand that its calloc does not look at.
+/// Above, calloc knows pages that are zero already and leaves them untouched.
+constexpr std::size_t kSizeAtHand = 1024;
+
+void* zeroedMemory(std::size_t size) {
+    if (size > kSizeAtHand) {
+        return std::calloc(1, size);
+    }
+    void* memory = std::malloc(size == 0 ? 1 : size);
+    if (memory != nullptr) {
+        // A compiler makes calloc of malloc and memset.
+        ::explicit_bzero(memory, size);
+    }
+    return memory;
+}
+
 } // namespace
 
 void* allocate(std::size_t size) noexcept {
@@ -22,7 +38,7 @@ void* allocate(std::size_t size) noexcept {
     if (installedGate != nullptr && !installedGate->admits(size)) {
         return nullptr;
     }
-    void* memory = std::calloc(1, size == 0 ? 1 : size);
+    void* memory = zeroedMemory(size);
     if (memory != nullptr) {
         gAllocatedBytes += static_cast<std::int64_t>(size);
     }

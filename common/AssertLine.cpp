@@ -7,13 +7,12 @@
 
 namespace kst {
 
-KSTStatus fail(const AssertionContext& context, const char* condition, std::int64_t value,
-               KSTStatus status, int line) noexcept {
+void writeAssertLine(platform::SystemLog* log, const char* tag, const char* path, int line,
+                     const char* condition, std::int64_t value) noexcept {
     // The message after the value is always empty.
-    writeLogLine(context.log, {context.path, line, {}},
-                 "%s: AssertMacros: %s (value: 0x%" PRIx64 "), %s file: %s:%d\n", context.tag,
-                 condition, static_cast<std::uint64_t>(value), "", context.path, line);
-    return status;
+    writeLogLine(log, {path, line, {}},
+                 "%s: AssertMacros: %s (value: 0x%" PRIx64 "), %s file: %s:%d\n", tag, condition,
+                 static_cast<std::uint64_t>(value), "", path, line);
 }
 
 void stop(const AssertionContext& context, const char* condition, int line) noexcept {

@@ -3,6 +3,7 @@
 #include "common/HandleWire.h"
 #include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
+#include "common/WriterRoom.h"
 
 namespace {
 
@@ -32,8 +33,7 @@ KSTStatus SerializeGetContextProperty(const KSTHandle* handle, KSTContextPropert
     }
     base::ByteWriter writer(outBuffer, *outSize);
     if (writer.left() < kSize || !kst::writeHandle(writer, handle) || !writer.writeU32(property)) {
-        return kst::fail(serializationContext(), "*outSize >= requiredSize", 0,
-                         kKSTErrorBadParameter);
+        return kst::failForRoom();
     }
     *outSize = writer.written();
     return kKSTErrorSuccess;

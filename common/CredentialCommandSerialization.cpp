@@ -4,6 +4,7 @@
 #include "common/HandleWire.h"
 #include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
+#include "common/WriterRoom.h"
 
 namespace {
 
@@ -58,12 +59,9 @@ KSTStatus SerializeAddCredential(const KSTHandle* handle, const KSTCredential* c
     }
     std::size_t requiredSize = 0;
     err = GetSerializedAddCredentialSize(handle, credential, scope, &requiredSize);
+    err = kst::checkRoom(err, requiredSize, *outSize);
     if (err != kKSTErrorSuccess) {
-        return kst::failCall(context, err);
-    }
-    constexpr const char* kRoomCheck = "*outSize >= requiredSize";
-    if (*outSize < requiredSize) {
-        return kst::fail(context, kRoomCheck, 0, kKSTErrorBadParameter);
+        return err;
     }
     base::ByteWriter front(outBuffer, kKSTHandleSize);
     static_cast<void>(kst::writeHandle(front, handle));
@@ -76,7 +74,7 @@ KSTStatus SerializeAddCredential(const KSTHandle* handle, const KSTCredential* c
     base::ByteWriter rest(behindHandle + credentialSize,
                           *outSize - kKSTHandleSize - credentialSize);
     if (!rest.writeU32(scope)) {
-        return kst::fail(context, kRoomCheck, 0, kKSTErrorBadParameter);
+        return kst::failForRoom();
     }
     *outSize = kKSTHandleSize + credentialSize + rest.written();
     return kKSTErrorSuccess;

@@ -1,6 +1,7 @@
 #include "common/CredentialCommands.h"
 
 #include "common/Allocation.h"
+#include "common/BuiltPayload.h"
 #include "common/Command.h"
 #include "common/ContextObject.h"
 #include "common/CredentialCommandSerialization.h"
@@ -39,20 +40,17 @@ KSTStatus sendCredential(const CommandSender& sender, const CredentialCommand& c
                          KSTContextRef context, const KSTCredential* credential,
                          KSTScope scope) noexcept {
     const KSTHandle* handle = handleOf(context);
-    std::size_t size = 0;
-    KSTStatus err = command.getSize(handle, credential, scope, &size);
+    BuiltPayload payload;
+    const KSTStatus err = payload.build<std::size_t>(
+        sender.context,
+        [&](std::size_t* size) { return command.getSize(handle, credential, scope, size); },
+        [&](void* buffer, std::size_t* size) {
+            return command.serialize(handle, credential, scope, buffer, size);
+        });
     if (err != kKSTErrorSuccess) {
-        return failCall(sender.context, err);
+        return err;
     }
-    const AllocatedMemory inputBuffer(size);
-    if (inputBuffer.bytes() == nullptr) {
-        return fail(sender.context, "inputBuffer", 0, kKSTErrorOutOfMemory);
-    }
-    err = command.serialize(handle, credential, scope, inputBuffer.bytes(), &size);
-    if (err != kKSTErrorSuccess) {
-        return failCall(sender.context, err);
-    }
-    return sender.send(command.code, inputBuffer.bytes(), size, nullptr, nullptr);
+    return sender.send(command.code, payload.bytes(), payload.size(), nullptr, nullptr);
 }
 
 KSTStatus sendNumbers(const CommandSender& sender, std::uint32_t code, KSTContextRef context,

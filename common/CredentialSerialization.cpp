@@ -21,6 +21,15 @@ KSTCredential* newCredential(std::uint32_t dataLength) {
     return credential;
 }
 
+/// Stores what `credential` takes on the wire in `size`.
+KSTStatus measure(const KSTCredential* credential, std::size_t& size) {
+    if (!kst::isCredentialType(credential->type)) {
+        return kst::fail(kst::serializationContext(), "0", 0, kKSTErrorBadParameter);
+    }
+    size = kst::credentialSize(credential->dataLength);
+    return kKSTErrorSuccess;
+}
+
 /// Reads and checks the header at the start of `buffer`.
 KSTStatus readHeader(const void* buffer, std::size_t size, KSTCredential& header) {
     const kst::AssertionContext context = kst::serializationContext();
@@ -42,17 +51,9 @@ KSTStatus readHeader(const void* buffer, std::size_t size, KSTCredential& header
 
 KSTStatus GetSerializedCredentialSize(const KSTCredential* credential,
                                       std::size_t* outSize) noexcept {
-    const kst::AssertionContext context = kst::serializationContext();
-    const KSTStatus err =
-        kst::requireArguments(context, {{credential, "credential"}, {outSize, "outSize"}});
-    if (err != kKSTErrorSuccess) {
-        return err;
-    }
-    if (kst::findCredentialType(credential->type) == nullptr) {
-        return kst::fail(context, "0", 0, kKSTErrorBadParameter);
-    }
-    *outSize = kst::credentialSize(credential->dataLength);
-    return kKSTErrorSuccess;
+    const KSTStatus err = kst::requireArguments(kst::serializationContext(),
+                                                {{credential, "credential"}, {outSize, "outSize"}});
+    return err == kKSTErrorSuccess ? measure(credential, *outSize) : err;
 }
 
 KSTStatus SerializeCredential(const KSTCredential* credential, void* outBuffer,
@@ -64,7 +65,7 @@ KSTStatus SerializeCredential(const KSTCredential* credential, void* outBuffer,
         return err;
     }
     std::size_t size = 0;
-    err = GetSerializedCredentialSize(credential, &size);
+    err = measure(credential, size);
     if (err != kKSTErrorSuccess) {
         return kst::failCall(context, err);
     }

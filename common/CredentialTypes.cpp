@@ -54,7 +54,7 @@ static_assert(sizeof(KSTCredentialDataKextDenyList) == 8);
 } // namespace
 
 const CredentialType* findCredentialType(std::uint32_t type) noexcept {
-    return type >= 1 && type <= kTypes.size() ? &kTypes[type - 1] : nullptr;
+    return isCredentialType(type) ? &kTypes[type - 1] : nullptr;
 }
 
 std::uint32_t passphraseLength(const KSTCredential* credential) noexcept {

@@ -15,7 +15,11 @@ struct CredentialType {
     const char* sizeCheck;
 };
 
-/// Null for a type outside 1 to 12.
+[[nodiscard]] constexpr bool isCredentialType(std::uint32_t type) noexcept {
+    return type >= 1 && type <= kKSTCredentialTypeMax;
+}
+
+/// Null for a type that does not exist.
 [[nodiscard]] const CredentialType* findCredentialType(std::uint32_t type) noexcept;
 
 /// The bytes of a credential whose data area has `dataLength` bytes.

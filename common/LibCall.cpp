@@ -5,6 +5,7 @@
 #include "common/CommandHeader.h"
 #include "common/LibCallReport.h"
 #include "common/NumberedPayload.h"
+#include "common/RequiredFunction.h"
 
 #include <cstring>
 #include <limits>
@@ -16,8 +17,9 @@ constexpr const char* kSourcePath = "common/LibCall";
 KSTStatus setEnvironmentVariable(KSTTransport transport, void* transportContext,
                                  std::uint32_t variable, const void* data, std::size_t dataLength) {
     const kst::AssertionContext context = kst::libCallContext(kSourcePath);
-    if (transport == nullptr) {
-        return kst::fail(context, "transport", 0, kKSTErrorBadParameter);
+    const KSTStatus missing = kst::requireFunction(context, transport, "transport");
+    if (missing != kKSTErrorSuccess) {
+        return missing;
     }
     static_assert(kKSTEnvironmentVariableMaxSize == 64, "the text below names it");
     if (!((data && dataLength > 0 && dataLength <= kKSTEnvironmentVariableMaxSize) ||

@@ -3,6 +3,7 @@
 #include "common/Command.h"
 #include "common/LibCallReport.h"
 #include "common/NumberedPayload.h"
+#include "common/RequiredFunction.h"
 #include "common/WipedBytes.h"
 
 namespace {
@@ -17,17 +18,18 @@ void handOver(const KSTDataBlock& block, const std::uint8_t* bytes, std::size_t 
 KSTStatus getEnvironmentVariable(KSTTransport transport, void* transportContext,
                                  std::uint32_t variable, const KSTDataBlock& processVariable) {
     const kst::AssertionContext context = kst::libCallContext(kSourcePath);
-    if (transport == nullptr) {
-        return kst::fail(context, "transport", 0, kKSTErrorBadParameter);
+    KSTStatus err = kst::requireFunction(context, transport, "transport");
+    if (err == kKSTErrorSuccess) {
+        err = kst::requireBlock(context, processVariable, "processVariable");
     }
-    if (processVariable.invoke == nullptr) {
-        return kst::fail(context, "processVariable", 0, kKSTErrorBadParameter);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
     const kst::NumberedPayload payload(variable, nullptr, 0, context);
     kst::WipedBytes<kKSTEnvironmentVariableMaxSize> outBuffer;
     std::size_t outSize = outBuffer.size();
-    const KSTStatus err = transport(transportContext, kKSTCommandGetEnvironmentVariable, 0,
-                                    payload.data(), payload.size(), outBuffer.data(), &outSize);
+    err = transport(transportContext, kKSTCommandGetEnvironmentVariable, 0, payload.data(),
+                    payload.size(), outBuffer.data(), &outSize);
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -41,8 +43,9 @@ KSTStatus getEnvironmentVariable(KSTTransport transport, void* transportContext,
 KSTStatus kernelControl(KSTTransport transport, void* transportContext, std::uint32_t code,
                         const void* data, std::size_t dataLength, const KSTDataBlock& resultBlock) {
     const kst::AssertionContext context = kst::libCallContext(kSourcePath);
-    if (transport == nullptr) {
-        return kst::fail(context, "transport", 0, kKSTErrorBadParameter);
+    KSTStatus err = kst::requireFunction(context, transport, "transport");
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
     static_assert(kKSTKernelControlMaxSize == 256, "the text below names it");
     if (!((data && dataLength > 0 && dataLength <= kKSTKernelControlMaxSize) ||
@@ -54,8 +57,8 @@ KSTStatus kernelControl(KSTTransport transport, void* transportContext, std::uin
     const kst::NumberedPayload payload(code, data, dataLength, context);
     kst::WipedBytes<kKSTKernelControlMaxSize> outBuffer;
     std::size_t outSize = outBuffer.size();
-    KSTStatus err = transport(transportContext, kKSTCommandKernelControl, 0, payload.data(),
-                              payload.size(), outBuffer.data(), &outSize);
+    err = transport(transportContext, kKSTCommandKernelControl, 0, payload.data(), payload.size(),
+                    outBuffer.data(), &outSize);
     if (outSize > outBuffer.size()) {
         outSize = 0;
         if (err == kKSTErrorSuccess) {

@@ -6,6 +6,7 @@
 #include "common/LibCallReport.h"
 #include "common/PolicyCommands.h"
 #include "common/RequiredArguments.h"
+#include "common/RequiredFunction.h"
 #include "common/WipedBytes.h"
 
 namespace {
@@ -15,9 +16,7 @@ kst::CommandSender senderOver(KSTTransport transport) {
 }
 
 KSTStatus checkTransport(const kst::CommandSender& sender) {
-    return sender.transport != nullptr
-               ? kKSTErrorSuccess
-               : kst::fail(sender.context, "transport", 0, kKSTErrorBadParameter);
+    return kst::requireFunction(sender.context, sender.transport, "transport");
 }
 
 KSTStatus create(const kst::CommandSender& sender, KSTContextRef* context, std::uint8_t* logLevel) {

@@ -2,6 +2,7 @@
 
 #include "common/LibCallReport.h"
 #include "common/RequiredArguments.h"
+#include "common/RequiredFunction.h"
 #include "common/RequirementProperties.h"
 #include "common/RequirementSerialization.h"
 
@@ -38,8 +39,9 @@ KSTStatus findProperty(const KSTRequirement* requirement, std::uint32_t property
 KSTStatus getPropertyData(const KSTRequirement* requirement, std::uint32_t propertyId,
                           const void** data, std::size_t* dataLength) {
     const kst::AssertionContext context = assertionContext();
+    // The pointer and the length are one output to the check.
     KSTStatus err = kst::requireArguments(
-        context, {{requirement, "requirement"}, {data, "data"}, {dataLength, "dataLength"}});
+        context, {{requirement, "requirement"}, {data, "data"}, {dataLength, "data"}});
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -59,14 +61,14 @@ KSTStatus getPropertyData(const KSTRequirement* requirement, std::uint32_t prope
 }
 
 KSTStatus deleteRequirement(KSTTransport transport, KSTRequirement* requirement) {
-    if (transport == nullptr) {
-        return kst::fail(assertionContext(), "transport", 0, kKSTErrorBadParameter);
+    KSTStatus err = kst::requireFunction(assertionContext(), transport, "transport");
+    if (err == kKSTErrorSuccess) {
+        err = kst::requireArguments(assertionContext(), {{requirement, "requirement"}});
     }
-    if (requirement == nullptr) {
-        return kst::fail(assertionContext(), "requirement", 0, kKSTErrorBadParameter);
+    if (err == kKSTErrorSuccess) {
+        DeallocRequirement(requirement);
     }
-    DeallocRequirement(requirement);
-    return kKSTErrorSuccess;
+    return err;
 }
 
 } // namespace

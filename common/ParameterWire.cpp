@@ -2,6 +2,7 @@
 
 #include "common/Allocation.h"
 #include "common/ParameterSerialization.h"
+#include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
 
 #include <utility>
@@ -26,6 +27,23 @@ KSTStatus checkParameterList(const KSTParameter* parameters,
         return fail(serializationContext(), "parametersCount <= 10", 0, kKSTErrorBadParameter);
     }
     return kKSTErrorSuccess;
+}
+
+KSTStatus measureParameters(const KSTParameter* parameters, std::uint32_t parametersCount,
+                            std::uint32_t& length) noexcept {
+    const KSTStatus err = GetSerializedParametersLength(parameters, parametersCount, &length);
+    return err == kKSTErrorSuccess
+               ? err
+               : fail(serializationContext(), "err == kKSTErrorSuccess", 0, err);
+}
+
+KSTStatus checkWriter(const KSTParameter* parameters, std::uint32_t parametersCount,
+                      const void* outBuffer, const void* outSize) noexcept {
+    const KSTStatus err = checkParameterList(parameters, parametersCount);
+    return err != kKSTErrorSuccess
+               ? err
+               : requireArguments(serializationContext(),
+                                  {{outBuffer, "outBuffer"}, {outSize, "outSize"}});
 }
 
 KSTStatus checkParameters(const KSTParameter* parameters, std::uint32_t parametersCount) noexcept {

@@ -16,6 +16,17 @@ namespace kst {
 [[nodiscard]] KSTStatus checkParameterList(const KSTParameter* parameters,
                                            std::uint32_t parametersCount) noexcept;
 
+/// Stores how long a caller's parameters are on the wire. As GetSerializedParametersLength, with a
+/// line more.
+[[nodiscard]] KSTStatus measureParameters(const KSTParameter* parameters,
+                                          std::uint32_t parametersCount,
+                                          std::uint32_t& length) noexcept;
+
+/// What a writer of a payload checks behind its own arguments: the parameters as a list, then the
+/// buffer and its size, which must not be null.
+[[nodiscard]] KSTStatus checkWriter(const KSTParameter* parameters, std::uint32_t parametersCount,
+                                    const void* outBuffer, const void* outSize) noexcept;
+
 /// Each of a caller's parameters must be valid and have as many bytes as it says. Otherwise
 /// kKSTErrorBadParameter.
 [[nodiscard]] KSTStatus checkParameters(const KSTParameter* parameters,

@@ -2,6 +2,7 @@
 
 #include "base/ByteReader.h"
 #include "common/Allocation.h"
+#include "common/BuiltPayload.h"
 #include "common/Command.h"
 #include "common/ContextObject.h"
 #include "common/RequirementSerialization.h"
@@ -36,22 +37,23 @@ KSTStatus readAnswer(const AssertionContext& context, const AllocatedMemory& req
     return kKSTErrorSuccess;
 }
 
-} // namespace
-
-KSTStatus sendQuestion(const CommandSender& sender, std::uint32_t code, const void* payload,
-                       std::size_t payloadSize, bool wanted, PolicyAnswer& answer) noexcept {
+/// Sends a payload and reads the reply.
+KSTStatus sendQuestion(const CommandSender& sender, std::uint32_t code, const BuiltPayload& payload,
+                       bool wanted, PolicyAnswer& answer) {
     const AllocatedMemory reqBuffer(kPolicyReplySize);
     if (reqBuffer.bytes() == nullptr) {
         return fail(sender.context, "reqBuffer", 0, kKSTErrorOutOfMemory);
     }
     std::size_t reqBufferSize = reqBuffer.size();
     const KSTStatus err =
-        sender.send(code, payload, payloadSize, reqBuffer.bytes(), &reqBufferSize);
+        sender.send(code, payload.bytes(), payload.size(), reqBuffer.bytes(), &reqBufferSize);
     if (err != kKSTErrorSuccess) {
         return err;
     }
     return readAnswer(sender.context, reqBuffer, reqBufferSize, wanted, answer);
 }
+
+} // namespace
 
 KSTStatus askAboutPolicy(const CommandSender& sender, const char* policyId,
                          const PolicyQuestion& question, bool wanted,
@@ -62,24 +64,22 @@ KSTStatus askAboutPolicy(const CommandSender& sender, const char* policyId,
     }
     const KSTHandle* handle = handleOf(question.context);
     const std::uint8_t preflight = question.preflight ? 1 : 0;
-    std::size_t size = 0;
-    KSTStatus err =
-        GetSerializedVerifyPolicySize(handle, policyId, preflight, question.maxGlobalCredentialAge,
-                                      question.parameters, question.parametersCount, &size);
-    if (err != kKSTErrorSuccess) {
-        return failCall(sender.context, err);
-    }
-    const AllocatedMemory inputBuffer(size);
-    if (inputBuffer.bytes() == nullptr) {
-        return fail(sender.context, "inputBuffer", 0, kKSTErrorOutOfMemory);
-    }
-    err = SerializeVerifyPolicy(handle, policyId, preflight, question.maxGlobalCredentialAge,
-                                question.parameters, question.parametersCount, inputBuffer.bytes(),
-                                &size);
-    if (err != kKSTErrorSuccess) {
-        return failCall(sender.context, err);
-    }
-    return sendQuestion(sender, kKSTCommandVerifyPolicy, inputBuffer.bytes(), size, wanted, answer);
+    BuiltPayload payload;
+    const KSTStatus err = payload.build<std::size_t>(
+        sender.context,
+        [&](std::size_t* size) {
+            return GetSerializedVerifyPolicySize(
+                handle, policyId, preflight, question.maxGlobalCredentialAge, question.parameters,
+                question.parametersCount, size);
+        },
+        [&](void* buffer, std::size_t* size) {
+            return SerializeVerifyPolicy(handle, policyId, preflight,
+                                         question.maxGlobalCredentialAge, question.parameters,
+                                         question.parametersCount, buffer, size);
+        });
+    return err != kKSTErrorSuccess
+               ? err
+               : sendQuestion(sender, kKSTCommandVerifyPolicy, payload, wanted, answer);
 }
 
 KSTStatus askAboutAclConstraint(const CommandSender& sender, const void* aclConstraint,
@@ -87,26 +87,22 @@ KSTStatus askAboutAclConstraint(const CommandSender& sender, const void* aclCons
                                 PolicyAnswer& answer) noexcept {
     const KSTHandle* handle = handleOf(question.context);
     const std::uint8_t preflight = question.preflight ? 1 : 0;
-    std::uint32_t size = 0;
-    KSTStatus err = GetSerializedVerifyAclConstraintSize(
-        handle, aclConstraint, length, preflight, question.maxGlobalCredentialAge,
-        question.parameters, question.parametersCount, &size);
-    if (err != kKSTErrorSuccess) {
-        return failCall(sender.context, err);
-    }
-    const AllocatedMemory inputBuffer(size);
-    if (inputBuffer.bytes() == nullptr) {
-        return fail(sender.context, "inputBuffer", 0, kKSTErrorOutOfMemory);
-    }
-    err = SerializeVerifyAclConstraint(handle, aclConstraint, length, preflight,
-                                       question.maxGlobalCredentialAge, question.parameters,
-                                       question.parametersCount, inputBuffer.bytes(), &size);
-    if (err != kKSTErrorSuccess) {
-        return failCall(sender.context, err);
-    }
-    // What was written, which is less than what was announced.
-    return sendQuestion(sender, kKSTCommandVerifyAclConstraint, inputBuffer.bytes(), size, wanted,
-                        answer);
+    BuiltPayload payload;
+    const KSTStatus err = payload.build<std::uint32_t>(
+        sender.context,
+        [&](std::uint32_t* size) {
+            return GetSerializedVerifyAclConstraintSize(
+                handle, aclConstraint, length, preflight, question.maxGlobalCredentialAge,
+                question.parameters, question.parametersCount, size);
+        },
+        [&](void* buffer, std::uint32_t* size) {
+            return SerializeVerifyAclConstraint(
+                handle, aclConstraint, length, preflight, question.maxGlobalCredentialAge,
+                question.parameters, question.parametersCount, buffer, size);
+        });
+    return err != kKSTErrorSuccess
+               ? err
+               : sendQuestion(sender, kKSTCommandVerifyAclConstraint, payload, wanted, answer);
 }
 
 } // namespace kst

@@ -30,18 +30,13 @@ struct PolicyAnswer {
     KSTRequirement* requirement = nullptr;
 };
 
-/// Sends a payload and reads the reply: 4 bytes, not 0 when satisfied, and behind them a
-/// requirement tree, which is looked at only when it is `wanted` and which an answer that is
-/// satisfied may lack.
+/// Asks about the policy `policyId`. Context and policy are there. The reply is 4 bytes, not 0 when
+/// satisfied, and behind them a requirement tree, which is looked at only when it is `wanted` and
+/// which an answer that is satisfied may lack.
 ///
-/// kKSTErrorOutOfMemory; kKSTErrorUnexpected: a reply below 4 bytes or above what was offered; or
-/// what the transport or DeserializeRequirement fails with. `answer` is set on success only.
-[[nodiscard]] KSTStatus sendQuestion(const CommandSender& sender, std::uint32_t code,
-                                     const void* payload, std::size_t payloadSize, bool wanted,
-                                     PolicyAnswer& answer) noexcept;
-
-/// Asks about the policy `policyId`. Context and policy are there. As `sendQuestion`, and
-/// kKSTErrorBadParameter for what the payload cannot carry.
+/// kKSTErrorBadParameter: the payload cannot carry that. kKSTErrorOutOfMemory.
+/// kKSTErrorUnexpected: a reply below 4 bytes or above what was offered. Or what the transport or
+/// DeserializeRequirement fails with. `answer` is set on success only.
 [[nodiscard]] KSTStatus askAboutPolicy(const CommandSender& sender, const char* policyId,
                                        const PolicyQuestion& question, bool wanted,
                                        PolicyAnswer& answer) noexcept;

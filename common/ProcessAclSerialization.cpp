@@ -1,17 +1,16 @@
 #include "common/ProcessAclSerialization.h"
 
 #include "common/HandleWire.h"
-#include "common/ParameterSerialization.h"
 #include "common/ParameterWire.h"
+#include "common/PayloadReader.h"
 #include "common/ReceivedBlob.h"
 #include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
+#include "common/WriterRoom.h"
 
 namespace {
 
 using kst::serializationContext;
-
-constexpr const char* kWordCheck = "(size - offset) >= sizeof(uint32_t)";
 
 KSTStatus checkAcl(const void* acl, std::uint32_t aclLength) {
     return acl != nullptr && aclLength != 0
@@ -25,10 +24,9 @@ KSTStatus measure(std::uint64_t aclLength, std::uint64_t operationLength,
                   const KSTParameter* parameters, std::uint32_t parametersCount,
                   std::uint64_t& size) {
     std::uint32_t parametersLength = 0;
-    const KSTStatus err =
-        GetSerializedParametersLength(parameters, parametersCount, &parametersLength);
+    const KSTStatus err = kst::measureParameters(parameters, parametersCount, parametersLength);
     if (err != kKSTErrorSuccess) {
-        return kst::fail(serializationContext(), "err == kKSTErrorSuccess", 0, err);
+        return err;
     }
     constexpr std::uint64_t kFixedSize =
         kKSTHandleSize + sizeof(std::uint64_t) + 3 * sizeof(std::uint32_t);
@@ -49,37 +47,6 @@ KSTStatus measure(std::uint64_t aclLength, std::uint64_t operationLength,
     }
     size = withParameters;
     return kKSTErrorSuccess;
-}
-
-struct ReceivedPayload {
-    kst::ReceivedBlob acl;
-    kst::ReceivedBlob operation;
-    kst::ReceivedParameters parameters;
-};
-
-KSTStatus readPayload(base::ByteReader& reader, KSTHandle& handle, ReceivedPayload& payload) {
-    const kst::AssertionContext context = serializationContext();
-    if (!kst::readHandle(reader, handle)) {
-        return kst::fail(context, "(size - offset) >= sizeof(KSTHandle)", 0, kKSTErrorBadParameter);
-    }
-    std::uint32_t aclLength = 0;
-    if (!reader.readU32(aclLength)) {
-        return kst::fail(context, kWordCheck, 0, kKSTErrorBadParameter);
-    }
-    KSTStatus err =
-        payload.acl.read(reader, aclLength, "tmpAcl", "(size - offset) >= tmpAclLength");
-    if (err != kKSTErrorSuccess) {
-        return err;
-    }
-    std::uint32_t operationLength = 0;
-    if (!reader.readU32(operationLength)) {
-        return kst::fail(context, kWordCheck, 0, kKSTErrorBadParameter);
-    }
-    err = payload.operation.read(reader, operationLength, "op", "(size - offset) >= opLen");
-    if (err != kKSTErrorSuccess) {
-        return err;
-    }
-    return payload.parameters.read(reader);
 }
 
 } // namespace
@@ -115,27 +82,20 @@ KSTStatus SerializeProcessAcl(const KSTHandle* handle, const void* acl, std::uin
     const kst::AssertionContext context = serializationContext();
     KSTStatus err = checkAcl(acl, aclLength);
     if (err == kKSTErrorSuccess) {
-        err = kst::checkParameterList(parameters, parametersCount);
-    }
-    if (err == kKSTErrorSuccess) {
-        err = kst::requireArguments(context, {{outBuffer, "outBuffer"}, {outSize, "outSize"}});
+        err = kst::checkWriter(parameters, parametersCount, outBuffer, outSize);
     }
     if (err != kKSTErrorSuccess) {
         return err;
     }
     std::uint64_t requiredSize = 0;
     err = measure(aclLength, operationLength, parameters, parametersCount, requiredSize);
-    if (err != kKSTErrorSuccess) {
-        return kst::failCall(context, err);
+    err = kst::checkRoom(err, requiredSize, *outSize);
+    if (err == kKSTErrorSuccess && operation == nullptr && operationLength != 0) {
+        err = kst::fail(context, "operation || !operationLength", 0, kKSTErrorBadParameter);
     }
-    constexpr const char* kRoomCheck = "*outSize >= requiredSize";
-    if (*outSize < requiredSize) {
-        return kst::fail(context, kRoomCheck, 0, kKSTErrorBadParameter);
+    if (err == kKSTErrorSuccess) {
+        err = kst::checkParameters(parameters, parametersCount);
     }
-    if (operation == nullptr && operationLength != 0) {
-        return kst::fail(context, "operation || !operationLength", 0, kKSTErrorBadParameter);
-    }
-    err = kst::checkParameters(parameters, parametersCount);
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -145,7 +105,7 @@ KSTStatus SerializeProcessAcl(const KSTHandle* handle, const void* acl, std::uin
         !writer.writeBytes(operation, operationLength) ||
         !writer.writeU32(maxGlobalCredentialAge) ||
         !kst::writeParameters(writer, parameters, parametersCount)) {
-        return kst::fail(context, kRoomCheck, 0, kKSTErrorBadParameter);
+        return kst::failForRoom();
     }
     *outSize = static_cast<std::uint32_t>(writer.written());
     return kKSTErrorSuccess;
@@ -157,29 +117,28 @@ KSTStatus DeserializeProcessAcl(const void* buffer, std::uint32_t size, KSTHandl
                                 std::uint32_t* outMaxGlobalCredentialAge,
                                 KSTParameter** outParameters,
                                 std::uint32_t* outParametersCount) noexcept {
-    KSTStatus err = kst::requireArguments(serializationContext(),
-                                          {{buffer, "buffer"},
-                                           {outHandle, "handle"},
-                                           {outAcl, "acl"},
-                                           {outAclLength, "aclLength"},
-                                           {outOperation, "operation"},
-                                           {outOperationLength, "operationLength"},
-                                           {outMaxGlobalCredentialAge, "maxGlobalCredentialAge"},
-                                           {outParameters, "parameters"},
-                                           {outParametersCount, "parametersCount"}});
-    if (err != kKSTErrorSuccess) {
-        return err;
+    kst::ReceivedBlob acl;
+    kst::ReceivedBlob operation;
+    kst::PayloadReader payload(
+        buffer, size, {outHandle, outMaxGlobalCredentialAge, outParameters, outParametersCount});
+    KSTStatus err = payload.begin({{outAcl, "acl"},
+                                   {outAclLength, "aclLength"},
+                                   {outOperation, "operation"},
+                                   {outOperationLength, "operationLength"}});
+    if (err == kKSTErrorSuccess) {
+        err = acl.readWithLength(payload.rest(), "tmpAcl", "(size - offset) >= tmpAclLength");
     }
-    base::ByteReader reader(buffer, size);
-    ReceivedPayload payload;
-    err = readPayload(reader, *outHandle, payload);
-    if (err != kKSTErrorSuccess) {
-        return err;
+    if (err == kKSTErrorSuccess) {
+        err = operation.readWithLength(payload.rest(), "op", "(size - offset) >= opLen");
     }
-    *outAclLength = static_cast<std::uint32_t>(payload.acl.length());
-    *outAcl = payload.acl.handOut();
-    *outOperationLength = static_cast<std::uint32_t>(payload.operation.length());
-    *outOperation = payload.operation.handOut();
-    payload.parameters.handOut(*outMaxGlobalCredentialAge, *outParameters, *outParametersCount);
-    return kKSTErrorSuccess;
+    if (err == kKSTErrorSuccess) {
+        err = payload.finish();
+    }
+    if (err == kKSTErrorSuccess) {
+        *outAclLength = static_cast<std::uint32_t>(acl.length());
+        *outAcl = acl.handOut();
+        *outOperationLength = static_cast<std::uint32_t>(operation.length());
+        *outOperation = operation.handOut();
+    }
+    return err;
 }

@@ -28,6 +28,16 @@ KSTStatus ReceivedBlob::read(base::ByteReader& reader, std::size_t length, const
     return kKSTErrorSuccess;
 }
 
+KSTStatus ReceivedBlob::readWithLength(base::ByteReader& reader, const char* memoryCheck,
+                                       const char* sizeCheck, int line) noexcept {
+    std::uint32_t length = 0;
+    if (!reader.readU32(length)) {
+        return fail(serializationContext(), "(size - offset) >= sizeof(uint32_t)", 0,
+                    kKSTErrorBadParameter, line);
+    }
+    return read(reader, length, memoryCheck, sizeCheck, line);
+}
+
 std::uint8_t* ReceivedBlob::handOut() noexcept {
     return std::exchange(bytes_, nullptr);
 }

@@ -26,6 +26,11 @@ class ReceivedBlob {
                                  const char* memoryCheck, const char* sizeCheck,
                                  int line = __builtin_LINE()) noexcept;
 
+    /// Reads a 32-bit length, kKSTErrorBadParameter when it is not there, and then as `read`.
+    [[nodiscard]] KSTStatus readWithLength(base::ByteReader& reader, const char* memoryCheck,
+                                           const char* sizeCheck,
+                                           int line = __builtin_LINE()) noexcept;
+
     [[nodiscard]] std::size_t length() const { return length_; }
 
     /// The caller owns the bytes from now on.

@@ -75,14 +75,22 @@ inline constexpr CompositeLayout kInMemoryLayout{33, 37};
     return std::min(storedChildCount(node, *layout), static_cast<std::uint32_t>(slots));
 }
 
+/// Where the pointers to the children of `node`, a composite, begin.
+[[nodiscard]] inline const std::uint8_t* childSlots(const KSTRequirement* node) noexcept {
+    return reinterpret_cast<const std::uint8_t*>(node) +
+           findCompositeLayout(node->type)->childrenOffset;
+}
+
+[[nodiscard]] inline KSTRequirement* childIn(const std::uint8_t* slot) noexcept {
+    KSTRequirement* child = nullptr;
+    std::memcpy(&child, slot, kChildSize);
+    return child;
+}
+
 /// `index` is below `childCount`.
 [[nodiscard]] inline KSTRequirement* childAt(const KSTRequirement* node,
                                              std::uint32_t index) noexcept {
-    const CompositeLayout& layout = *findCompositeLayout(node->type);
-    KSTRequirement* child = nullptr;
-    std::memcpy(&child, reinterpret_cast<const std::uint8_t*>(node) + compositeSize(layout, index),
-                kChildSize);
-    return child;
+    return childIn(childSlots(node) + index * kChildSize);
 }
 
 inline void setChildAt(KSTRequirement* node, std::uint32_t index,

@@ -8,11 +8,10 @@
 
 namespace {
 
-/// A composite and its children that have been walked already.
+/// The children of a composite that have not been walked.
 struct Level {
-    const KSTRequirement* node;
-    std::uint32_t childCount;
-    std::uint32_t next;
+    const std::uint8_t* nextSlot;
+    std::uint32_t left;
 };
 
 using Levels = kst::LevelStack<Level>;
@@ -22,8 +21,10 @@ using Levels = kst::LevelStack<Level>;
 bool nextNode(Levels& levels, const KSTRequirement*& node) {
     while (!levels.empty()) {
         Level& level = levels.top();
-        if (level.next < level.childCount) {
-            node = kst::childAt(level.node, level.next++);
+        if (level.left > 0) {
+            --level.left;
+            node = kst::childIn(level.nextSlot);
+            level.nextSlot += kst::kChildSize;
             return true;
         }
         levels.pop();
@@ -41,7 +42,7 @@ KSTStatus walk(const KSTRequirement* root, Levels& levels, Visit visit) {
     do {
         KSTStatus err = visit(node);
         const std::uint32_t count = err == kKSTErrorSuccess ? kst::childCount(node) : 0;
-        if (count > 0 && !levels.push({node, count, 0})) {
+        if (count > 0 && !levels.push({kst::childSlots(node), count})) {
             err = kst::fail(context, "levels", 0, kKSTErrorOutOfMemory);
         }
         if (err != kKSTErrorSuccess) {

@@ -1,11 +1,12 @@
 #include "common/VerifyAclSerialization.h"
 
 #include "common/HandleWire.h"
-#include "common/ParameterSerialization.h"
 #include "common/ParameterWire.h"
+#include "common/PayloadReader.h"
 #include "common/ReceivedBlob.h"
 #include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
+#include "common/WriterRoom.h"
 
 namespace {
 
@@ -20,39 +21,9 @@ constexpr std::uint32_t kFixedSize = kKSTHandleSize + sizeof(std::uint32_t) + si
 KSTStatus measure(std::uint32_t aclConstraintLength, const KSTParameter* parameters,
                   std::uint32_t parametersCount, std::uint64_t& size) {
     std::uint32_t parametersLength = 0;
-    const KSTStatus err =
-        GetSerializedParametersLength(parameters, parametersCount, &parametersLength);
-    if (err != kKSTErrorSuccess) {
-        return kst::fail(serializationContext(), "err == kKSTErrorSuccess", 0, err);
-    }
+    const KSTStatus err = kst::measureParameters(parameters, parametersCount, parametersLength);
     size = std::uint64_t{aclConstraintLength} + parametersLength + kFixedSize;
-    return kKSTErrorSuccess;
-}
-
-struct ReceivedPayload {
-    kst::ReceivedBlob constraint;
-    std::uint8_t preflight = 0;
-    kst::ReceivedParameters parameters;
-};
-
-KSTStatus readPayload(base::ByteReader& reader, KSTHandle& handle, ReceivedPayload& payload) {
-    const kst::AssertionContext context = serializationContext();
-    if (!kst::readHandle(reader, handle)) {
-        return kst::fail(context, "(size - offset) >= sizeof(KSTHandle)", 0, kKSTErrorBadParameter);
-    }
-    std::uint32_t constraintLength = 0;
-    if (!reader.readU32(constraintLength)) {
-        return kst::fail(context, "(size - offset) >= sizeof(uint32_t)", 0, kKSTErrorBadParameter);
-    }
-    const KSTStatus err = payload.constraint.read(reader, constraintLength, "constraint",
-                                                  "(size - offset) >= constraintLength");
-    if (err != kKSTErrorSuccess) {
-        return err;
-    }
-    if (!reader.readU8(payload.preflight)) {
-        return kst::fail(context, "(size - offset) >= sizeof(uint8_t)", 0, kKSTErrorBadParameter);
-    }
-    return payload.parameters.read(reader);
+    return err;
 }
 
 } // namespace
@@ -87,24 +58,17 @@ KSTStatus SerializeVerifyAclConstraint(const KSTHandle* handle, const void* aclC
     const kst::AssertionContext context = serializationContext();
     KSTStatus err = kst::requireArguments(context, {{aclConstraint, "aclConstraint"}});
     if (err == kKSTErrorSuccess) {
-        err = kst::checkParameterList(parameters, parametersCount);
-    }
-    if (err == kKSTErrorSuccess) {
-        err = kst::requireArguments(context, {{outBuffer, "outBuffer"}, {outSize, "outSize"}});
+        err = kst::checkWriter(parameters, parametersCount, outBuffer, outSize);
     }
     if (err != kKSTErrorSuccess) {
         return err;
     }
     std::uint64_t requiredSize = 0;
     err = measure(aclConstraintLength, parameters, parametersCount, requiredSize);
-    if (err != kKSTErrorSuccess) {
-        return kst::failCall(context, err);
+    err = kst::checkRoom(err, requiredSize, *outSize);
+    if (err == kKSTErrorSuccess) {
+        err = kst::checkParameters(parameters, parametersCount);
     }
-    constexpr const char* kRoomCheck = "*outSize >= requiredSize";
-    if (*outSize < requiredSize) {
-        return kst::fail(context, kRoomCheck, 0, kKSTErrorBadParameter);
-    }
-    err = kst::checkParameters(parameters, parametersCount);
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -113,7 +77,7 @@ KSTStatus SerializeVerifyAclConstraint(const KSTHandle* handle, const void* aclC
         !writer.writeBytes(aclConstraint, aclConstraintLength) || !writer.writeU8(preflight) ||
         !writer.writeU32(maxGlobalCredentialAge) ||
         !kst::writeParameters(writer, parameters, parametersCount)) {
-        return kst::fail(context, kRoomCheck, 0, kKSTErrorBadParameter);
+        return kst::failForRoom();
     }
     *outSize = static_cast<std::uint32_t>(writer.written());
     return kKSTErrorSuccess;
@@ -126,27 +90,27 @@ KSTStatus DeserializeVerifyAclConstraint(const void* buffer, std::uint32_t size,
                                          std::uint32_t* outMaxGlobalCredentialAge,
                                          KSTParameter** outParameters,
                                          std::uint32_t* outParametersCount) noexcept {
-    KSTStatus err = kst::requireArguments(serializationContext(),
-                                          {{buffer, "buffer"},
-                                           {outHandle, "handle"},
-                                           {outAclConstraint, "aclConstraint"},
-                                           {outAclConstraintLength, "aclConstraintLength"},
-                                           {outPreflight, "preflight"},
-                                           {outMaxGlobalCredentialAge, "maxGlobalCredentialAge"},
-                                           {outParameters, "parameters"},
-                                           {outParametersCount, "parametersCount"}});
-    if (err != kKSTErrorSuccess) {
-        return err;
+    kst::ReceivedBlob constraint;
+    std::uint8_t preflight = 0;
+    kst::PayloadReader payload(
+        buffer, size, {outHandle, outMaxGlobalCredentialAge, outParameters, outParametersCount});
+    KSTStatus err = payload.begin({{outAclConstraint, "aclConstraint"},
+                                   {outAclConstraintLength, "aclConstraintLength"},
+                                   {outPreflight, "preflight"}});
+    if (err == kKSTErrorSuccess) {
+        err = constraint.readWithLength(payload.rest(), "constraint",
+                                        "(size - offset) >= constraintLength");
     }
-    base::ByteReader reader(buffer, size);
-    ReceivedPayload payload;
-    err = readPayload(reader, *outHandle, payload);
-    if (err != kKSTErrorSuccess) {
-        return err;
+    if (err == kKSTErrorSuccess) {
+        err = payload.readFlag(preflight);
     }
-    *outAclConstraintLength = static_cast<std::uint32_t>(payload.constraint.length());
-    *outAclConstraint = payload.constraint.handOut();
-    *outPreflight = payload.preflight != 0 ? 1 : 0;
-    payload.parameters.handOut(*outMaxGlobalCredentialAge, *outParameters, *outParametersCount);
-    return kKSTErrorSuccess;
+    if (err == kKSTErrorSuccess) {
+        err = payload.finish();
+    }
+    if (err == kKSTErrorSuccess) {
+        *outAclConstraintLength = static_cast<std::uint32_t>(constraint.length());
+        *outAclConstraint = constraint.handOut();
+        *outPreflight = preflight;
+    }
+    return err;
 }

@@ -1,11 +1,12 @@
 #include "common/VerifyPolicySerialization.h"
 
 #include "common/HandleWire.h"
-#include "common/ParameterSerialization.h"
 #include "common/ParameterWire.h"
+#include "common/PayloadReader.h"
 #include "common/ReceivedBlob.h"
 #include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
+#include "common/WriterRoom.h"
 
 #include <algorithm>
 #include <string.h>
@@ -38,27 +39,6 @@ KSTStatus readPolicyId(base::ByteReader& reader, kst::ReceivedBlob& policyId) {
     return policyId.read(reader, length + 1, "policy", kSizeCheck);
 }
 
-struct ReceivedPayload {
-    kst::ReceivedBlob policyId;
-    std::uint8_t preflight = 0;
-    kst::ReceivedParameters parameters;
-};
-
-KSTStatus readPayload(base::ByteReader& reader, KSTHandle& handle, ReceivedPayload& payload) {
-    const kst::AssertionContext context = serializationContext();
-    if (!kst::readHandle(reader, handle)) {
-        return kst::fail(context, "(size - offset) >= sizeof(KSTHandle)", 0, kKSTErrorBadParameter);
-    }
-    const KSTStatus err = readPolicyId(reader, payload.policyId);
-    if (err != kKSTErrorSuccess) {
-        return err;
-    }
-    if (!reader.readU8(payload.preflight)) {
-        return kst::fail(context, "(size - offset) >= sizeof(uint8_t)", 0, kKSTErrorBadParameter);
-    }
-    return payload.parameters.read(reader);
-}
-
 } // namespace
 
 KSTStatus GetSerializedVerifyPolicySize(const KSTHandle* handle, const char* policyId,
@@ -77,10 +57,9 @@ KSTStatus GetSerializedVerifyPolicySize(const KSTHandle* handle, const char* pol
         return kst::fail(serializationContext(), "policyLength <= 128", 0, kKSTErrorBadParameter);
     }
     std::uint32_t parametersLength = 0;
-    const KSTStatus err =
-        GetSerializedParametersLength(parameters, parametersCount, &parametersLength);
+    const KSTStatus err = kst::measureParameters(parameters, parametersCount, parametersLength);
     if (err != kKSTErrorSuccess) {
-        return kst::fail(serializationContext(), "err == kKSTErrorSuccess", 0, err);
+        return err;
     }
     const std::uint64_t size = policyLength + kFixedSize + parametersLength;
     if (size <= parametersLength) {
@@ -101,10 +80,7 @@ KSTStatus SerializeVerifyPolicy(const KSTHandle* handle, const char* policyId,
     const kst::AssertionContext context = serializationContext();
     KSTStatus err = kst::requireArguments(context, {{handle, "handle"}, {policyId, "policyId"}});
     if (err == kKSTErrorSuccess) {
-        err = kst::checkParameterList(parameters, parametersCount);
-    }
-    if (err == kKSTErrorSuccess) {
-        err = kst::requireArguments(context, {{outBuffer, "outBuffer"}, {outSize, "outSize"}});
+        err = kst::checkWriter(parameters, parametersCount, outBuffer, outSize);
     }
     if (err != kKSTErrorSuccess) {
         return err;
@@ -112,14 +88,10 @@ KSTStatus SerializeVerifyPolicy(const KSTHandle* handle, const char* policyId,
     std::size_t requiredSize = 0;
     err = GetSerializedVerifyPolicySize(handle, policyId, preflight, maxGlobalCredentialAge,
                                         parameters, parametersCount, &requiredSize);
-    if (err != kKSTErrorSuccess) {
-        return kst::failCall(context, err);
+    err = kst::checkRoom(err, requiredSize, *outSize);
+    if (err == kKSTErrorSuccess) {
+        err = kst::checkParameters(parameters, parametersCount);
     }
-    constexpr const char* kRoomCheck = "*outSize >= requiredSize";
-    if (*outSize < requiredSize) {
-        return kst::fail(context, kRoomCheck, 0, kKSTErrorBadParameter);
-    }
-    err = kst::checkParameters(parameters, parametersCount);
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -129,7 +101,7 @@ KSTStatus SerializeVerifyPolicy(const KSTHandle* handle, const char* policyId,
         !writer.writeU8(0) || !writer.writeU8(preflight) ||
         !writer.writeU32(maxGlobalCredentialAge) ||
         !kst::writeParameters(writer, parameters, parametersCount)) {
-        return kst::fail(context, kRoomCheck, 0, kKSTErrorBadParameter);
+        return kst::failForRoom();
     }
     *outSize = writer.written();
     return kKSTErrorSuccess;
@@ -140,25 +112,23 @@ KSTStatus DeserializeVerifyPolicy(const void* buffer, std::size_t size, KSTHandl
                                   std::uint32_t* outMaxGlobalCredentialAge,
                                   KSTParameter** outParameters,
                                   std::uint32_t* outParametersCount) noexcept {
-    KSTStatus err = kst::requireArguments(serializationContext(),
-                                          {{buffer, "buffer"},
-                                           {outHandle, "handle"},
-                                           {outPolicyId, "policyId"},
-                                           {outPreflight, "preflight"},
-                                           {outMaxGlobalCredentialAge, "maxGlobalCredentialAge"},
-                                           {outParameters, "parameters"},
-                                           {outParametersCount, "parametersCount"}});
-    if (err != kKSTErrorSuccess) {
-        return err;
+    kst::ReceivedBlob policyId;
+    std::uint8_t preflight = 0;
+    kst::PayloadReader payload(
+        buffer, size, {outHandle, outMaxGlobalCredentialAge, outParameters, outParametersCount});
+    KSTStatus err = payload.begin({{outPolicyId, "policyId"}, {outPreflight, "preflight"}});
+    if (err == kKSTErrorSuccess) {
+        err = readPolicyId(payload.rest(), policyId);
     }
-    base::ByteReader reader(buffer, size);
-    ReceivedPayload payload;
-    err = readPayload(reader, *outHandle, payload);
-    if (err != kKSTErrorSuccess) {
-        return err;
+    if (err == kKSTErrorSuccess) {
+        err = payload.readFlag(preflight);
     }
-    *outPolicyId = reinterpret_cast<char*>(payload.policyId.handOut());
-    *outPreflight = payload.preflight != 0 ? 1 : 0;
-    payload.parameters.handOut(*outMaxGlobalCredentialAge, *outParameters, *outParametersCount);
-    return kKSTErrorSuccess;
+    if (err == kKSTErrorSuccess) {
+        err = payload.finish();
+    }
+    if (err == kKSTErrorSuccess) {
+        *outPolicyId = reinterpret_cast<char*>(policyId.handOut());
+        *outPreflight = preflight;
+    }
+    return err;
 }

@@ -203,11 +203,15 @@ TEST_F(Contexts, ExternalFormReplies) {
         expectLogged({failedCheck("outSize == sizeof(uint32_t) + sizeof(uint8_t)"),
                       returnedReference(nullptr)});
     }
+    channel.reportedSize = 6;
+    EXPECT_EQ(openContext(), nullptr);
+    expectLogged({failedCheck("replySize <= offeredSize"),
+                  failedCheck("err == 0 ", "0xfffffffffffffffb"), returnedReference(nullptr)});
     channel.reportedSize.reset();
     answers[18].status = -9;
     EXPECT_EQ(openContext(), nullptr);
     expectLogged({failedWith9(), failedWith9(), returnedReference(nullptr)});
-    EXPECT_EQ(channel.scalarCalls.size(), 3U);
+    EXPECT_EQ(channel.scalarCalls.size(), 4U);
 }
 
 TEST_F(Contexts, ExternalFormWithEveryAllocationFailing) {

@@ -320,6 +320,27 @@ TEST_F(PolicyVerification, EveryAllocationFails) {
     }
 }
 
+TEST_F(PolicyVerification, GlobalWithEveryAllocationFailing) {
+    channel.scalars = {40};
+    std::size_t refused = 0;
+    int created = 0;
+    for (bool isThrough = false; !isThrough; ++refused) {
+        const ScriptedGate gate(refused);
+        const std::int64_t before = gAllocatedBytes;
+        KSTGlobalContextVerifyPolicy("p", false, nullptr, 0, block);
+        isThrough = gate.asked.size() <= refused;
+        // Context, frame, payload, reply, frame and three nodes; then the deletion's frame, which
+        // changes nothing about the answer.
+        EXPECT_EQ(told(), refused < 8 ? (Call{-4, false, {}}) : (Call{0, false, 4})) << refused;
+        // Only a context that was there leaves its byte.
+        EXPECT_EQ(gAllocatedBytes - before, refused < 2 ? 0 : 1);
+        created += refused < 2 ? 0 : 1;
+        EXPECT_TRUE(gate.everyFreeWasWiped);
+    }
+    EXPECT_EQ(refused, 10U);
+    gAllocatedBytes -= created;
+}
+
 TEST_F(PolicyVerification, EntriesAndExitsAtLowLevel) {
     kst::gLogLevel = 30;
     EXPECT_EQ(KSTContextVerifyPolicy(context, "p", block), 0);

@@ -125,6 +125,17 @@ TEST_F(VerifyAcl, ReadsWhatIsThere) {
     EXPECT_EQ(support::takeBlob(result.constraint, result.length), constraint);
 }
 
+TEST_F(VerifyAcl, PreflightIsReadAsAFlag) {
+    for (const int preflight : {0, 1, 7, 0x80, 0xff}) {
+        Bytes bytes = kConstraintPayload;
+        bytes[30] = static_cast<std::uint8_t>(preflight);
+        Result result;
+        ASSERT_EQ(read(bytes, result), 0);
+        EXPECT_EQ(result.preflight, preflight != 0 ? 1 : 0);
+        DeallocDataBlob(result.constraint, result.length);
+    }
+}
+
 TEST_F(VerifyAcl, EmptyConstraintIsWrittenAndReadAsNull) {
     const ExactBuffer buffer(33);
     std::uint32_t size = 33;

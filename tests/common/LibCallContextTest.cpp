@@ -315,6 +315,11 @@ TEST_F(LibCallContext, VerifyPolicyWithBadArguments) {
     // One parameter stands for eleven: they are counted before they are looked at.
     EXPECT_EQ(verify("p", &parameter, 11), -3);
     expectFailure(kFunction, -3, {failedCheck("parametersCount <= 10")});
+    EXPECT_EQ(verify(std::string(129, 'p').c_str()), -3);
+    expectFailure(kFunction, -3,
+                  {"KST: AssertMacros: policyLength <= 128 (value: 0x0),  file: "
+                   "common/LibSerialization:<n>\n",
+                   failedCheck("err == 0 ", "0xfffffffffffffffd")});
     EXPECT_TRUE(transport.calls.empty());
     expectNoAnswer();
 }

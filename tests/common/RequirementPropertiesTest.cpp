@@ -103,7 +103,7 @@ TEST_F(RequirementProperties, NullRequirement) {
     Bytes bytes = leafBytes(1);
     EXPECT_EQ(LibCall_KSTRequirementGetPropertyData(asRequirement(bytes), 1, nullptr, &length), -3);
     EXPECT_EQ(LibCall_KSTRequirementGetPropertyData(asRequirement(bytes), 1, &data, nullptr), -3);
-    expectLogged({libCallCheck("data"), libCallCheck("dataLength")});
+    expectLogged({libCallCheck("data"), libCallCheck("data")});
     for (int i = 0; i < 3; ++i) {
         printedLines += "KST: LibCall_KSTRequirementGetPropertyData: returning, err = -3.\n";
     }

@@ -143,10 +143,22 @@ TEST_F(Requirement, ThereAndBack) {
 }
 
 TEST_F(Requirement, KnownSizes) {
-    EXPECT_EQ(compositeBytes(4, {leafBytes(1), leafBytes(2)}).size(), 52U);
-    EXPECT_EQ(compositeBytes(4, {leafBytes(1), leafBytes(2)})[12], 20);
-    EXPECT_EQ(compositeBytes(4, {})[12], 4);
-    EXPECT_EQ(compositeBytes(7, {})[12], 8);
+    const struct {
+        Bytes bytes;
+        std::size_t size;
+        std::uint8_t dataLength;
+        std::size_t allocated;
+    } kTrees[] = {
+        {leafBytes(16), 16, 0, 16},
+        {compositeBytes(4, {}), 20, 4, 20},
+        {compositeBytes(7, {}), 24, 8, 24},
+        {compositeBytes(4, {leafBytes(1), leafBytes(2)}), 52, 20, 36 + 2 * 16},
+    };
+    for (const auto& known : kTrees) {
+        EXPECT_EQ(known.bytes.size(), known.size);
+        EXPECT_EQ(known.bytes[12], known.dataLength);
+        expectThereAndBack(known.bytes, known.allocated);
+    }
 }
 
 TEST_F(Requirement, DataLengthOfACompositeIsNotRead) {
