@@ -35,15 +35,16 @@ class KernelChannel {
 
     /// Sends `inputSize` bytes to `selector` and stores the reply in `output`, at most
     /// `*outputSize` bytes (0 when `outputSize` is null). On success `*outputSize` becomes the size
-    /// that the kernel side reported. A reported size above the offered one gives the status of
-    /// EMSGSIZE, as does an input beyond what the channel can carry; a size offered without an
-    /// `output` gives the status of EINVAL, and nothing is sent.
+    /// that the kernel side reported. When that is above the offered one, nothing is stored and the
+    /// reply is the caller's to refuse; without `outputSize` it gives the status of EMSGSIZE, as
+    /// does an input beyond what the channel can carry. A size offered without an `output` gives
+    /// the status of EINVAL, and nothing is sent.
     [[nodiscard]] virtual Status structCall(ConnectionHandle connection, std::uint32_t selector,
                                             const void* input, std::size_t inputSize, void* output,
                                             std::size_t* outputSize) = 0;
 
     /// Sends `inputCount` numbers and stores at most `*outputCount` numbers of the reply, whose
-    /// count becomes `*outputCount`.
+    /// count becomes `*outputCount`. A count above the offered one is treated as such a size is.
     [[nodiscard]] virtual Status scalarCall(ConnectionHandle connection, std::uint32_t selector,
                                             const std::uint64_t* inputs, std::uint32_t inputCount,
                                             std::uint64_t* outputs, std::uint32_t* outputCount) = 0;

@@ -1,5 +1,7 @@
 #include "platform/fake/FakeKernelChannel.h"
 
+#include "base/Saturate.h"
+
 #include <algorithm>
 #include <cerrno>
 
@@ -9,6 +11,16 @@ namespace {
 
 /// The kernel side's own word for a call on an entry that is gone.
 constexpr Status kNoSuchEntry = -6002;
+
+/// Tells of a reply that is larger than was offered, and nothing else of it.
+template <typename Size>
+Status handOutSize(std::size_t reported, Size* size) {
+    if (size == nullptr) {
+        return statusFromErrno(EMSGSIZE);
+    }
+    *size = base::saturate<Size>(reported);
+    return kSuccess;
+}
 
 } // namespace
 
@@ -53,7 +65,7 @@ Status FakeKernelChannel::structCall(ConnectionHandle connection, std::uint32_t 
     }
     const std::size_t reported = answer.reportedSize.value_or(answer.output.size());
     if (reported > offered) {
-        return statusFromErrno(EMSGSIZE);
+        return handOutSize(reported, outputSize);
     }
     answer.output.resize(reported);
     std::copy(answer.output.begin(), answer.output.end(), static_cast<std::uint8_t*>(output));
@@ -79,7 +91,7 @@ Status FakeKernelChannel::scalarCall(ConnectionHandle connection, std::uint32_t 
         return answer.status;
     }
     if (answer.outputs.size() > offered) {
-        return statusFromErrno(EMSGSIZE);
+        return handOutSize(answer.outputs.size(), outputCount);
     }
     std::copy(answer.outputs.begin(), answer.outputs.end(), outputs);
     if (outputCount != nullptr) {

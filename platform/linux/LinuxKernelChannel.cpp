@@ -19,6 +19,16 @@ Status sendOpen(KernelSocketConnection& connection, std::uint32_t type, const st
     return status == kSuccess ? reply.status : status;
 }
 
+/// Tells of a reply that is larger than was offered, and nothing else of it.
+template <typename Size>
+Status handOutSize(std::size_t reported, Size* size) {
+    if (size == nullptr) {
+        return statusFromErrno(EMSGSIZE);
+    }
+    *size = base::saturate<Size>(reported);
+    return kSuccess;
+}
+
 } // namespace
 
 LinuxKernelChannel::LinuxKernelChannel(std::string socketPath, const LinuxServiceRegistry& registry,
@@ -70,7 +80,7 @@ Status LinuxKernelChannel::structCall(ConnectionHandle connection, std::uint32_t
         return status != kSuccess ? status : reply.status;
     }
     if (reply.reported > offered) {
-        return statusFromErrno(EMSGSIZE);
+        return handOutSize(reply.reported, outputSize);
     }
     if (reply.reported != reply.body.size()) {
         socket->disconnect();
@@ -104,7 +114,7 @@ Status LinuxKernelChannel::scalarCall(ConnectionHandle connection, std::uint32_t
         return status != kSuccess ? status : reply.status;
     }
     if (reply.reported > offered) {
-        return statusFromErrno(EMSGSIZE);
+        return handOutSize(reply.reported, outputCount);
     }
     const auto scalars = wire::decodeKernelScalars(reply.body, reply.reported);
     if (!scalars) {

@@ -116,7 +116,7 @@ INSTANTIATE_TEST_SUITE_P(Ways, SpoiledAckTest,
                                          Spoiled{"HangUp", "hang-up", "-1104"},
                                          Spoiled{"WrongSequence", "wrong-sequence", "-1071"},
                                          Spoiled{"Garbage", "garbage=10", "-1071"},
-                                         Spoiled{"MoreThanOffered", "reply=257", "-1090"}),
+                                         Spoiled{"MoreThanOffered", "reply=257", "-5"}),
                          [](const auto& test) { return std::string(test.param.name); });
 
 TEST_F(NotificationTest, BrokenDatagramsAreDroppedAndTheDaemonGoesOn) {
