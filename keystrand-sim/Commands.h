@@ -21,6 +21,12 @@ void addCredentialCommands(DispatchTable& table, KernelState& kernel, const Now&
 void addPolicyCommands(DispatchTable& table, KernelState& kernel, const Now& now);
 void addAccessListCommand(DispatchTable& table, KernelState& kernel);
 
+/// A result whose output is a number: 1 for yes, 0 for no.
+[[nodiscard]] inline CommandResult answeredWith(bool isYes) {
+    const std::uint8_t flag = isYes ? 1 : 0;
+    return {.status = kKernelSuccess, .output = {flag, 0, 0, 0}};
+}
+
 /// A result without output.
 [[nodiscard]] inline CommandResult endedWith(KernelStatus status) {
     return {.status = status, .output = {}};

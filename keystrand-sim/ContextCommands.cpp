@@ -37,9 +37,10 @@ CommandResult destroy(KernelState& kernel, Payload payload) {
 }
 
 CommandResult createWithExternalForm(KernelState& kernel, Payload payload) {
-    const bool exists = kernel.contexts.find(HandlePayload(payload).handle) != nullptr;
-    const std::uint8_t flag = exists ? 1 : 0;
-    return {.status = kKernelSuccess, .output = {flag, 0, 0, 0, kernel.logLevel}};
+    CommandResult result =
+        answeredWith(kernel.contexts.find(HandlePayload(payload).handle) != nullptr);
+    result.output.push_back(kernel.logLevel);
+    return result;
 }
 
 CommandResult getExternalForm(KernelState& kernel, Payload payload) {

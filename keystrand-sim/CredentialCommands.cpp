@@ -151,26 +151,22 @@ Place findAskedPlace(KernelState& kernel, const NumbersPayload& request) {
                      request.scope == kNoScope ? KSTScope{kKSTScopeContext} : request.scope);
 }
 
-CommandResult contained(bool isContained) {
-    const std::uint8_t flag = isContained ? 1 : 0;
-    return {.status = kKernelSuccess, .output = {flag, 0, 0, 0}};
-}
-
 CommandResult containsType(KernelState& kernel, Payload payload) {
     const NumbersPayload request(payload);
     if (!isCredentialType(request.number)) {
         return endedWith(kKernelBadPayload);
     }
     const Place place = findAskedPlace(kernel, request);
-    return place.credentials != nullptr ? contained(place.credentials->containsType(request.number))
-                                        : endedWith(place.status);
+    return place.credentials != nullptr
+               ? answeredWith(place.credentials->containsType(request.number))
+               : endedWith(place.status);
 }
 
 CommandResult containsPassphrase(KernelState& kernel, Payload payload) {
     const NumbersPayload request(payload);
     const Place place = findAskedPlace(kernel, request);
     return place.credentials != nullptr
-               ? contained(place.credentials->containsPassphrase(request.number))
+               ? answeredWith(place.credentials->containsPassphrase(request.number))
                : endedWith(place.status);
 }
 

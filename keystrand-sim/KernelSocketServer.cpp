@@ -12,28 +12,18 @@ KernelSocketServer::KernelSocketServer(EventLoop& loop, ListeningSocket socket,
       handler_(handler),
       faults_(faults),
       packetBuffer_(wire::kKernelMessageMaxSize + 1),
-      acceptor_(loop, std::move(socket), [this](base::FileDescriptor fd) { take(std::move(fd)); }) {
-}
+      connections_(loop, std::move(socket), kMaxConnections,
+                   [this](base::FileDescriptor fd, Table::Ended ended) {
+                       return serve(std::move(fd), std::move(ended));
+                   }) {}
 
-void KernelSocketServer::take(base::FileDescriptor fd) {
+std::unique_ptr<KernelConnection> KernelSocketServer::serve(base::FileDescriptor fd,
+                                                            Table::Ended ended) {
     if (faults_.takeRefusal()) {
-        return;
+        return nullptr;
     }
-    const std::uint64_t id = ++lastId_;
-    auto connection = std::make_unique<KernelConnection>(loop_, std::move(fd), handler_,
-                                                         packetBuffer_, [this, id] { drop(id); });
-    if (!connection->isWatched()) {
-        return;
-    }
-    connections_.emplace(id, std::move(connection));
-    if (connections_.size() == kMaxConnections) {
-        acceptor_.pause();
-    }
-}
-
-void KernelSocketServer::drop(std::uint64_t id) {
-    connections_.erase(id);
-    acceptor_.resume();
+    return std::make_unique<KernelConnection>(loop_, std::move(fd), handler_, packetBuffer_,
+                                              std::move(ended));
 }
 
 } // namespace sim

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "keystrand-sim/Acceptor.h"
+#include "keystrand-sim/ConnectionTable.h"
 #include "keystrand-sim/EventLoop.h"
 #include "keystrand-sim/FaultScript.h"
 #include "keystrand-sim/KernelConnection.h"
@@ -8,13 +8,12 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <map>
 #include <memory>
 #include <vector>
 
 namespace sim {
 
-/// Serves the kernel service's socket to a bounded number of clients; more wait until one has gone.
+/// Serves the kernel service's socket to a bounded number of clients.
 class KernelSocketServer {
   public:
     static constexpr std::size_t kMaxConnections = 64;
@@ -26,16 +25,15 @@ class KernelSocketServer {
     [[nodiscard]] std::size_t connectionCount() const { return connections_.size(); }
 
   private:
-    void take(base::FileDescriptor fd);
-    void drop(std::uint64_t id);
+    using Table = ConnectionTable<KernelConnection>;
+
+    std::unique_ptr<KernelConnection> serve(base::FileDescriptor fd, Table::Ended ended);
 
     EventLoop& loop_;
     RequestHandler& handler_;
     FaultScript& faults_;
     std::vector<std::uint8_t> packetBuffer_;
-    std::uint64_t lastId_ = 0;
-    std::map<std::uint64_t, std::unique_ptr<KernelConnection>> connections_;
-    Acceptor acceptor_;
+    Table connections_;
 };
 
 } // namespace sim

@@ -74,18 +74,21 @@ std::optional<ListeningSocket> ListeningSocket::open(const std::string& path, in
         error = reason(path, "cannot listen");
         return std::nullopt;
     }
-    return ListeningSocket(std::move(fd), path, made.st_dev, made.st_ino);
+    return ListeningSocket(std::move(fd), File{path, made.st_dev, made.st_ino});
 }
 
-ListeningSocket::ListeningSocket(base::FileDescriptor fd, std::string path, dev_t device,
-                                 ino_t inode)
-    : fd_(std::move(fd)), path_(std::move(path)), device_(device), inode_(inode) {}
+ListeningSocket ListeningSocket::adopt(base::FileDescriptor fd) {
+    return ListeningSocket(std::move(fd), std::nullopt);
+}
+
+ListeningSocket::ListeningSocket(base::FileDescriptor fd, std::optional<File> file)
+    : fd_(std::move(fd)), file_(std::move(file)) {}
 
 ListeningSocket::~ListeningSocket() {
     struct stat present {};
-    if (fd_.isOpen() && ::lstat(path_.c_str(), &present) == 0 && present.st_dev == device_ &&
-        present.st_ino == inode_) {
-        ::unlink(path_.c_str());
+    if (fd_.isOpen() && file_ && ::lstat(file_->path.c_str(), &present) == 0 &&
+        present.st_dev == file_->device && present.st_ino == file_->inode) {
+        ::unlink(file_->path.c_str());
     }
 }
 

@@ -29,11 +29,6 @@ struct Question {
     ReceivedParameters parameters;
 };
 
-CommandResult satisfied(bool isSatisfied) {
-    const std::uint8_t flag = isSatisfied ? 1 : 0;
-    return {.status = kKernelSuccess, .output = {flag, 0, 0, 0}};
-}
-
 CommandResult verify(KernelState& kernel, Context& context, const Requirement& requirement,
                      const Question& question, CredentialSet::Seconds now) {
     const Situation situation{.own = context.credentials,
@@ -42,7 +37,7 @@ CommandResult verify(KernelState& kernel, Context& context, const Requirement& r
                               .user = question.parameters.user(),
                               .now = now};
     if (const auto missing = whatIsMissing(requirement, situation)) {
-        CommandResult result = satisfied(false);
+        CommandResult result = answeredWith(false);
         const auto tree = encodeMissing(*missing);
         result.output.insert(result.output.end(), tree.begin(), tree.end());
         return result;
@@ -53,7 +48,7 @@ CommandResult verify(KernelState& kernel, Context& context, const Requirement& r
             kernel.globalCredentials.remove(used);
         }
     }
-    return satisfied(true);
+    return answeredWith(true);
 }
 
 CommandResult verifyPolicy(KernelState& kernel, Payload payload, CredentialSet::Seconds now) {

@@ -28,9 +28,18 @@ bool makeDirectory(const std::string& path, std::string& error) {
     return false;
 }
 
+std::optional<ListeningSocket> serviceSocket(base::FileDescriptor activated,
+                                             const std::string& path, std::string& error) {
+    if (activated.isOpen()) {
+        return ListeningSocket::adopt(std::move(activated));
+    }
+    return ListeningSocket::open(path, SOCK_SEQPACKET, error);
+}
+
 } // namespace
 
-std::unique_ptr<Simulator> Simulator::create(const Settings& settings, std::string& error) {
+std::unique_ptr<Simulator> Simulator::create(const Settings& settings,
+                                             base::FileDescriptor activated, std::string& error) {
     PolicyTable policies;
     if (!settings.policies.empty()) {
         if (const auto problem = policies.load(settings.policies)) {
@@ -48,7 +57,7 @@ std::unique_ptr<Simulator> Simulator::create(const Settings& settings, std::stri
         error = "cannot make an event loop";
         return nullptr;
     }
-    auto service = ListeningSocket::open(paths.serviceSocket, SOCK_SEQPACKET, error);
+    auto service = serviceSocket(std::move(activated), paths.serviceSocket, error);
     if (!service) {
         return nullptr;
     }

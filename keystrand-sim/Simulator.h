@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/FileDescriptor.h"
 #include "keystrand-sim/Commands.h"
 #include "keystrand-sim/ControlSocket.h"
 #include "keystrand-sim/EventLoop.h"
@@ -36,9 +37,11 @@ class Simulator {
         std::string policies = {};
     };
 
-    /// A simulator whose sockets listen, or none with a reason for people in `error`.
-    [[nodiscard]] static std::unique_ptr<Simulator> create(const Settings& settings,
-                                                           std::string& error);
+    /// A simulator whose sockets listen, or none with a reason for people in `error`. It serves
+    /// `activated`, a listening socket that does not block, in the place of a kernel socket of its
+    /// own; a closed descriptor when there is none.
+    [[nodiscard]] static std::unique_ptr<Simulator>
+    create(const Settings& settings, base::FileDescriptor activated, std::string& error);
 
     /// Serves until SIGTERM, SIGINT or the control command that ends it. False when the loop
     /// failed.

@@ -1,12 +1,16 @@
 #include "base/Concat.h"
+#include "keystrand-sim/ActivatedSocket.h"
 #include "keystrand-sim/ControlClient.h"
 #include "keystrand-sim/Options.h"
 #include "keystrand-sim/Paths.h"
 #include "keystrand-sim/Simulator.h"
 
+#include <systemd/sd-daemon.h>
+
 #include <csignal>
 #include <cstdio>
 #include <string>
+#include <utility>
 
 namespace {
 
@@ -39,13 +43,16 @@ int sendControlCommand(const sim::Paths& paths, const std::vector<std::string>& 
 
 int simulate(const sim::Simulator::Settings& settings) {
     std::string error;
-    const auto simulator = sim::Simulator::create(settings, error);
+    auto activated = sim::takeActivatedServiceSocket(error);
+    const auto simulator =
+        activated ? sim::Simulator::create(settings, std::move(*activated), error) : nullptr;
     if (!simulator) {
         std::fprintf(stderr, "keystrand-sim: %s\n", error.c_str());
         return 1;
     }
     std::puts("keystrand-sim: ready");
     std::fflush(stdout);
+    sd_notify(0, "READY=1");
     return simulator->run() ? 0 : 1;
 }
 

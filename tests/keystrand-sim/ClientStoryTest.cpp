@@ -1,14 +1,6 @@
 // The real library against the program, over the kernel socket.
 
-#include "KSTLib/KSTLib.h"
-#include "KSTLib/Platform.h"
-#include "platform/linux/LinuxKernelChannel.h"
-#include "platform/linux/LinuxServiceRegistry.h"
-#include "tests/keystrand-sim/SimulatorProcess.h"
-#include "tests/support/RecordingLog.h"
-
-#include <algorithm>
-#include <fstream>
+#include "tests/keystrand-sim/LibraryClient.h"
 
 namespace sim::test {
 
@@ -16,73 +8,14 @@ namespace {
 
 using Words = std::vector<std::string>;
 
-/// The requirement as text: its type, its state where it is not 1, its children.
-std::string textOf(const KSTRequirement* requirement) {
-    if (requirement == nullptr) {
-        return "none";
-    }
-    std::string text = std::to_string(KSTRequirementGetType(requirement));
-    if (KSTRequirementGetState(requirement) != 1) {
-        text += "!";
-    }
-    std::string children;
-    KSTRequirementGetSubrequirements(requirement, [&](const KSTRequirement* child) {
-        children += (children.empty() ? "" : " ") + textOf(child);
-    });
-    return children.empty() ? text : text + "(" + children + ")";
-}
-
-struct CredentialDeletion {
-    void operator()(KSTCredential* credential) const { KSTCredentialDelete(credential); }
-};
-using OwnedCredential = std::unique_ptr<KSTCredential, CredentialDeletion>;
-
-OwnedCredential make(std::uint32_t type) {
-    KSTCredential* credential = nullptr;
-    EXPECT_EQ(KSTCredentialCreate(type, &credential), 0);
-    return OwnedCredential(credential);
-}
-
-OwnedCredential makePassphrase(const std::string& text, KSTPassphrasePurpose purpose) {
-    OwnedCredential credential = make(kKSTCredentialTypePassphraseEntered);
-    EXPECT_EQ(KSTCredentialSetProperty(credential.get(), 200, text.data(), text.size()), 0);
-    EXPECT_EQ(KSTCredentialSetProperty(credential.get(), 201, &purpose, sizeof purpose), 0);
-    return credential;
-}
-
-class ClientStoryTest : public SimulatorProcess {
+class ClientStoryTest : public LibraryClient {
   protected:
     void SetUp() override {
-        SimulatorProcess::SetUp();
-        const std::string file = path("policies.conf");
-        std::ofstream(file) << "policy open = any-of(passcode(age=60),\n"
-                               "                     all-of(biometry, passphrase(purpose=1)))\n"
-                               "policy pay = passphrase(once)\n";
-        start({"--clock", "1000000", "--policies", file});
-        registry_.emplace(servicePath(), log_);
-        channel_.emplace(servicePath(), *registry_, log_);
-        connect();
+        LibraryClient::SetUp();
+        startWith("policy open = any-of(passcode(age=60),\n"
+                  "                     all-of(biometry, passphrase(purpose=1)))\n"
+                  "policy pay = passphrase(once)\n");
     }
-
-    void TearDown() override { kst::removePlatform(); }
-
-    /// Lets the library connect anew; what it had open stays open.
-    void connect() { kst::installPlatform({log_, *registry_, *channel_}); }
-
-    static std::string ask(KSTContextRef context, const char* policy) {
-        std::string answer = "no answer";
-        const KSTStatus status = KSTContextVerifyPolicy(
-            context, policy, [&](bool satisfied, const KSTRequirement* requirement) {
-                answer = satisfied ? "satisfied" : textOf(requirement);
-            });
-        return status == 0 ? answer : std::to_string(status);
-    }
-
-    std::size_t contexts() { return tell("contexts").lines.size(); }
-
-    support::RecordingLog log_;
-    std::optional<platform::LinuxServiceRegistry> registry_;
-    std::optional<platform::LinuxKernelChannel> channel_;
 };
 
 TEST_F(ClientStoryTest, FromWhatIsMissingToSatisfied) {
@@ -133,11 +66,7 @@ TEST_F(ClientStoryTest, PreflightUsesNothingUp) {
 TEST_F(ClientStoryTest, ContextIsHandedToAnotherConnection) {
     KSTContextRef context = nullptr;
     ASSERT_EQ(KSTContextCreate(&context), 0);
-    ByteVector form;
-    KSTContextGetExternalForm(context, [&](const void* data, std::size_t length) {
-        const auto* bytes = static_cast<const std::uint8_t*>(data);
-        form.assign(bytes, bytes + length);
-    });
+    const ByteVector form = externalForm(context);
     ASSERT_EQ(form.size(), 16U);
     const auto connections = [this] {
         return std::stoi(SimulatorProcess::ask("status", "connections"));
@@ -219,8 +148,7 @@ TEST_F(ClientStoryTest, ConstraintsAndAccessLists) {
     EXPECT_EQ(KSTParseAclAndCopyConstraintCharacteristics(
                   acl.data(), acl.size(),
                   [&](KSTStatus, const void* data, std::size_t length) {
-                      const auto* bytes = static_cast<const std::uint8_t*>(data);
-                      characteristics.assign(bytes, bytes + length);
+                      characteristics = bytesAt(data, length);
                   }),
               0);
     EXPECT_EQ(characteristics, Bytes().u32(1).u32(4).u32(4).get());
