@@ -8,13 +8,13 @@
 #include "bench/support/BareFile.h"
 #include "bench/support/Benchmark.h"
 #include "bench/support/Comparison.h"
-#include "bench/support/HostWith.h"
 #include "bench/support/Peer.h"
 #include "bench/support/PrivateRoot.h"
 #include "bench/support/Quiet.h"
 #include "bench/support/SystemError.h"
 #include "kstd/Daemon.h"
 #include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
+#include "platform/HostWith.h"
 #include "platform/MainRunLoop.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"
@@ -130,9 +130,7 @@ class Series {
           linuxHost_(
               {.paths = paths_, .eventSocket = platform::makeEventSocket(paths_.eventSocket())}),
           loop_([this] { measure(); }),
-          host_(bench::hostWith(linuxHost_.interfaces(),
-                                otherLog != nullptr ? *otherLog : linuxHost_.interfaces().log,
-                                loop_)),
+          host_(platform::hostWith(linuxHost_.interfaces(), {.log = otherLog, .runLoop = &loop_})),
           handled_(std::make_shared<Handled>(host_)),
           sender_(paths_.eventSocket()) {}
 

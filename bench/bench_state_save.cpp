@@ -5,11 +5,11 @@
 #include "bench/support/BareFile.h"
 #include "bench/support/Benchmark.h"
 #include "bench/support/Comparison.h"
-#include "bench/support/HostWith.h"
 #include "bench/support/PrivateRoot.h"
 #include "bench/support/Quiet.h"
 #include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
 #include "kstd/DeviceRestrictedMode/StateFilePaths.h"
+#include "platform/HostWith.h"
 #include "platform/linux/LinuxHost.h"
 #include "wire/RestrictedMode.h"
 
@@ -48,7 +48,7 @@ void measure(const bench::Options& options, const std::filesystem::path& directo
     const platform::Host host = linuxHost.interfaces();
     const auto service = DeviceRestrictedModeService::make(host);
     const auto silent =
-        DeviceRestrictedModeService::make(bench::hostWith(host, noLog, host.runLoop));
+        DeviceRestrictedModeService::make(platform::hostWith(host, {.log = &noLog}));
 
     bench::printHead(base::concat("saveDataBlob of 13 bytes against a bare pwrite and fsync, ",
                                   options.rounds, " rounds, ",

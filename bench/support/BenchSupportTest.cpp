@@ -1,10 +1,12 @@
 #include "bench/support/Comparison.h"
 #include "bench/support/Peer.h"
+#include "bench/support/SmallStack.h"
 #include "bench/support/SystemCallCount.h"
 
 #include <gtest/gtest.h>
 
 #include <filesystem>
+#include <pthread.h>
 #include <stdexcept>
 #include <stdlib.h>
 #include <string>
@@ -67,6 +69,23 @@ TEST(CountSystemCalls, WorkThatThrows) {
                          throw std::runtime_error("no");
                      };
                  })),
+                 std::runtime_error);
+}
+
+TEST(RunOnStackOf, StackIsNoLarger) {
+    std::size_t size = 0;
+    runOnStackOf(std::size_t{128} << 10U, [&size] {
+        pthread_attr_t attributes;
+        void* lowest = nullptr;
+        ASSERT_EQ(::pthread_getattr_np(::pthread_self(), &attributes), 0);
+        ASSERT_EQ(::pthread_attr_getstack(&attributes, &lowest, &size), 0);
+        ::pthread_attr_destroy(&attributes);
+    });
+    EXPECT_EQ(size, std::size_t{128} << 10U);
+}
+
+TEST(RunOnStackOf, WorkThatThrows) {
+    EXPECT_THROW(runOnStackOf(std::size_t{128} << 10U, [] { throw std::runtime_error("no"); }),
                  std::runtime_error);
 }
 

@@ -119,10 +119,12 @@ void printHead(const std::string& title) {
 }
 
 void printRow(const std::string& name, const Comparison& comparison, std::optional<double> target) {
-    std::printf("%-*s %8.2f us %8.2f us %7.3f %6.2f .. %5.2f", kNameWidth, name.c_str(),
-                comparison.floorMedian / kNanosecondsPerMicrosecond,
-                comparison.productMedian / kNanosecondsPerMicrosecond, comparison.ratioMedian,
-                comparison.ratioMin, comparison.ratioMax);
+    const bool isShort = comparison.floorMedian < kNanosecondsPerMicrosecond;
+    const char* unit = isShort ? "ns" : "us";
+    const double nanoseconds = isShort ? 1 : kNanosecondsPerMicrosecond;
+    std::printf("%-*s %8.2f %s %8.2f %s %7.3f %6.2f .. %5.2f", kNameWidth, name.c_str(),
+                comparison.floorMedian / nanoseconds, unit, comparison.productMedian / nanoseconds,
+                unit, comparison.ratioMedian, comparison.ratioMin, comparison.ratioMax);
     if (target) {
         std::printf(" %7.2f", *target);
     } else {

@@ -1,8 +1,8 @@
 #include "kstd/Daemon.h"
 
 #include "platform/EventStream.h"
+#include "platform/HostWith.h"
 #include "tests/kstd/DaemonFixture.h"
-#include "tests/kstd/HostWith.h"
 
 #include <gmock/gmock.h>
 
@@ -120,7 +120,7 @@ class SubscriptionDiary final : public platform::EventStream {
 
 TEST_F(DaemonTest, AllServicesAreStartedBeforeTheFirstStreamIsSubscribed) {
     SubscriptionDiary events(diary);
-    const platform::Host host = hostWith({.events = &events}, fake.host());
+    const platform::Host host = platform::hostWith(fake.host(), {.events = &events});
     fake.events.closeSources();
     EXPECT_EQ(Daemon(host, {witness("first"), witness("second")}).run(), 0);
     EXPECT_THAT(diary,
@@ -132,7 +132,7 @@ TEST_F(DaemonTest, AllServicesAreStartedBeforeTheFirstStreamIsSubscribed) {
 
 TEST_F(DaemonTest, TheAlarmStreamIsSubscribedWhenTheListIsMade) {
     SubscriptionDiary events(diary);
-    const platform::Host host = hostWith({.events = &events}, fake.host());
+    const platform::Host host = platform::hostWith(fake.host(), {.events = &events});
     const auto services = makeServices(host);
     EXPECT_THAT(diary, ElementsAre("subscribe com.zerva.alarm"));
 }

@@ -1,5 +1,5 @@
+#include "platform/HostWith.h"
 #include "tests/kstd/Analytics/LoggerFixture.h"
-#include "tests/kstd/HostWith.h"
 
 #include <filesystem>
 #include <thread>
@@ -165,7 +165,7 @@ TEST_F(UploadTest, RowThatBreaksInTheMiddleLeavesNoTrace) {
     };
     Breaking propertyLists(fake.propertyLists);
     const auto logger =
-        TestLogger::logger(hostWith({.propertyLists = &propertyLists}, fake.host()));
+        TestLogger::logger(platform::hostWith(fake.host(), {.propertyLists = &propertyLists}));
     logger->logEventNamed("event", nullptr);
     const auto document = logger->getLoggingJSON();
     ASSERT_TRUE(document);
