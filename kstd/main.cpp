@@ -1,6 +1,7 @@
 #include "KSTLib/Platform.h"
 #include "kstd/Analytics/AnalyticsLifetime.h"
 #include "kstd/Daemon.h"
+#include "kstd/MessageIds.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"
 
@@ -20,7 +21,8 @@ int main() {
 
     platform::LinuxHost host({.paths = platform::Paths("/"),
                               .eventSocket = platform::takeActivatedEventSocket(),
-                              .idleTime = kIdleTime});
+                              .idleTime = kIdleTime,
+                              .messageClasses = kstd::messageClasses()});
     const platform::Host interfaces = host.interfaces();
     kst::installPlatform({interfaces.log, interfaces.registry, interfaces.channel});
     const kstd::AnalyticsLifetime analytics;

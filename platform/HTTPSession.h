@@ -49,6 +49,8 @@ struct AuthenticationChallenge {
     int previousFailureCount = 0;
     /// With kServerTrustMethod only; lasts until the completion is called.
     ServerTrust* trust = nullptr;
+    /// The host of the link, as a certificate must name it.
+    std::string host = {};
 };
 
 enum class ChallengeDisposition {

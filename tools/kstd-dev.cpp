@@ -4,6 +4,7 @@
 #include "KSTLib/Platform.h"
 #include "kstd/Analytics/AnalyticsLifetime.h"
 #include "kstd/Daemon.h"
+#include "kstd/MessageIds.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"
 
@@ -16,6 +17,8 @@
 #include <filesystem>
 #include <iostream>
 #include <string>
+#include <utility>
+#include <vector>
 
 namespace {
 
@@ -26,6 +29,22 @@ struct Options {
     int slowSeconds = 0;
     long slowestSpeed = 0;
 };
+
+/// The HTTPS client, which lies beside this program, with what it is to be told.
+std::vector<std::string> httpsClient(const Options& options) {
+    const auto directory = std::filesystem::read_symlink("/proc/self/exe").parent_path();
+    std::vector<std::string> words = {(directory / "kstd-https").string()};
+    if (!options.trustAnchors.empty()) {
+        words.insert(words.end(), {"--trust-anchors", options.trustAnchors});
+    }
+    if (options.slowSeconds > 0) {
+        words.insert(words.end(), {"--slow-limit", std::to_string(options.slowSeconds)});
+    }
+    if (options.slowestSpeed > 0) {
+        words.insert(words.end(), {"--slowest-speed", std::to_string(options.slowestSpeed)});
+    }
+    return words;
+}
 
 /// What the package makes on a real system.
 void makeDirectories(const platform::Paths& paths) {
@@ -47,7 +66,9 @@ base::FileDescriptor eventSocket(const platform::Paths& paths) {
 int runDaemon(const Options& options) {
     const platform::Paths paths(options.root);
     makeDirectories(paths);
-    platform::LinuxHostOptions hostOptions{.paths = paths, .eventSocket = eventSocket(paths)};
+    platform::LinuxHostOptions hostOptions{.paths = paths,
+                                           .eventSocket = eventSocket(paths),
+                                           .messageClasses = kstd::messageClasses()};
     if (!hostOptions.eventSocket.isOpen()) {
         std::cerr << "kstd-dev: cannot make the event socket " << paths.eventSocket() << '\n';
         return 1;
@@ -55,15 +76,7 @@ int runDaemon(const Options& options) {
     if (options.idleMilliseconds > 0) {
         hostOptions.idleTime = std::chrono::milliseconds(options.idleMilliseconds);
     }
-    if (!options.trustAnchors.empty()) {
-        hostOptions.https.trustAnchors = options.trustAnchors;
-    }
-    if (options.slowSeconds > 0) {
-        hostOptions.https.slowLimit = std::chrono::seconds(options.slowSeconds);
-    }
-    if (options.slowestSpeed > 0) {
-        hostOptions.https.slowestSpeed = options.slowestSpeed;
-    }
+    hostOptions.https.program = httpsClient(options);
     platform::LinuxHost host(std::move(hostOptions));
     const platform::Host interfaces = host.interfaces();
     kst::installPlatform({interfaces.log, interfaces.registry, interfaces.channel});

@@ -24,6 +24,9 @@ inline constexpr char kNotifydMatchingStream[] = "com.zerva.notifyd.matching";
 inline constexpr char kCorvidMatchingStream[] = "com.zerva.corvid.matching";
 inline constexpr char kAlarmStream[] = "com.zerva.alarm";
 
+/// The daemon's one alarm on that stream.
+inline constexpr char kAlarmName[] = "com.zerva.kstd.alarm";
+
 /// An event as it stands in a datagram; the views point into the datagram.
 struct EventDatagram {
     std::string_view stream;

@@ -2,18 +2,12 @@
 
 namespace kstd {
 
-namespace {
-
-constexpr char kDatabasePath[] = "/var/root/.usbrestrictedmode_analytics_v2.db";
-
-} // namespace
-
 std::shared_ptr<Analytics> Analytics::logger(const platform::Host& host) {
     return instanceOf<Analytics>(host);
 }
 
 std::optional<std::string> Analytics::databasePath() {
-    return kDatabasePath;
+    return kAnalyticsDatabasePath;
 }
 
 void Analytics::logPolicyEventWithAttributes(const platform::ValueMap& attributes) {

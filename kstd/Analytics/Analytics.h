@@ -4,6 +4,9 @@
 
 namespace kstd {
 
+/// Where the logger of the restricted-mode service keeps its events.
+inline constexpr char kAnalyticsDatabasePath[] = "/var/root/.usbrestrictedmode_analytics_v2.db";
+
 /// The logger of the restricted-mode service.
 class Analytics final : public KSTDAnalyticsLogger {
   public:

@@ -66,14 +66,10 @@ KSTDAnalyticsLogger::makeDocument(const platform::ValueMap& extraValues) {
                                "D?)"};
     }
     const double postTime = platform::millisecondsSince1970(host_.clock.now());
-    platform::ValueMap summary = extraValues;
-    summary.insert_or_assign("topic", fields.splunkTopicName
-                                          ? platform::Value(*fields.splunkTopicName)
-                                          : platform::Value());
-    summary.insert_or_assign("eventTime", postTime);
-    summary.insert_or_assign("eventType", "accumulatedPolicyStats");
-    addOSVersion(summary, host_.version);
-    return makeUploadDocument(host_, *fields.database, summary, postTime);
+    return makeUploadDocument(
+        host_.json, host_.propertyLists,
+        [this](const auto& visitor) { fields.database->visitEvents(visitor); },
+        uploadSummary(extraValues, fields.splunkTopicName, host_.version, postTime), postTime);
 }
 
 bool KSTDAnalyticsLogger::onQueuePostJSON(std::string_view JSON) {

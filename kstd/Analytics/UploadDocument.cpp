@@ -1,23 +1,32 @@
 #include "kstd/Analytics/UploadDocument.h"
 
-#include "kstd/Analytics/TQAnalyticsLoggerSQLiteStore.h"
-#include "platform/Host.h"
+#include "kstd/Analytics/KSTDAnalyticsLogger.h"
 #include "platform/JSON.h"
 #include "platform/PropertyLists.h"
 
 namespace kstd {
 
-platform::Result<base::TextBuffer> makeUploadDocument(const platform::Host& host,
-                                                      TQAnalyticsLoggerSQLiteStore& store,
-                                                      const platform::ValueMap& summary,
-                                                      double postTime) {
-    const auto text = host.json.makeText();
+platform::ValueMap uploadSummary(platform::ValueMap extraValues,
+                                 const std::optional<std::string>& topic,
+                                 platform::SystemVersion& version, double postTime) {
+    platform::ValueMap summary = std::move(extraValues);
+    summary.insert_or_assign("topic", topic ? platform::Value(*topic) : platform::Value());
+    summary.insert_or_assign("eventTime", postTime);
+    summary.insert_or_assign("eventType", "accumulatedPolicyStats");
+    KSTDAnalyticsLogger::addOSVersion(summary, version);
+    return summary;
+}
+
+platform::Result<base::TextBuffer>
+makeUploadDocument(platform::JSON& json, platform::PropertyLists& propertyLists,
+                   const StoredEvents& events, const platform::ValueMap& summary, double postTime) {
+    const auto text = json.makeText();
     text->beginMap();
     text->key("events");
     text->beginList();
-    store.visitEvents([&host, &text](const platform::Bytes& event) {
+    events([&propertyLists, &text](const platform::Bytes& event) {
         const auto before = text->mark();
-        if (!host.propertyLists.read(event, *text)) {
+        if (!propertyLists.read(event, *text)) {
             text->rewind(before);
         }
     });

@@ -25,8 +25,6 @@ constexpr char kOnKextTimerRestartedAnalyticsCollected[] =
 constexpr char kScheduleAlarm[] = "-[DeviceRestrictedModeService scheduleAlarm:]";
 constexpr char kUnscheduleAlarm[] = "-[DeviceRestrictedModeService unscheduleAlarm]";
 
-constexpr char kAlarmName[] = "com.zerva.kstd.alarm";
-
 constexpr std::int32_t kPolicyEventVersion = 3;
 constexpr std::int32_t kTimerRestartedEventVersion = 4;
 constexpr std::uint32_t kSecondsPerMinute = 60;
@@ -115,12 +113,12 @@ void DeviceRestrictedModeService::scheduleAlarm(double seconds) {
     const platform::Date date{base::saturatingMultiply(base::saturate<std::int64_t>(seconds),
                                                        platform::kNanosecondsPerSecond)};
     const platform::EventDictionary dictionary{{platform::kAlarmDateKey, date}};
-    host().alarms.set(wire::kAlarmStream, kAlarmName, &dictionary);
+    host().alarms.set(wire::kAlarmStream, wire::kAlarmName, &dictionary);
 }
 
 void DeviceRestrictedModeService::unscheduleAlarm() {
     logLine(host().log, kUnscheduleAlarm, "called, .");
-    host().alarms.set(wire::kAlarmStream, kAlarmName, nullptr);
+    host().alarms.set(wire::kAlarmStream, wire::kAlarmName, nullptr);
 }
 
 } // namespace kstd

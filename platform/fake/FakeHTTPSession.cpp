@@ -3,6 +3,8 @@
 #include "platform/shared/Challenges.h"
 #include "platform/shared/HTTPRequestCheck.h"
 
+#include <string>
+#include <string_view>
 #include <utility>
 
 namespace platform {
@@ -21,6 +23,13 @@ class FakeServerTrust final : public ServerTrust {
 
 bool isRaised(const std::optional<FakeHTTPChallenge>& challenge, const Link& link) {
     return challenge && (isSecure(link) || challenge->method != kServerTrustMethod);
+}
+
+std::string hostOf(const Link& link) {
+    constexpr std::string_view kBeforeHost = "://";
+    const std::string_view text(link.text);
+    const std::string_view place = text.substr(text.find(kBeforeHost) + kBeforeHost.size());
+    return std::string(place.substr(0, place.find_first_of(":/?#")));
 }
 
 } // namespace
@@ -59,7 +68,8 @@ void FakeHTTPSession::run(const HTTPRequest& request, const FakeHTTPSessions::Ta
 HTTPReply FakeHTTPSession::replyTo(const HTTPRequest& request,
                                    const FakeHTTPSessions::Taken& taken) {
     const FakeHTTPAnswer& answer = taken.answer;
-    if (request.link && isRaised(answer.challenge, *request.link) && !passes(*answer.challenge)) {
+    if (request.link && isRaised(answer.challenge, *request.link) &&
+        !passes(*answer.challenge, *request.link)) {
         return failedReply(kTrustRefused, "server not trusted");
     }
     if (answer.reply.response) {
@@ -71,11 +81,11 @@ HTTPReply FakeHTTPSession::replyTo(const HTTPRequest& request,
     return answer.reply;
 }
 
-bool FakeHTTPSession::passes(const FakeHTTPChallenge& challenge) const {
+bool FakeHTTPSession::passes(const FakeHTTPChallenge& challenge, const Link& link) const {
     FakeServerTrust trust(challenge.trust);
     const bool isTrust = challenge.method == kServerTrustMethod;
     switch (askDelegate(delegate_, {challenge.method, challenge.previousFailureCount,
-                                    isTrust ? &trust : nullptr})) {
+                                    isTrust ? &trust : nullptr, hostOf(link)})) {
     case ChallengeOutcome::accepted:
         return true;
     case ChallengeOutcome::refused:

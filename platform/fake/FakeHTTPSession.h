@@ -22,7 +22,7 @@ class FakeHTTPSession final : public HTTPSession {
              const HTTPCompletion& completion);
     [[nodiscard]] HTTPReply replyTo(const HTTPRequest& request,
                                     const FakeHTTPSessions::Taken& taken);
-    [[nodiscard]] bool passes(const FakeHTTPChallenge& challenge) const;
+    [[nodiscard]] bool passes(const FakeHTTPChallenge& challenge, const Link& link) const;
 
     FakeHTTPSessions& script_;
     std::map<std::string, std::string> headers_;

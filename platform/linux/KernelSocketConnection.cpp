@@ -1,16 +1,14 @@
 #include "platform/linux/KernelSocketConnection.h"
 
 #include "base/Concat.h"
-#include "base/UnixAddress.h"
+#include "platform/linux/LocalConnection.h"
 
 #include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstring>
 #include <sys/socket.h>
-#include <sys/time.h>
 #include <sys/uio.h>
-#include <unistd.h>
 #include <utility>
 
 namespace platform {
@@ -18,12 +16,6 @@ namespace platform {
 namespace {
 
 constexpr std::size_t kMaxParts = 4;
-
-timeval toTimeval(std::chrono::milliseconds time) {
-    const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(time);
-    const auto rest = std::chrono::duration_cast<std::chrono::microseconds>(time - seconds);
-    return {static_cast<time_t>(seconds.count()), static_cast<suseconds_t>(rest.count())};
-}
 
 /// What a timeout of the socket shows as.
 int asTimeout(int error) {
@@ -77,45 +69,18 @@ Status KernelSocketConnection::connect() {
 }
 
 Status KernelSocketConnection::openSocket() {
-    const auto address = base::UnixAddress::of(path_);
-    if (!address) {
-        return statusFromErrno(ENAMETOOLONG);
-    }
-    base::FileDescriptor socket(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
-    if (!socket.isOpen()) {
-        return statusFromErrno(errno);
-    }
-    const timeval timeout = toTimeval(timeout_);
-    ::setsockopt(socket.get(), SOL_SOCKET, SO_SNDTIMEO, &timeout, sizeof timeout);
-    ::setsockopt(socket.get(), SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof timeout);
-    int result = -1;
-    do {
-        result = ::connect(socket.get(), address->get(), address->size());
-    } while (result != 0 && errno == EINTR);
-    if (result != 0) {
-        return statusFromErrno(asTimeout(errno));
-    }
-    const Status trusted = checkPeer(socket.get());
-    if (trusted == kSuccess) {
-        socket_ = std::move(socket);
-    }
-    return trusted;
-}
-
-Status KernelSocketConnection::checkPeer(int socket) const {
-    ucred peer{};
-    socklen_t length = sizeof peer;
-    if (::getsockopt(socket, SOL_SOCKET, SO_PEERCRED, &peer, &length) != 0) {
-        return statusFromErrno(errno);
-    }
-    if (peer.uid == 0 || peer.uid == ::geteuid()) {
+    LocalConnection connection = connectLocally(path_, SOCK_SEQPACKET, timeout_);
+    if (connection.error == 0) {
+        socket_ = std::move(connection.socket);
         return kSuccess;
     }
-    log_.write(LogLevel::warning,
-               base::concat("kstd: KernelSocket: ", path_, " is served by user ", peer.uid,
-                            ", refused.\n"),
-               {});
-    return statusFromErrno(EPERM);
+    if (connection.stranger) {
+        log_.write(LogLevel::warning,
+                   base::concat("kstd: KernelSocket: ", path_, " is served by user ",
+                                *connection.stranger, ", refused.\n"),
+                   {});
+    }
+    return statusFromErrno(connection.error);
 }
 
 Status KernelSocketConnection::exchange(wire::KernelOperation operation, Parts body, Reply& reply) {

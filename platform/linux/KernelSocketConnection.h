@@ -70,7 +70,6 @@ class KernelSocketConnection {
 
   private:
     [[nodiscard]] Status openSocket();
-    [[nodiscard]] Status checkPeer(int socket) const;
     [[nodiscard]] Status send(wire::KernelOperation operation, Parts body);
     [[nodiscard]] Status receive(wire::KernelOperation operation, Reply& reply);
     [[nodiscard]] Status fail(int error);

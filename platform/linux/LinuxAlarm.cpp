@@ -5,19 +5,8 @@
 
 namespace platform {
 
-namespace {
-
-constexpr char kArmedLabel[] = "alarm armed";
-
-} // namespace
-
-LinuxAlarm::LinuxAlarm(LinuxEventStream& events, LinuxRunLoop& loop, AlarmStore store,
-                       ProcessTransactions& transactions)
-    : events_(events),
-      store_(std::move(store)),
-      transactions_(transactions),
-      source_(loop.addReadable(timer_.descriptor(), [this] { timerWoke(); })) {
-    source_->setEnabled(false);
+LinuxAlarm::LinuxAlarm(LinuxEventStream& events, AlarmStore store, AlarmWaker& waker)
+    : events_(events), store_(std::move(store)), waker_(waker) {
     events_.setHandlerObserver([this](std::string_view stream) { restore(stream); });
     events_.setDeliveryObserver([this](const Event& event) { delivered(event); });
 }
@@ -51,14 +40,14 @@ bool LinuxAlarm::arrived(std::string_view stream, std::string_view event,
     const Name name(stream, event);
     if (registrations_.take(name, {static_cast<std::int64_t>(date)})) {
         events_.post({name.first, name.second});
-        armForNext();
     }
+    woke();
     return true;
 }
 
-void LinuxAlarm::close() {
-    source_.reset();
-    armed_.reset();
+void LinuxAlarm::woke() {
+    knowsWhatIsArmed_ = false;
+    fireDueAndArm();
 }
 
 void LinuxAlarm::restore(std::string_view stream) {
@@ -78,34 +67,30 @@ void LinuxAlarm::delivered(const Event& event) {
     }
 }
 
-void LinuxAlarm::timerWoke() {
-    if (timer_.acknowledge() != RealTimeTimer::Wake::nothing) {
-        fireDueAndArm();
-    }
-}
-
 void LinuxAlarm::fireDueAndArm() {
-    for (const auto& [stream, event] : registrations_.takeDue(realTimeNow())) {
-        events_.post({stream, event});
-    }
-    armForNext();
+    do {
+        for (const auto& [stream, event] : registrations_.takeDue(realTimeNow())) {
+            events_.post({stream, event});
+        }
+    } while (!armForNext());
 }
 
-void LinuxAlarm::armForNext() {
-    if (!source_) {
-        return;
-    }
+/// False when the next alarm became due before it was armed.
+bool LinuxAlarm::armForNext() {
     const std::optional<Date> next = registrations_.next();
-    source_->setEnabled(next.has_value());
-    if (next) {
-        timer_.arm(*next);
-        if (!armed_) {
-            armed_.emplace(transactions_, kArmedLabel);
-        }
-    } else if (armed_) {
-        timer_.disarm();
-        armed_.reset();
+    if (knowsWhatIsArmed_ && armedFor_ == next) {
+        return true;
     }
+    knowsWhatIsArmed_ = false;
+    if (next && !waker_.arm(*next)) {
+        return false;
+    }
+    if (!next) {
+        waker_.disarm();
+    }
+    armedFor_ = next;
+    knowsWhatIsArmed_ = true;
+    return true;
 }
 
 } // namespace platform

@@ -1,15 +1,12 @@
 #pragma once
 
 #include "platform/EventStream.h"
-#include "platform/ProcessTransaction.h"
 #include "platform/linux/AlarmStore.h"
+#include "platform/linux/AlarmWaker.h"
 #include "platform/linux/LinuxEventStream.h"
-#include "platform/linux/LinuxRunLoop.h"
-#include "platform/linux/RealTimeTimer.h"
 #include "platform/shared/AlarmRegistrations.h"
 
 #include <cstdint>
-#include <memory>
 #include <optional>
 #include <set>
 #include <span>
@@ -19,28 +16,29 @@
 
 namespace platform {
 
-/// AlarmEvent with registrations on disk and a timer in the process.
+/// AlarmEvent with registrations on disk and something that wakes.
 ///
 /// A stream's registrations are read back when the stream gets its handler, or its first alarm:
-/// what became due while no process ran is then delivered at once. The timer cannot launch a
-/// process that is gone, so while an alarm is armed a transaction keeps this one from ending for
-/// being idle.
+/// what became due while no process ran is then delivered at once.
 class LinuxAlarm final : public AlarmEvent {
   public:
-    LinuxAlarm(LinuxEventStream& events, LinuxRunLoop& loop, AlarmStore store,
-               ProcessTransactions& transactions);
+    LinuxAlarm(LinuxEventStream& events, AlarmStore store, AlarmWaker& waker);
 
     void set(std::string_view stream, std::string_view event,
              const EventDictionary* dictionary) override;
 
     /// An alarm event that came in from outside the process, with the date it was fired for as its
     /// payload. One that is not for the present registration is dropped; false when the payload is
-    /// no date.
+    /// no date. Whatever it was for, what is registered is armed again: the timer that had the
+    /// event sent is gone.
     bool arrived(std::string_view stream, std::string_view event,
                  std::span<const std::uint8_t> payload);
 
-    /// Waits for no alarm any more; the registrations stay.
-    void close();
+    /// The waker woke this process: what is due fires, and the rest is armed again.
+    void woke();
+
+    /// This process is woken no more; the registrations stay.
+    void close() { waker_.close(); }
 
   private:
     using Name = AlarmRegistrations::Name;
@@ -48,19 +46,18 @@ class LinuxAlarm final : public AlarmEvent {
     void restore(std::string_view stream);
     void delivered(const Event& event);
     void cancel(const Name& name);
-    void timerWoke();
     void fireDueAndArm();
-    void armForNext();
+    [[nodiscard]] bool armForNext();
 
     LinuxEventStream& events_;
     AlarmStore store_;
-    ProcessTransactions& transactions_;
-    RealTimeTimer timer_;
-    std::unique_ptr<RunLoopSource> source_;
+    AlarmWaker& waker_;
     AlarmRegistrations registrations_;
     /// The streams whose registrations were read back.
     std::set<std::string, std::less<>> restored_;
-    std::optional<ProcessTransaction> armed_;
+    /// What the waker waits for, as far as this process knows.
+    std::optional<Date> armedFor_;
+    bool knowsWhatIsArmed_ = true;
 };
 
 } // namespace platform

@@ -8,7 +8,6 @@
 #include "platform/linux/LinuxConfigurationResource.h"
 #include "platform/linux/LinuxEventStream.h"
 #include "platform/linux/LinuxFiles.h"
-#include "platform/linux/LinuxHTTPSessions.h"
 #include "platform/linux/LinuxInternalDiagnostics.h"
 #include "platform/linux/LinuxKernelChannel.h"
 #include "platform/linux/LinuxManagedSettings.h"
@@ -19,7 +18,11 @@
 #include "platform/linux/LinuxSystemLog.h"
 #include "platform/linux/LinuxSystemVersion.h"
 #include "platform/linux/LinuxUserDefaults.h"
+#include "platform/linux/RemoteHTTPSessions.h"
 #include "platform/linux/SettingsWatch.h"
+#include "platform/linux/SystemdAlarmTimer.h"
+#include "platform/linux/SystemdAlarmWaker.h"
+#include "platform/linux/TimerAlarmWaker.h"
 #include "platform/shared/JSONCodec.h"
 #include "platform/shared/SerialQueueOfOne.h"
 
@@ -31,22 +34,38 @@
 
 namespace platform {
 
+namespace {
+
+RemoteHTTPOptions httpsOptions(const LinuxHostOptions& options) {
+    RemoteHTTPOptions https = options.https;
+    if (https.socket.empty()) {
+        https.socket = options.paths.httpsSocket();
+    }
+    return https;
+}
+
+} // namespace
+
 /// In the order of construction: what stands below uses what stands above, and goes before it.
 struct LinuxHost::Parts {
     explicit Parts(LinuxHostOptions options)
-        : log(options.paths),
+        : log(options.paths, options.messageClasses),
           files(options.paths),
           settings(options.paths, log),
           defaults(options.paths, propertyLists, log),
           resources(options.paths, propertyLists, log),
           version(options.paths),
           diagnostics(options.paths),
-          https(options.https),
+          https(httpsOptions(options)),
           registry(options.paths.kernelSocket(), log),
           channel(options.paths.kernelSocket(), registry, log),
           runLoop(log),
           events(runLoop, log),
-          alarm(events, runLoop, AlarmStore(options.paths.alarmDirectory(), log), transactions) {
+          timerWaker(runLoop, transactions, [this] { alarm.woke(); }),
+          alarmTimer(options.paths.systemBus()),
+          systemdWaker(alarmTimer, timerWaker, clock, log, SystemdAlarmWaker::machineHere()),
+          alarm(events, AlarmStore(options.paths.alarmDirectory(), log),
+                waker(options.paths.isSystemRoot())) {
         settingsWatch.emplace(options.paths.managedSettings(), runLoop, log, [this] {
             post(wire::kNotifydMatchingStream, kSettingsChangedEvent);
         });
@@ -63,6 +82,15 @@ struct LinuxHost::Parts {
                 runLoop, *options.idleTime, [this] { return events.busy() || transactions.busy(); },
                 [this] { closeStreams(); });
         }
+    }
+
+    /// A timer of the init system launches a daemon that has ended, if it is the init system that
+    /// does so.
+    AlarmWaker& waker(bool isSystemRoot) {
+        if (isSystemRoot && sd_booted() > 0) {
+            return systemdWaker;
+        }
+        return timerWaker;
     }
 
     void post(std::string_view stream, std::string_view name) {
@@ -101,12 +129,15 @@ struct LinuxHost::Parts {
     LinuxInternalDiagnostics diagnostics;
     JSONCodec json;
     SerialQueuesOfOne queues;
-    LinuxHTTPSessions https;
+    RemoteHTTPSessions https;
     LinuxServiceRegistry registry;
     LinuxKernelChannel channel;
     LinuxProcessTransactions transactions;
     LinuxRunLoop runLoop;
     LinuxEventStream events;
+    TimerAlarmWaker timerWaker;
+    SystemdAlarmTimer alarmTimer;
+    SystemdAlarmWaker systemdWaker;
     LinuxAlarm alarm;
     std::optional<SettingsWatch> settingsWatch;
     std::unique_ptr<EventSocket> eventSocket;

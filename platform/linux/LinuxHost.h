@@ -2,12 +2,14 @@
 
 #include "base/FileDescriptor.h"
 #include "platform/Host.h"
-#include "platform/linux/LinuxHTTPSessions.h"
+#include "platform/MessageClass.h"
 #include "platform/linux/Paths.h"
+#include "platform/linux/RemoteHTTPSessions.h"
 
 #include <chrono>
 #include <memory>
 #include <optional>
+#include <span>
 
 namespace platform {
 
@@ -19,7 +21,10 @@ struct LinuxHostOptions {
     base::FileDescriptor eventSocket{};
     /// How long the process stays idle before the host closes its streams; none is for ever.
     std::optional<std::chrono::milliseconds> idleTime = std::nullopt;
-    LinuxHTTPOptions https{};
+    /// The program's log lines that have an identifier in the journal; they outlive the host.
+    std::span<const MessageClass> messageClasses = {};
+    /// Where the HTTPS client is; with neither socket nor program, behind paths.httpsSocket().
+    RemoteHTTPOptions https{};
 };
 
 /// All interfaces of the platform on this machine, made and owned in one place.

@@ -2,6 +2,7 @@
 
 #include "base/Concat.h"
 #include "platform/shared/LogText.h"
+#include "platform/shared/MessageClasses.h"
 
 // The fields of the code's place are the caller's, not this file's.
 #define SD_JOURNAL_SUPPRESS_LOCATION
@@ -54,12 +55,16 @@ std::string boundedLine(std::string_view text) {
     return logLine(base::concat(text.substr(0, end), kEllipsis));
 }
 
-bool sendToJournal(LogLevel level, const std::string& line, const CodePlace& place) {
+bool sendToJournal(LogLevel level, const std::string& line, std::string_view messageId,
+                   const CodePlace& place) {
     std::vector<std::string> fields = {
         base::concat("MESSAGE=", line),
         base::concat("PRIORITY=", priorityOf(level)),
         base::concat("SYSLOG_IDENTIFIER=", kIdentifier),
     };
+    if (!messageId.empty()) {
+        fields.push_back(base::concat("MESSAGE_ID=", messageId));
+    }
     if (!place.file.empty()) {
         fields.push_back(base::concat("CODE_FILE=", place.file));
     }
@@ -95,13 +100,14 @@ void writeToStandardError(std::string line) {
 
 } // namespace
 
-LinuxSystemLog::LinuxSystemLog(const Paths& paths)
-    : journalSocket_(paths.isSystemRoot() ? paths.journalSocket() : std::string()) {}
+LinuxSystemLog::LinuxSystemLog(const Paths& paths, std::span<const MessageClass> classes)
+    : journalSocket_(paths.isSystemRoot() ? paths.journalSocket() : std::string()),
+      classes_(classes) {}
 
 void LinuxSystemLog::write(LogLevel level, std::string_view text, const CodePlace& place) {
     std::string line = boundedLine(text);
     const bool hasJournal = !journalSocket_.empty() && ::access(journalSocket_.c_str(), F_OK) == 0;
-    if (!hasJournal || !sendToJournal(level, line, place)) {
+    if (!hasJournal || !sendToJournal(level, line, messageIdOf(line, classes_), place)) {
         writeToStandardError(std::move(line));
     }
 }

@@ -1,9 +1,11 @@
 #pragma once
 
+#include "platform/MessageClass.h"
 #include "platform/SystemLog.h"
 #include "platform/linux/Paths.h"
 
 #include <cstddef>
+#include <span>
 #include <string>
 
 namespace platform {
@@ -17,7 +19,9 @@ namespace platform {
 /// another root than "/" every line goes to standard error.
 class LinuxSystemLog final : public SystemLog {
   public:
-    explicit LinuxSystemLog(const Paths& paths);
+    /// In the journal a line of one of the classes has that class's identifier. The classes must
+    /// outlive the log.
+    explicit LinuxSystemLog(const Paths& paths, std::span<const MessageClass> classes = {});
 
     void write(LogLevel level, std::string_view text, const CodePlace& place) override;
 
@@ -28,6 +32,7 @@ class LinuxSystemLog final : public SystemLog {
   private:
     /// Empty when there is no journal to write to.
     std::string journalSocket_;
+    std::span<const MessageClass> classes_;
 };
 
 } // namespace platform

@@ -18,12 +18,14 @@ class Paths {
     [[nodiscard]] bool isSystemRoot() const { return prefix_.empty(); }
 
     [[nodiscard]] std::string eventSocket() const { return under("/run/kstd/events.sock"); }
+    [[nodiscard]] std::string httpsSocket() const { return under("/run/kstd/https.sock"); }
     [[nodiscard]] std::string kernelSocket() const { return under("/run/keystrand/service.sock"); }
     [[nodiscard]] std::string managedSettingsDirectory() const { return under("/etc/kstd"); }
     [[nodiscard]] std::string managedSettings() const {
         return under("/etc/kstd/managed-settings.conf");
     }
     [[nodiscard]] std::string alarmDirectory() const { return under("/var/lib/kstd/alarms"); }
+    [[nodiscard]] std::string systemBus() const { return under("/run/dbus/system_bus_socket"); }
     [[nodiscard]] std::string journalSocket() const { return under("/run/systemd/journal/socket"); }
     [[nodiscard]] std::string stateDirectory() const { return under("/var/root"); }
     [[nodiscard]] std::string osRelease() const { return under("/etc/os-release"); }

@@ -1,10 +1,31 @@
 #include "platform/shared/RequestThreads.h"
 
+#include <csignal>
 #include <iterator>
 #include <system_error>
 #include <utility>
 
 namespace platform {
+
+namespace {
+
+/// Threads made while this lasts take no signals.
+class SignalsBlocked {
+  public:
+    SignalsBlocked() {
+        sigset_t all;
+        ::sigfillset(&all);
+        ::pthread_sigmask(SIG_SETMASK, &all, &before_);
+    }
+    SignalsBlocked(const SignalsBlocked&) = delete;
+    SignalsBlocked& operator=(const SignalsBlocked&) = delete;
+    ~SignalsBlocked() { ::pthread_sigmask(SIG_SETMASK, &before_, nullptr); }
+
+  private:
+    sigset_t before_{};
+};
+
+} // namespace
 
 RequestThreads::~RequestThreads() {
     // A request may start another one until it has ended.
@@ -25,6 +46,7 @@ bool RequestThreads::start(std::function<void()> work) {
     join(takeEnded());
     const std::lock_guard lock(mutex_);
     const auto request = requests_.emplace(requests_.end());
+    const SignalsBlocked blocked;
     try {
         request->thread = std::thread(
             [this, request, work = std::move(work)]() mutable { run(request, std::move(work)); });

@@ -7,8 +7,9 @@
 
 namespace platform {
 
-/// A thread for each request of a session. Those that have ended are joined when the next one
-/// starts. Any thread may start one, work of a request included.
+/// A thread for each request of a session, which takes no signals: those of the process are for its
+/// main thread, and that of a broken connection must not end it. Those that have ended are joined
+/// when the next one starts. Any thread may start one, work of a request included.
 class RequestThreads {
   public:
     RequestThreads() = default;

@@ -15,6 +15,7 @@ namespace fs = std::filesystem;
 
 /// Rooms by their folder; a folder inside a room may be one of its own.
 const std::vector<std::string> kRooms = {"platform/shared",
+                                         "platform/https",
                                          "platform/linux",
                                          "platform/fake",
                                          "platform",
@@ -27,6 +28,9 @@ const std::vector<std::string> kRooms = {"platform/shared",
                                          "kstd/DeviceRestrictedMode",
                                          "kstd",
                                          "keystrand-sim",
+                                         "kstd-https",
+                                         "kstd-notify",
+                                         "kstctl",
                                          "tools",
                                          "bench",
                                          "fuzz"};
@@ -36,6 +40,7 @@ const std::map<std::string, std::set<std::string>> kMayInclude = {
     {"wire", {"base"}},
     {"platform", {"base"}},
     {"platform/shared", {"platform", "base"}},
+    {"platform/https", {"platform", "platform/shared", "base"}},
     {"platform/linux", {"platform", "platform/shared", "wire", "base"}},
     {"platform/fake", {"platform", "platform/shared", "base"}},
     {"common", {"platform", "base"}},
@@ -48,6 +53,11 @@ const std::map<std::string, std::set<std::string>> kMayInclude = {
      {"kstd/Analytics", "kstd/DeviceRestrictedMode", "KSTLib", "common", "platform", "wire",
       "base"}},
     {"keystrand-sim", {"common", "wire", "base"}},
+    {"kstd-https", {"platform/https", "platform/shared", "platform", "wire", "base"}},
+    {"kstd-notify", {"platform", "platform/linux", "platform/shared", "wire", "base"}},
+    {"kstctl",
+     {"kstd/Analytics", "kstd/Analytics/SQLite", "kstd/DeviceRestrictedMode", "keystrand-sim",
+      "common", "platform", "platform/linux", "platform/shared", "wire", "base"}},
     {"tools",
      {"kstd/Analytics", "kstd", "KSTLib", "common", "platform", "platform/linux", "keystrand-sim",
       "wire", "base"}},
@@ -128,6 +138,9 @@ TEST(IncludeRulesTest, RulesRefuseWhatTheyShould) {
     EXPECT_FALSE(isAllowed({"kstd/Analytics/Upload.cpp", "KSTLib/Channel.h"}));
     EXPECT_FALSE(isAllowed({"kstd/Analytics/SQLite/Opening.cpp", "kstd/Analytics/Analytics.h"}));
     EXPECT_FALSE(isAllowed({"fuzz/fuzz_json.cpp", "platform/linux/Paths.h"}));
+    EXPECT_FALSE(isAllowed({"kstd/main.cpp", "platform/https/LinuxHTTPSessions.h"}));
+    EXPECT_FALSE(isAllowed({"platform/linux/LinuxHost.cpp", "platform/https/TrustCheck.h"}));
+    EXPECT_FALSE(isAllowed({"kstd-https/main.cpp", "platform/linux/Paths.h"}));
     EXPECT_TRUE(isAllowed({"kstd/main.cpp", "platform/linux/LinuxHost.h"}));
 }
 

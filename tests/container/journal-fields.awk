@@ -1,6 +1,6 @@
 # Reads journal entries in the export format and prints those that are not as the daemon writes them:
-# native ones with severity 6 and the place in the code that the text names as well, and lines of a
-# failing library call, which come by standard output.
+# native ones with severity 6 and the place in the code that the text names as well, those of the
+# platform, which name none, and lines of a failing library call, which come by standard output.
 
 BEGIN {
     RS = ""
@@ -13,6 +13,8 @@ function is_native(field, text, function_part) {
     text = field["MESSAGE"]
     if (text ~ /AssertMacros/)
         return ends_with(text, " file: " field["CODE_FILE"] ":" field["CODE_LINE"])
+    if (text ~ /^kstd: [A-Z][A-Za-z]*: /)
+        return !("CODE_FUNC" in field)
     function_part = ": " field["CODE_FUNC"] ": "
     return field["CODE_FUNC"] != "" && index(text, function_part) == index(text, ": ")
 }

@@ -140,6 +140,8 @@ TEST_P(HTTPSessionContract, DelegateDecides) {
     EXPECT_EQ(answers([&](const AuthenticationChallenge& challenge, const auto& completion) {
                   EXPECT_EQ(challenge.method, platform::kServerTrustMethod);
                   EXPECT_EQ(challenge.previousFailureCount, 0);
+                  EXPECT_NE(challenge.host, "");
+                  EXPECT_EQ(fixture().link().find(base::concat("://", challenge.host)), 5U);
                   results.push_back(challenge.trust->evaluate());
                   EXPECT_EQ(challenge.trust->evaluate(), results.back());
                   completion(ChallengeDisposition::useCredential,

@@ -30,6 +30,9 @@ using testing::UnorderedElementsAre;
 
 constexpr char kSocketPath[] = "/run/systemd/journal/socket";
 
+constexpr char kId[] = "0123456789abcdef0123456789abcdef";
+constexpr platform::MessageClass kClasses[] = {{kId, "kstd: a failure of "}};
+
 using Fields = std::multimap<std::string, std::string>;
 
 /// The fields of a native journal message: "NAME=value\n", or "NAME\n", the value's length in eight
@@ -119,7 +122,7 @@ class JournalTest : public testing::Test {
         if (!enterPrivateRun()) {
             ::_exit(1);
         }
-        LinuxSystemLog log{platform::Paths("/")};
+        LinuxSystemLog log(platform::Paths("/"), kClasses);
         if (journal != Journal::absent) {
             const int listener =
                 journal == Journal::listening ? socket_ : ::socket(AF_UNIX, SOCK_DGRAM, 0);
@@ -174,6 +177,18 @@ TEST_F(JournalTest, UnknownPlaceGivesNoFieldsOfIt) {
     ASSERT_EQ(messages_.size(), 1U);
     EXPECT_THAT(messages_[0], UnorderedElementsAre(Pair("MESSAGE", "text"), Pair("PRIORITY", "6"),
                                                    Pair("SYSLOG_IDENTIFIER", "kstd")));
+}
+
+TEST_F(JournalTest, LineOfAClassHasItsIdentifier) {
+    run(Journal::listening, [](LinuxSystemLog& log) {
+        log.write(LogLevel::error, "kstd: a failure of x\n", {});
+        log.write(LogLevel::error, "not kstd: a failure of x\n", {});
+    });
+    ASSERT_EQ(messages_.size(), 2U);
+    EXPECT_THAT(messages_[0], UnorderedElementsAre(Pair("MESSAGE", "kstd: a failure of x"),
+                                                   Pair("MESSAGE_ID", kId), Pair("PRIORITY", "3"),
+                                                   Pair("SYSLOG_IDENTIFIER", "kstd")));
+    EXPECT_EQ(messages_[1].count("MESSAGE_ID"), 0U);
 }
 
 TEST_F(JournalTest, EachLevelHasItsPriority) {

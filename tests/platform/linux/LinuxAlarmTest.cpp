@@ -3,6 +3,8 @@
 #include "platform/fake/FakeProcessTransactions.h"
 #include "platform/fake/FakeSystemLog.h"
 #include "platform/linux/RealTime.h"
+#include "platform/linux/TimerAlarmWaker.h"
+#include "tests/platform/linux/FakeAlarmWaker.h"
 #include "tests/support/TemporaryDirectory.h"
 
 #include <gmock/gmock.h>
@@ -27,7 +29,7 @@ constexpr std::int64_t kFarAway = 4'102'444'800'000'000'000;
 /// One process's alarms on a directory.
 struct AlarmProcess {
     explicit AlarmProcess(const std::string& directory)
-        : alarm(events, loop, AlarmStore(directory, log), transactions) {}
+        : alarm(events, AlarmStore(directory, log), waker) {}
 
     void subscribe() {
         events.setHandler("stream",
@@ -43,6 +45,9 @@ struct AlarmProcess {
     LinuxRunLoop loop{log};
     LinuxEventStream events{loop, log};
     FakeProcessTransactions transactions;
+    TimerAlarmWaker waker{loop, transactions, [this] {
+                              alarm.woke();
+                          }};
     LinuxAlarm alarm;
     std::vector<std::string> delivered;
 };
@@ -230,6 +235,95 @@ TEST_F(LinuxAlarmTest, AfterCloseRegistrationsAreStillKept) {
     process->set("a", kFarAway);
     EXPECT_THAT(registered(), ElementsAre(Pair("a", Date{kFarAway})));
     EXPECT_EQ(process->transactions.count(), 0U);
+}
+
+/// Alarms with a waker that only notes what it is asked for.
+class AlarmsWaker : public testing::Test {
+  protected:
+    using Calls = std::vector<std::string>;
+
+    void set(const std::string& event, std::int64_t date) {
+        const EventDictionary dictionary{{kAlarmDateKey, {date}}};
+        alarm.set("stream", event, &dictionary);
+    }
+    void cancel(const std::string& event) { alarm.set("stream", event, nullptr); }
+
+    /// What another process finds that has no alarm of its own.
+    [[nodiscard]] AlarmStore store() { return {directory.file("alarms"), log}; }
+
+    static std::string armed(std::int64_t date) { return "arm " + std::to_string(date); }
+
+    support::TemporaryDirectory directory;
+    FakeSystemLog log;
+    LinuxRunLoop loop{log};
+    LinuxEventStream events{loop, log};
+    FakeAlarmWaker waker;
+    LinuxAlarm alarm{events, store(), waker};
+};
+
+TEST_F(AlarmsWaker, IsArmedForTheEarliestOfTheAlarms) {
+    set("b", kFarAway);
+    set("a", kFarAway - 1);
+    set("c", kFarAway + 1);
+    cancel("a");
+    cancel("b");
+    cancel("c");
+    EXPECT_EQ(waker.takeCalls(), (Calls{armed(kFarAway), armed(kFarAway - 1), armed(kFarAway),
+                                        armed(kFarAway + 1), "disarm"}));
+}
+
+TEST_F(AlarmsWaker, IsLeftAloneWhileNothingIsRegistered) {
+    events.setHandler("stream", [](const Event&) {});
+    cancel("a");
+    cancel("a");
+    EXPECT_EQ(waker.takeCalls(), Calls{});
+}
+
+TEST_F(AlarmsWaker, IsArmedForWhatALaterProcessFinds) {
+    store().save("stream", "a", {kFarAway});
+    events.setHandler("stream", [](const Event&) {});
+    events.setHandler("other", [](const Event&) {});
+    EXPECT_EQ(waker.takeCalls(), Calls{armed(kFarAway)});
+}
+
+TEST_F(AlarmsWaker, IsArmedAgainWhenAnEventCameFromOutside) {
+    set("a", kFarAway);
+    waker.takeCalls();
+    const std::vector<std::uint8_t> anotherDate(8);
+    EXPECT_TRUE(alarm.arrived("stream", "a", anotherDate));
+    EXPECT_EQ(waker.takeCalls(), Calls{armed(kFarAway)});
+    cancel("a");
+    waker.takeCalls();
+    EXPECT_TRUE(alarm.arrived("stream", "a", anotherDate));
+    EXPECT_EQ(waker.takeCalls(), Calls{"disarm"});
+    EXPECT_FALSE(alarm.arrived("stream", "a", {}));
+    EXPECT_EQ(waker.takeCalls(), Calls{});
+}
+
+TEST_F(AlarmsWaker, IsArmedAgainWhenItWoke) {
+    set("a", kFarAway);
+    waker.takeCalls();
+    alarm.woke();
+    EXPECT_EQ(waker.takeCalls(), Calls{armed(kFarAway)});
+}
+
+TEST_F(AlarmsWaker, MayFindThatTheDateHasPassed) {
+    events.setHandler("stream", [](const Event&) {});
+    waker.whileArming = [](Date date) {
+        while (realTimeNow() < date) {
+        }
+        return false;
+    };
+    // Long enough for a slow disk, on which the alarm is put first.
+    const std::int64_t date = realTimeNow().nanosecondsSince1970 + 300 * kMillisecond;
+    set("a", date);
+    EXPECT_TRUE(events.holds("stream", "a"));
+    EXPECT_EQ(waker.takeCalls(), (Calls{armed(date), "disarm"}));
+}
+
+TEST_F(AlarmsWaker, IsClosedWithTheAlarms) {
+    alarm.close();
+    EXPECT_EQ(waker.takeCalls(), Calls{"close"});
 }
 
 } // namespace

@@ -1,0 +1,38 @@
+#pragma once
+
+#include "platform/MessageClass.h"
+
+#include <span>
+
+namespace kstd {
+
+/// The classes of the daemon's log lines that an operator can act on. Each is explained, under its
+/// identifier, in packaging/systemd/kstd.catalog; an identifier is never given to another class.
+namespace message {
+
+inline constexpr char kDaemonStarted[] = "7dccb63d23e541889ee00d6f0d3c5009";
+inline constexpr char kStateFileNotSaved[] = "008de38b32f5452cbba50c270c7106f4";
+inline constexpr char kStateFileNotLoaded[] = "a3b469b827d8490a8f1f5b04ba9ebb93";
+inline constexpr char kKernelServiceFailed[] = "a96313973bc847c795eaa660fcad1191";
+inline constexpr char kKernelServiceNotTrusted[] = "ceacf11f0178447fb0a68a202d9000cc";
+inline constexpr char kDatabaseNotOpened[] = "245c7ca10c564524bed71ee6eaa81dbf";
+inline constexpr char kDatabaseFailed[] = "941d4db2a65d4920b812057317207820";
+inline constexpr char kServerNotTrusted[] = "2762e2e224ee4b66941f41eb60d60d9e";
+inline constexpr char kUploadFailed[] = "d7130baf298243dfb29cb75a269e26ad";
+inline constexpr char kNoUploadAddress[] = "fcfde6f87b9144919cd8d41e19715807";
+inline constexpr char kForeignEvent[] = "7ebf560740f1454ba57e03547da24790";
+inline constexpr char kMalformedEvent[] = "cbf8f4177f25453fac858a45bda82558";
+inline constexpr char kNoEventSocket[] = "d51a48700d914fe2834a619ff49b188a";
+inline constexpr char kSettingsNotUsed[] = "1699858cf330423f849effe5cc5b3d83";
+inline constexpr char kSettingsNotWatched[] = "c440e14511aa4cbe9493c86b771de725";
+inline constexpr char kConfigurationNotUsed[] = "cbb56232475f452eaa4c55d725479c81";
+inline constexpr char kAlarmNotKept[] = "28956f503d6840c6b95823e4541c8c11";
+inline constexpr char kAlarmWithoutInitSystem[] = "105f14b0574c4d4ea79747e7cfe9333b";
+inline constexpr char kAlarmDoesNotWake[] = "285fb5ce60d749ddb2a777dc495019ae";
+
+} // namespace message
+
+/// All of them, for the host's log. A line is of the first class that fits.
+[[nodiscard]] std::span<const platform::MessageClass> messageClasses();
+
+} // namespace kstd

@@ -1,0 +1,63 @@
+#pragma once
+
+#include "platform/HTTPSession.h"
+#include "platform/linux/RemoteHTTPSessions.h"
+#include "wire/HTTPConnection.h"
+
+#include <cstddef>
+#include <map>
+#include <memory>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+
+namespace platform {
+
+/// What all requests of a session share.
+struct RemoteHTTPSettings {
+    std::map<std::string, std::string> headers;
+    std::weak_ptr<HTTPSessionDelegate> delegate;
+    RemoteHTTPOptions options;
+};
+
+/// A client asks about no more than so many challenges of one request.
+inline constexpr int kMaximumChallenges = 4;
+
+/// One request over a connection to the HTTPS client: gives it the request, and whatever it asks
+/// for, until it has answered. The request must have passed refusalOf. All three must outlast this.
+class RemoteHTTPExchange {
+  public:
+    RemoteHTTPExchange(wire::HTTPConnection& connection, const HTTPRequest& request,
+                       const RemoteHTTPSettings& settings);
+    RemoteHTTPExchange(const RemoteHTTPExchange&) = delete;
+    RemoteHTTPExchange& operator=(const RemoteHTTPExchange&) = delete;
+    ~RemoteHTTPExchange() = default;
+
+    /// Makes the request and waits for its end. Once.
+    [[nodiscard]] HTTPReply perform();
+
+  private:
+    using State = wire::HTTPConnectionState;
+
+    [[nodiscard]] std::optional<wire::HTTPMessageBytes> requestMessage() const;
+    /// The reply is there when it is over, unless the connection failed.
+    [[nodiscard]] State handle(const wire::HTTPMessage& message);
+    [[nodiscard]] State judge(std::span<const std::uint8_t> fields);
+    [[nodiscard]] State giveBody(std::span<const std::uint8_t> fields);
+    [[nodiscard]] State takeFailure(std::span<const std::uint8_t> fields);
+    [[nodiscard]] State takeResponse(std::span<const std::uint8_t> fields);
+    [[nodiscard]] State receiveBody(std::size_t size, std::string& body);
+    [[nodiscard]] HTTPReply replyFor(State state) const;
+
+    wire::HTTPConnection& connection_;
+    const HTTPRequest& request_;
+    const RemoteHTTPSettings& settings_;
+    bool hasDelegate_;
+    int challenges_ = 0;
+    /// What the client has not got yet.
+    std::string_view body_;
+    std::optional<HTTPReply> reply_;
+};
+
+} // namespace platform

@@ -1,0 +1,30 @@
+#include "platform/linux/RemoteHTTPSession.h"
+
+#include "platform/linux/HTTPSClient.h"
+#include "platform/shared/HTTPRequestCheck.h"
+
+namespace platform {
+
+namespace {
+
+HTTPReply replyTo(const HTTPRequest& request, const RemoteHTTPSettings& settings) {
+    if (auto refusal = refusalOf(request)) {
+        return *std::move(refusal);
+    }
+    Result<HTTPSClient> client = HTTPSClient::reach(settings.options);
+    if (!client) {
+        return {client.error(), std::nullopt, {}};
+    }
+    HTTPSClient reached = std::move(client).value();
+    return RemoteHTTPExchange(reached.connection(), request, settings).perform();
+}
+
+} // namespace
+
+void RemoteHTTPSession::start(const HTTPRequest& request, HTTPCompletion completion) {
+    if (!threads_.start([this, request, completion] { completion(replyTo(request, settings_)); })) {
+        completion(failedReply(kTransferFailed, "no thread for the request"));
+    }
+}
+
+} // namespace platform

@@ -1,0 +1,30 @@
+#pragma once
+
+#include "platform/linux/AlarmTimerUnit.h"
+
+#include <string>
+
+namespace platform {
+
+/// AlarmTimerUnit as systemd's transient unit kstd-alarm.timer, asked for over the system's message
+/// bus. It starts kstd-alarm.service, which is installed.
+///
+/// Each call makes a connection of its own, and waits a few seconds at the most for an answer, so
+/// that nothing is held while no alarm is set, and a bus that was restarted does no harm.
+class SystemdAlarmTimer final : public AlarmTimerUnit {
+  public:
+    /// `busSocket` is the file of the bus's socket.
+    explicit SystemdAlarmTimer(std::string busSocket) : busSocket_(std::move(busSocket)) {}
+
+    [[nodiscard]] Result<std::optional<Time>> elapses() override;
+    [[nodiscard]] std::optional<Error> start(Time time, Wakes wakes) override;
+    [[nodiscard]] std::optional<Error> stop() override;
+
+  private:
+    std::string busSocket_;
+};
+
+/// The time as systemd's calendar writes it.
+[[nodiscard]] std::string calendarText(AlarmTimerUnit::Time time);
+
+} // namespace platform

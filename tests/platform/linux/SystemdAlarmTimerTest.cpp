@@ -1,0 +1,55 @@
+#include "platform/linux/SystemdAlarmTimer.h"
+
+#include "base/FileDescriptor.h"
+#include "base/UnixAddress.h"
+#include "tests/support/TemporaryDirectory.h"
+
+#include <gtest/gtest.h>
+
+#include <cerrno>
+#include <string>
+#include <sys/socket.h>
+#include <utility>
+#include <vector>
+
+namespace platform {
+namespace {
+
+TEST(SystemdAlarmTimerTest, CalendarTextHasEveryMicrosecond) {
+    const std::vector<std::pair<AlarmTimerUnit::Time, std::string>> cases = {
+        {0, "1970-01-01 00:00:00.000000 UTC"},
+        {1, "1970-01-01 00:00:00.000001 UTC"},
+        {1'700'000'000'999'999, "2023-11-14 22:13:20.999999 UTC"},
+        {1'709'208'000'000'000, "2024-02-29 12:00:00.000000 UTC"},
+        {AlarmTimerUnit::kLatest, "2199-12-31 23:59:59.999999 UTC"},
+    };
+    for (const auto& [time, text] : cases) {
+        EXPECT_EQ(calendarText(time), text);
+    }
+}
+
+void expectEveryCallFails(SystemdAlarmTimer timer, const Error& error) {
+    const auto elapses = timer.elapses();
+    ASSERT_FALSE(elapses);
+    EXPECT_EQ(elapses.error(), error);
+    EXPECT_EQ(timer.start(1, AlarmTimerUnit::Wakes::nothing), error);
+    EXPECT_EQ(timer.stop(), error);
+}
+
+TEST(SystemdAlarmTimerTest, BusThatIsNotThereIsAnError) {
+    const support::TemporaryDirectory directory;
+    expectEveryCallFails(SystemdAlarmTimer(directory.file("bus")),
+                         {kSystemErrorDomain, ENOENT, "No such file or directory"});
+}
+
+TEST(SystemdAlarmTimerTest, BusThatDoesNotListenIsAnError) {
+    const support::TemporaryDirectory directory;
+    const base::FileDescriptor socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    const auto address = base::UnixAddress::of(directory.file("bus")).value();
+    ASSERT_EQ(::bind(socket.get(), address.get(), address.size()), 0);
+    expectEveryCallFails(SystemdAlarmTimer(directory.file("bus")),
+                         {kSystemErrorDomain, ECONNREFUSED, "Connection refused"});
+}
+
+} // namespace
+} // namespace platform
