@@ -1,0 +1,88 @@
+#include "kstctl/Alarms.h"
+
+#include "base/Concat.h"
+#include "kstctl/FileError.h"
+#include "kstctl/RecordingLog.h"
+#include "platform/linux/AlarmStore.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <filesystem>
+#include <tuple>
+#include <unistd.h>
+
+namespace kstctl {
+
+namespace {
+
+namespace fs = std::filesystem;
+
+/// The names in a directory. `error` becomes 0 also when there is no such directory.
+std::vector<std::string> namesIn(const std::string& directory, int& error) {
+    std::vector<std::string> names;
+    std::error_code code;
+    for (fs::directory_iterator entry(directory, code), end; !code && entry != end;
+         entry.increment(code)) {
+        names.push_back(entry->path().filename().string());
+    }
+    const bool isNone =
+        code == std::errc::no_such_file_or_directory || code == std::errc::not_a_directory;
+    error = isNone ? 0 : code.value();
+    return names;
+}
+
+/// An alarm whose file the caller may not read is not the same as one that nobody can.
+int errorOfReading(const std::string& directory, const std::vector<std::string>& files) {
+    for (const std::string& file : files) {
+        if (::access(base::concat(directory, '/', file).c_str(), R_OK) != 0 && isRefusal(errno)) {
+            return errno;
+        }
+    }
+    return 0;
+}
+
+bool speaksOf(const std::string& line, const std::string& path) {
+    return line.find(base::concat(path, '.')) != std::string::npos;
+}
+
+/// Appends the alarms of one stream, as the daemon's own code reads them.
+void append(std::vector<Alarm>& alarms, const std::string& directory, const std::string& stream) {
+    RecordingLog log;
+    for (const auto& [event, date] : platform::AlarmStore(directory, log).load(stream)) {
+        Alarm alarm{.stream = stream, .event = event, .date = date, .problem = {}};
+        const std::string path = base::concat(directory, '/', stream, '/', event);
+        for (const std::string& line : log.lines()) {
+            if (speaksOf(line, path)) {
+                alarm.problem = line;
+            }
+        }
+        alarms.push_back(std::move(alarm));
+    }
+}
+
+} // namespace
+
+platform::Result<std::vector<Alarm>> registeredAlarms(const platform::Paths& paths) {
+    const std::string directory = paths.alarmDirectory();
+    int error = 0;
+    const std::vector<std::string> streams = namesIn(directory, error);
+    if (error != 0) {
+        return fileError(directory, error);
+    }
+    std::vector<Alarm> alarms;
+    for (const std::string& stream : streams) {
+        const std::string path = base::concat(directory, '/', stream);
+        const std::vector<std::string> files = namesIn(path, error);
+        error = error == 0 ? errorOfReading(path, files) : error;
+        if (error != 0) {
+            return fileError(path, error);
+        }
+        append(alarms, directory, stream);
+    }
+    std::sort(alarms.begin(), alarms.end(), [](const Alarm& one, const Alarm& other) {
+        return std::tie(one.stream, one.event) < std::tie(other.stream, other.event);
+    });
+    return alarms;
+}
+
+} // namespace kstctl

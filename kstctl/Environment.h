@@ -1,0 +1,19 @@
+#pragma once
+
+#include "platform/linux/Paths.h"
+
+#include <chrono>
+
+namespace kstctl {
+
+class Output;
+
+/// What every command works with.
+struct Environment {
+    platform::Paths paths;
+    Output& output;
+    /// The longest wait for a database that is locked or a socket that is full.
+    std::chrono::milliseconds patience;
+};
+
+} // namespace kstctl

@@ -1,0 +1,28 @@
+#pragma once
+
+#include "base/FileDescriptor.h"
+#include "platform/Error.h"
+#include "platform/linux/Paths.h"
+
+#include <optional>
+#include <string>
+#include <sys/types.h>
+
+namespace kstctl {
+
+/// The event socket, and a connection to it over which nothing was sent.
+struct EventSocketFile {
+    std::string path;
+    bool isPresent = false;
+    uid_t owner = 0;
+    /// Permission bits.
+    unsigned mode = 0;
+    base::FileDescriptor connection{};
+    /// Why there is no connection. ExitStatus::missing: there is no such file, or nobody keeps the
+    /// socket open.
+    std::optional<platform::Error> problem{};
+
+    [[nodiscard]] static EventSocketFile look(const platform::Paths& paths);
+};
+
+} // namespace kstctl

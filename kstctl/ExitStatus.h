@@ -1,0 +1,38 @@
+#pragma once
+
+#include "platform/Error.h"
+
+#include <string>
+#include <utility>
+
+namespace kstctl {
+
+/// What the program ends with. The numbers are documented and stay.
+enum class ExitStatus : int {
+    success = 0,
+    /// Asked for and refused, or it did not work.
+    failed = 1,
+    /// The command line is wrong.
+    usage = 2,
+    /// The daemon, the simulator, a file or an event is not there.
+    missing = 3,
+    /// The caller may not read it.
+    unreadable = 4,
+    /// It is there and is not what it must be.
+    malformed = 5,
+};
+
+/// An error whose code is the status that the program ends with.
+inline constexpr char kCommandErrorDomain[] = "kstctl";
+
+[[nodiscard]] inline platform::Error failure(ExitStatus status, std::string message) {
+    return {kCommandErrorDomain, static_cast<int>(status), std::move(message)};
+}
+
+/// Any error of another domain is a plain failure.
+[[nodiscard]] inline ExitStatus statusOf(const platform::Error& error) {
+    return error.domain == kCommandErrorDomain ? static_cast<ExitStatus>(error.code)
+                                               : ExitStatus::failed;
+}
+
+} // namespace kstctl

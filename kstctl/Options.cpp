@@ -1,0 +1,137 @@
+#include "kstctl/Options.h"
+
+#include "kstctl/Output.h"
+#include "kstctl/decode/KindNames.h"
+
+#include <CLI/CLI.hpp>
+
+#include <cstdio>
+#include <limits>
+#include <memory>
+
+namespace kstctl {
+
+namespace {
+
+constexpr int kLongestPatience = 3'600'000;
+/// The end of the year 9999.
+constexpr double kLatestPostTime = 253'402'300'800'000.0;
+
+CLI::App* addCommand(CLI::App& parent, const char* name, const char* description) {
+    CLI::App* const command = parent.add_subcommand(name, description);
+    command->fallthrough();
+    return command;
+}
+
+/// Makes the command the one to run when it is given, with what its options have filled.
+template <typename Command>
+Command& chosenBy(CLI::App* app, Options& options) {
+    const auto command = std::make_shared<Command>();
+    app->final_callback([command, &options] { options.command = *command; });
+    return *command;
+}
+
+void addEvents(CLI::App& app, Options& options) {
+    CLI::App* const events = addCommand(app, "events", "The events that wait for upload");
+    events->require_subcommand(1);
+
+    CLI::App* const list = addCommand(*events, "list", "A table of them");
+    auto& listing = chosenBy<EventsListCommand>(list, options);
+    list->add_option("--limit", listing.limit, "Only the last so many")
+        ->check(CLI::Range(std::int64_t{0}, std::numeric_limits<std::int64_t>::max()));
+    list->add_option("--type", listing.type, "Only those of this type");
+
+    CLI::App* const show = addCommand(*events, "show", "One of them");
+    show->add_option("id", chosenBy<EventsShowCommand>(show, options).id, "Its number")->required();
+
+    CLI::App* const exporting = addCommand(*events, "export", "All of them, for other programs");
+    exporting->add_option("--output", chosenBy<EventsExportCommand>(exporting, options).output,
+                          "A file that is not there yet");
+}
+
+void addUpload(CLI::App& app, Options& options) {
+    CLI::App* const upload = addCommand(app, "upload", "The document of an upload");
+    auto& command = chosenBy<UploadCommand>(upload, options);
+    upload->add_flag("--dry-run", command.isDryRun, "Print it; nothing is sent or changed")
+        ->required();
+    upload
+        ->add_option("--post-time", command.postTime,
+                     "As if it were sent then, in milliseconds since 1970")
+        ->check(CLI::Range(0.0, kLatestPostTime));
+}
+
+void addSend(CLI::App& app, Options& options) {
+    CLI::App* const send = addCommand(app, "send", "Send an event to the daemon");
+    auto& command = chosenBy<SendCommand>(send, options);
+    send->add_option("name", command.name,
+                     "settings, timer-restarted, analytics-collected, save-analytics, "
+                     "timer-restarted-analytics, alarm, or a whole name")
+        ->required();
+    send->add_option("--stream", command.stream, "notifyd, corvid, alarm, or a whole name");
+    CLI::Option* const payload =
+        send->add_option("--payload", command.payload, "The payload, in hexadecimal");
+    send->add_option("--date", command.date, "The payload is this date")->excludes(payload);
+    send->add_flag("--exact", command.isExact, "Send a name that is not known");
+}
+
+void addDecode(CLI::App& app, Options& options) {
+    CLI::App* const decode = addCommand(app, "decode", "Show bytes as named fields");
+    auto& command = chosenBy<DecodeCommand>(decode, options);
+    CLI::Option* const digits =
+        decode->add_option("hex", command.digits, "The bytes; standard input without them");
+    CLI::Option* const kind = decode->add_option("--kind", command.kind, "What they are")
+                                  ->check(CLI::IsMember(decode::kindNames()));
+    decode->add_option("--payload-of", command.payloadOf, "They are the payload of this command")
+        ->check(CLI::IsMember(decode::commandNames()))
+        ->excludes(kind);
+    decode->add_option("--file", command.file, "The bytes are in this file")->excludes(digits);
+    decode->add_flag("--hex", command.isHex, "The file or input holds hexadecimal digits");
+    decode->add_flag("--show-secrets", command.showSecrets, "Show passphrases");
+}
+
+void addSim(CLI::App& app, Options& options) {
+    CLI::App* const sim = addCommand(app, "sim", "Send a control command to keystrand-sim");
+    sim->add_option("words", chosenBy<SimCommand>(sim, options).words, "The command")->required();
+}
+
+/// Help and version go to standard output; everything else is a mistake.
+ExitStatus statusOfParseError(const CLI::App& app, const CLI::ParseError& problem) {
+    if (problem.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success)) {
+        app.exit(problem);
+        return std::fflush(stdout) == 0 ? ExitStatus::success : ExitStatus::failed;
+    }
+    Output::complain(problem.what());
+    return ExitStatus::usage;
+}
+
+} // namespace
+
+std::optional<Options> parseOptions(int argc, const char* const* argv, ExitStatus& status) {
+    Options options;
+    CLI::App app("Shows what kstd does and keeps, and drives it.", "kstctl");
+    app.set_version_flag("--version", "kstctl " KSTD_VERSION);
+    app.require_subcommand(1);
+    app.add_option("--root", options.root, "All paths lie under this directory")
+        ->capture_default_str();
+    app.add_flag("--json", options.isJSON, "Results as JSON");
+    int patience = static_cast<int>(options.patience.count());
+    app.add_option("--wait", patience, "Longest wait for a lock or a full socket, in milliseconds")
+        ->check(CLI::Range(0, kLongestPatience))
+        ->capture_default_str();
+    addCommand(app, "status", "The daemon, its files and what it will do next");
+    addEvents(app, options);
+    addUpload(app, options);
+    addSend(app, options);
+    addDecode(app, options);
+    addSim(app, options);
+    try {
+        app.parse(argc, argv);
+    } catch (const CLI::ParseError& problem) {
+        status = statusOfParseError(app, problem);
+        return std::nullopt;
+    }
+    options.patience = std::chrono::milliseconds(patience);
+    return options;
+}
+
+} // namespace kstctl

@@ -1,0 +1,68 @@
+#pragma once
+
+#include "platform/Error.h"
+
+#include <chrono>
+#include <memory>
+#include <optional>
+#include <sqlite3.h>
+#include <string>
+
+namespace kstctl {
+
+/// A connection that only reads. Codes are SQLite's, extended.
+class Connection {
+  public:
+    /// How the files beside the database are dealt with.
+    enum class Log {
+        /// As SQLite does, without making any. A log with no index beside it cannot be read.
+        used,
+        /// There is none, and nobody may write while the connection is open: nothing is locked.
+        ignored,
+    };
+
+    Connection(const std::string& path, Log log, std::chrono::milliseconds patience);
+
+    /// SQLITE_OK when the connection can be used.
+    [[nodiscard]] int code() const { return code_; }
+
+    [[nodiscard]] int execute(const char* SQL) const;
+
+    /// SQLite's own words for the last failure.
+    [[nodiscard]] std::string message() const;
+
+    [[nodiscard]] sqlite3* get() const { return db_.get(); }
+
+  private:
+    struct Closer {
+        void operator()(sqlite3* db) const { sqlite3_close_v2(db); }
+    };
+
+    std::unique_ptr<sqlite3, Closer> db_;
+    int code_ = SQLITE_CANTOPEN;
+};
+
+/// A statement that is run once. `code` is that of the last step, SQLITE_ROW while there is a row.
+class Query {
+  public:
+    Query(Connection& connection, const char* SQL);
+    /// With an integer in the place of its question mark.
+    Query(Connection& connection, const char* SQL, std::int64_t bound);
+
+    /// Whether there is a row.
+    [[nodiscard]] bool step();
+    [[nodiscard]] int code() const { return code_; }
+    /// Whether it ran to its end.
+    [[nodiscard]] bool isDone() const { return code_ == SQLITE_DONE; }
+    [[nodiscard]] sqlite3_stmt* row() const { return statement_.get(); }
+
+  private:
+    struct Finalizer {
+        void operator()(sqlite3_stmt* statement) const { sqlite3_finalize(statement); }
+    };
+
+    std::unique_ptr<sqlite3_stmt, Finalizer> statement_;
+    int code_ = SQLITE_ERROR;
+};
+
+} // namespace kstctl

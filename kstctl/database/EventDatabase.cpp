@@ -1,0 +1,169 @@
+#include "kstctl/database/EventDatabase.h"
+
+#include "base/Concat.h"
+#include "kstctl/ExitStatus.h"
+#include "kstctl/database/Connection.h"
+#include "kstctl/database/DatabaseFiles.h"
+
+#include <poll.h>
+#include <utility>
+
+namespace kstctl {
+
+namespace {
+
+/// How often the daemon may start or end between two looks before reading is given up.
+constexpr int kAttempts = 8;
+constexpr int kMillisecondsBetweenLooks = 5;
+
+constexpr int kPrimaryCodeMask = 0xff;
+
+ExitStatus statusOfCode(int code) {
+    switch (code & kPrimaryCodeMask) {
+    case SQLITE_NOTADB:
+    case SQLITE_CORRUPT:
+    case SQLITE_FORMAT:
+    case SQLITE_ERROR: // Of texts that are always the same: the tables are others.
+        return ExitStatus::malformed;
+    case SQLITE_PERM:
+    case SQLITE_AUTH:
+        return ExitStatus::unreadable;
+    default:
+        return ExitStatus::failed;
+    }
+}
+
+StoredEvent eventOf(sqlite3_stmt* row) {
+    StoredEvent event{.id = sqlite3_column_int64(row, 0), .added = {}, .data = {}};
+    if (const int type = sqlite3_column_type(row, 1);
+        type == SQLITE_FLOAT || type == SQLITE_INTEGER) {
+        event.added = sqlite3_column_double(row, 1);
+    }
+    if (sqlite3_column_type(row, 2) == SQLITE_BLOB) {
+        const auto* const bytes = static_cast<const std::uint8_t*>(sqlite3_column_blob(row, 2));
+        const auto size = static_cast<std::size_t>(sqlite3_column_bytes(row, 2));
+        event.data.emplace();
+        if (size > 0) {
+            event.data->assign(bytes, bytes + size);
+        }
+    }
+    return event;
+}
+
+/// Reads what is wanted through one connection. Each step gives SQLite's code when it fails.
+class Reader {
+  public:
+    Reader(Connection& connection, const EventQuery& query)
+        : connection_(connection), query_(query) {}
+
+    /// SQLITE_OK, SQLITE_EMPTY when it is another kind of database, or why it failed.
+    [[nodiscard]] int read(EventDatabase& database) {
+        if (const int code = connection_.execute("begin"); code != SQLITE_OK) {
+            return code;
+        }
+        int code = checkTables();
+        code = code == SQLITE_OK ? readNumbers(database) : code;
+        code = code == SQLITE_OK && query_.withEvents ? readEvents(database) : code;
+        return code;
+    }
+
+  private:
+    [[nodiscard]] int checkTables() {
+        Query tables(connection_, "select count(*) from sqlite_master where type = 'table' and "
+                                  "name in ('all_events', 'Properties')");
+        if (!tables.step()) {
+            return tables.code();
+        }
+        return sqlite3_column_int(tables.row(), 0) == 2 ? SQLITE_OK : SQLITE_EMPTY;
+    }
+
+    [[nodiscard]] int readNumbers(EventDatabase& database) {
+        Query count(connection_, "select count(*) from all_events");
+        if (!count.step()) {
+            return count.code();
+        }
+        database.count = static_cast<std::uint64_t>(sqlite3_column_int64(count.row(), 0));
+        Query date(connection_, "select value from Properties where key = 'upload_date'");
+        if (date.step()) {
+            const auto* const text = sqlite3_column_text(date.row(), 0);
+            if (text != nullptr) {
+                database.uploadDate = reinterpret_cast<const char*>(text);
+            }
+            return SQLITE_OK;
+        }
+        return date.isDone() ? SQLITE_OK : date.code();
+    }
+
+    [[nodiscard]] int readEvents(EventDatabase& database) {
+        Query events =
+            query_.id
+                ? Query(connection_, "select id, timestamp, data from all_events where id = ?",
+                        *query_.id)
+                : Query(connection_, "select id, timestamp, data from all_events order by id");
+        while (events.step()) {
+            database.events.push_back(eventOf(events.row()));
+        }
+        return events.isDone() ? SQLITE_OK : events.code();
+    }
+
+    Connection& connection_;
+    const EventQuery& query_;
+};
+
+/// The connection is closed when this returns.
+platform::Result<EventDatabase> readOnce(const std::string& path, Connection::Log log,
+                                         const EventQuery& query,
+                                         std::chrono::milliseconds patience) {
+    Connection connection(path, log, patience);
+    EventDatabase database;
+    const int code = connection.code() == SQLITE_OK ? Reader(connection, query).read(database)
+                                                    : connection.code();
+    if (code == SQLITE_OK) {
+        return database;
+    }
+    return code == SQLITE_EMPTY
+               ? failure(ExitStatus::malformed,
+                         base::concat(path, ": not a database of kstd's events"))
+               : failure(statusOfCode(code),
+                         base::concat(path, ": ", connection.message(), " (", code, ')'));
+}
+
+/// Whether what was read, or why it was not, may come from files that changed meanwhile.
+bool isDoubtful(bool isRead, const std::string& path, const DatabaseFiles& before) {
+    if (isRead && !before.isAtRest()) {
+        return false;
+    }
+    const auto now = DatabaseFiles::look(path);
+    return now && !now.value().isSameAs(before);
+}
+
+} // namespace
+
+platform::Result<EventDatabase> readEventDatabase(const std::string& path, const EventQuery& query,
+                                                  std::chrono::milliseconds patience) {
+    platform::Error reason =
+        failure(ExitStatus::failed, base::concat(path, ": changes faster than it can be read"));
+    for (int i = 0; i < kAttempts; ++i) {
+        const auto looked = DatabaseFiles::look(path);
+        if (!looked) {
+            return looked.error();
+        }
+        const DatabaseFiles& files = looked.value();
+        if (files.isLogFilled && !files.hasIndex) {
+            // A writer that ends leaves them like this for a moment.
+            reason.description = base::concat(path, ": there is a log beside it, and no index of "
+                                                    "that log; only who writes to it can read it");
+            ::poll(nullptr, 0, kMillisecondsBetweenLooks);
+            continue;
+        }
+        auto result =
+            readOnce(path, files.isAtRest() ? Connection::Log::ignored : Connection::Log::used,
+                     query, patience);
+        if (!isDoubtful(static_cast<bool>(result), path, files)) {
+            return result;
+        }
+    }
+    return reason;
+}
+
+} // namespace kstctl

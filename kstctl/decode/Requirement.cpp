@@ -1,0 +1,93 @@
+#include "base/Concat.h"
+#include "common/RequirementLayout.h"
+#include "common/RequirementProperties.h"
+#include "common/RequirementSerialization.h"
+#include "kstctl/decode/Decoders.h"
+#include "kstctl/decode/LibraryCall.h"
+
+#include <cstring>
+
+namespace kstctl::decode {
+
+namespace {
+
+/// How deep a tree is shown. Each level of a report is one of its writers' stack frames, too.
+constexpr std::size_t kMaxDepth = 100;
+
+const char* typeText(std::uint32_t type) {
+    switch (type) {
+    case kKSTRequirementTypePasscodeValidated:
+        return "passcode validated";
+    case kKSTRequirementTypePassphraseEntered:
+        return "passphrase entered";
+    case kKSTRequirementTypeBiometryMatched:
+        return "biometry matched";
+    case kKSTRequirementTypeAnd:
+        return "all of";
+    case kKSTRequirementTypeOr:
+        return "any of";
+    case kKSTRequirementTypeKofN:
+        return "k of n";
+    case kKSTRequirementTypeUserOutputDisplayed:
+        return "user output displayed";
+    default:
+        return "";
+    }
+}
+
+void addProperties(Report& report, const KSTRequirement& node) {
+    for (const kst::RequirementProperty& property : kst::requirementProperties()) {
+        if (property.type == kst::RequirementProperty::kEveryType || !property.belongsTo(&node) ||
+            !property.fitsIn(&node)) {
+            continue;
+        }
+        const Bytes bytes(property.in(&node), property.length);
+        std::uint32_t number = 0;
+        if (bytes.size() == sizeof number) {
+            std::memcpy(&number, bytes.data(), sizeof number);
+            report.add(base::concat("property", property.id), number);
+        } else {
+            report.add(base::concat("property", property.id), hexText(bytes));
+        }
+    }
+}
+
+Report fieldsAtDepth(const KSTRequirement& node, std::size_t depth) {
+    Report report;
+    report.add("type", node.type, typeText(node.type))
+        .add("state", node.state)
+        .add("priority", node.priority)
+        .add("dataLength", node.dataLength);
+    addProperties(report, node);
+    if (kst::findCompositeLayout(node.type) == nullptr) {
+        const auto* const data = reinterpret_cast<const std::uint8_t*>(&node) + sizeof node;
+        report.add("data", hexText({data, node.dataLength}));
+        return report;
+    }
+    if (depth == kMaxDepth) {
+        report.add("children", Report::Unknown{"too deep to be shown"});
+        return report;
+    }
+    Data children;
+    for (std::uint32_t i = 0; i < kst::childCount(&node); ++i) {
+        children.emplace_back(fieldsAtDepth(*kst::childAt(&node, i), depth + 1));
+    }
+    report.add("children", std::move(children));
+    return report;
+}
+
+} // namespace
+
+Result decodeRequirement(Bytes bytes, Secrets /*secrets*/) {
+    KSTRequirement* made = nullptr;
+    std::size_t size = 0;
+    if (auto refusal = refusalOf("a requirement", [&] {
+            return DeserializeRequirement(bytes.data(), bytes.size(), &made, &size);
+        })) {
+        return *std::move(refusal);
+    }
+    const Received<KSTRequirement> tree(made, DeallocRequirement);
+    return Decoded{fieldsAtDepth(*tree, 1), size};
+}
+
+} // namespace kstctl::decode

@@ -1,0 +1,32 @@
+#include "kstctl/status/Section.h"
+
+namespace kstctl {
+
+namespace {
+
+int badness(ExitStatus status) {
+    switch (status) {
+    case ExitStatus::missing:
+        return 4;
+    case ExitStatus::unreadable:
+        return 3;
+    case ExitStatus::malformed:
+        return 2;
+    case ExitStatus::failed:
+    case ExitStatus::usage:
+        return 1;
+    case ExitStatus::success:
+        return 0;
+    }
+    return 0;
+}
+
+} // namespace
+
+void Section::note(const platform::Error& fault) {
+    if (!worst || badness(statusOf(fault)) > badness(statusOf(*worst))) {
+        worst = fault;
+    }
+}
+
+} // namespace kstctl

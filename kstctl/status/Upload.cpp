@@ -1,0 +1,61 @@
+#include "kstctl/Environment.h"
+#include "kstctl/RecordingLog.h"
+#include "kstctl/status/Section.h"
+#include "kstctl/status/UploadConfiguration.h"
+#include "platform/linux/LinuxConfigurationResource.h"
+#include "platform/linux/LinuxPropertyLists.h"
+#include "platform/linux/LinuxUserDefaults.h"
+
+#include <algorithm>
+#include <optional>
+
+namespace kstctl {
+
+namespace {
+
+Report::Datum datumOf(const std::optional<std::string>& text) {
+    return text ? Report::Datum(*text) : Report::None();
+}
+
+Report::Datum datumOf(const std::optional<platform::Link>& link) {
+    return link ? Report::Datum(link->text) : Report::None();
+}
+
+} // namespace
+
+UploadConfiguration UploadConfiguration::read(const platform::Paths& paths) {
+    RecordingLog log;
+    platform::LinuxPropertyLists propertyLists;
+    platform::LinuxConfigurationResource resources(paths, propertyLists, log);
+    platform::LinuxUserDefaults defaults(paths, propertyLists, log);
+    UploadConfiguration configuration{
+        .analytics = kstd::AnalyticsConfiguration::read(resources, defaults), .remarks = {}};
+    for (const std::string& line : log.lines()) {
+        auto& remarks = configuration.remarks;
+        // The defaults are read anew for each setting.
+        if (std::find(remarks.begin(), remarks.end(), line) == remarks.end()) {
+            remarks.push_back(line);
+        }
+    }
+    return configuration;
+}
+
+Section uploadSection(const Environment& environment) {
+    const auto [analytics, remarks] = UploadConfiguration::read(environment.paths);
+    const bool isConfigured = analytics.splunkUploadURL || analytics.splunkBagURL;
+    Section section;
+    section.report
+        .add("isConfigured", isConfigured,
+             isConfigured ? "" : "no upload address: events stay, nothing is sent")
+        .add("uploadURL", datumOf(analytics.splunkUploadURL))
+        .add("bagURL", datumOf(analytics.splunkBagURL))
+        .add("topic", datumOf(analytics.splunkTopicName))
+        .add("allowInsecureCertificate", analytics.allowInsecureSplunkCert);
+    if (!remarks.empty()) {
+        section.report.add("problems", Data(remarks.begin(), remarks.end()));
+        section.note(failure(ExitStatus::malformed, remarks.front()));
+    }
+    return section;
+}
+
+} // namespace kstctl
