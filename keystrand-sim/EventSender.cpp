@@ -16,7 +16,7 @@ namespace sim {
 
 namespace {
 
-constexpr std::chrono::milliseconds kRetryDelay{200};
+constexpr std::chrono::milliseconds kResendDelay{200};
 
 /// Connected, because only a connected socket can be waited for until its peer has room.
 base::FileDescriptor connectTo(const std::string& path) {
@@ -133,7 +133,7 @@ void EventSender::waitForRoom() {
     if (fd_.isOpen()) {
         writable_.listenFor(EPOLLOUT);
     }
-    retry_.expireIn(kRetryDelay);
+    retry_.expireIn(kResendDelay);
 }
 
 } // namespace sim

@@ -134,7 +134,7 @@ ControlOutcome faultClear(ControlContext& context, ControlArguments& arguments) 
     return ControlOutcome::done();
 }
 
-constexpr std::array kCommands = {
+constexpr std::array kFaultCommands = {
     ControlCommand{"fault clear", "", faultClear},
     ControlCommand{"fault entry absent", "", faultEntry<false>},
     ControlCommand{"fault entry present", "", faultEntry<true>},
@@ -150,7 +150,7 @@ constexpr std::array kCommands = {
 } // namespace
 
 std::span<const ControlCommand> faultCommands() {
-    return kCommands;
+    return kFaultCommands;
 }
 
 } // namespace sim

@@ -7,7 +7,7 @@ namespace sim {
 namespace {
 
 template <typename Wanted, typename Actual>
-bool agrees(const std::optional<Wanted>& wanted, const Actual& actual) {
+bool covers(const std::optional<Wanted>& wanted, const Actual& actual) {
     return !wanted || *wanted == actual;
 }
 
@@ -29,8 +29,8 @@ void use(std::vector<Order>& orders, typename std::vector<Order>::iterator order
 } // namespace
 
 bool FaultMatch::matches(const RequestKind& request) const {
-    return agrees(operation, request.operation) && agrees(command, request.command) &&
-           agrees(control, request.control);
+    return covers(operation, request.operation) && covers(command, request.command) &&
+           covers(control, request.control);
 }
 
 bool FaultEffect::replacesHandling() const {

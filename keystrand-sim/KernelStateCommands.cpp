@@ -81,7 +81,7 @@ ControlOutcome logLevel(ControlContext& context, ControlArguments& arguments) {
     return ControlOutcome::done();
 }
 
-constexpr std::array kCommands = {
+constexpr std::array kKernelStateCommands = {
     ControlCommand{"property set", "NAME HEX|empty", propertySet},
     ControlCommand{"property get", "NAME", propertyGet},
     ControlCommand{"property remove", "NAME", propertyRemove},
@@ -93,7 +93,7 @@ constexpr std::array kCommands = {
 } // namespace
 
 std::span<const ControlCommand> kernelStateCommands() {
-    return kCommands;
+    return kKernelStateCommands;
 }
 
 } // namespace sim

@@ -93,7 +93,7 @@ ControlOutcome post(ControlContext& context, ControlArguments& arguments) {
     return ControlOutcome::done();
 }
 
-constexpr std::array kCommands = {
+constexpr std::array kPublishCommands = {
     ControlCommand{"publish timer-restarted", "[alarm=N] [version=N] [start=N] [locked=N]",
                    publishTimerRestarted},
     ControlCommand{"publish analytics-collected",
@@ -108,7 +108,7 @@ constexpr std::array kCommands = {
 } // namespace
 
 std::span<const ControlCommand> publishCommands() {
-    return kCommands;
+    return kPublishCommands;
 }
 
 } // namespace sim

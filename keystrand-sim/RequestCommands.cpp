@@ -103,7 +103,7 @@ ControlOutcome wait(ControlContext& /*context*/, ControlArguments& arguments) {
     return outcome;
 }
 
-constexpr std::array kCommands = {
+constexpr std::array kRequestCommands = {
     ControlCommand{"requests clear", "", clearRequests},
     ControlCommand{"requests", "[from=N] [limit=N]", listRequests},
     ControlCommand{"wait", "requests=N | acks=N | control=CODE count=N  [timeout=MS]", wait},
@@ -112,7 +112,7 @@ constexpr std::array kCommands = {
 } // namespace
 
 std::span<const ControlCommand> requestCommands() {
-    return kCommands;
+    return kRequestCommands;
 }
 
 } // namespace sim

@@ -10,7 +10,7 @@ namespace sim {
 
 namespace {
 
-constexpr std::string_view kBlanks = " \t\r\n";
+constexpr std::string_view kBlanksOrNewline = " \t\r\n";
 constexpr std::string_view kWordMarks = "._-";
 
 bool isWordCharacter(char c) {
@@ -34,7 +34,7 @@ void TextParser::skipBlanks() {
         std::size_t length = 1;
         if (rest_.front() == '#') {
             length = std::min(rest_.find('\n'), rest_.size());
-        } else if (kBlanks.find(rest_.front()) == std::string_view::npos) {
+        } else if (kBlanksOrNewline.find(rest_.front()) == std::string_view::npos) {
             return;
         } else if (rest_.front() == '\n') {
             ++line_;

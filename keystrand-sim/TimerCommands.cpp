@@ -117,7 +117,7 @@ ControlOutcome status(ControlContext& context, ControlArguments& arguments) {
     return outcome;
 }
 
-constexpr std::array kCommands = {
+constexpr std::array kTimerCommands = {
     ControlCommand{"status", "", status},
     ControlCommand{"lock", "", lock},
     ControlCommand{"unlock", "", unlock},
@@ -132,7 +132,7 @@ constexpr std::array kCommands = {
 } // namespace
 
 std::span<const ControlCommand> timerCommands() {
-    return kCommands;
+    return kTimerCommands;
 }
 
 } // namespace sim

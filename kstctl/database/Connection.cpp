@@ -12,12 +12,12 @@ namespace {
 
 /// The path as a link that SQLite takes; only what is plain stands for itself.
 std::string link(std::string_view path, Connection::Log log) {
-    constexpr std::string_view kPlain =
+    constexpr std::string_view kUnescaped =
         "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789/._-";
     constexpr char kDigits[] = "0123456789abcdef";
     std::string text = "file:";
     for (const char character : path) {
-        if (kPlain.find(character) != std::string_view::npos) {
+        if (kUnescaped.find(character) != std::string_view::npos) {
             text += character;
         } else {
             const auto byte = static_cast<unsigned char>(character);

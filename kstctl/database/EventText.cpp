@@ -12,7 +12,7 @@ namespace kstctl {
 namespace {
 
 constexpr char kEventType[] = "eventType";
-constexpr char kNoEvent[] = "no event in this row";
+constexpr char kNoEventReason[] = "no event in this row";
 
 Report reportOf(const platform::ValueMap& map) {
     Report report;
@@ -90,7 +90,7 @@ Report ReadableEvent::report() const {
     Report report;
     report.add("id", id).add("added", added ? Report::Datum(*added) : Report::None(), addedText());
     report.add("event", attributes ? Report::Datum(reportOf(*attributes))
-                                   : Report::Datum(Report::Unknown{kNoEvent}));
+                                   : Report::Datum(Report::Unknown{kNoEventReason}));
     return report;
 }
 

@@ -14,7 +14,7 @@ namespace {
 /// How deep a tree is shown. Each level of a report is one of its writers' stack frames, too.
 constexpr std::size_t kMaxDepth = 100;
 
-const char* typeText(std::uint32_t type) {
+const char* requirementTypeText(std::uint32_t type) {
     switch (type) {
     case kKSTRequirementTypePasscodeValidated:
         return "passcode validated";
@@ -54,7 +54,7 @@ void addProperties(Report& report, const KSTRequirement& node) {
 
 Report fieldsAtDepth(const KSTRequirement& node, std::size_t depth) {
     Report report;
-    report.add("type", node.type, typeText(node.type))
+    report.add("type", node.type, requirementTypeText(node.type))
         .add("state", node.state)
         .add("priority", node.priority)
         .add("dataLength", node.dataLength);

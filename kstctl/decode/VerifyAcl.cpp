@@ -11,7 +11,7 @@ namespace kstctl::decode {
 
 namespace {
 
-constexpr std::size_t kFixedSize = kKSTHandleSize + 4 + 1 + 4 + 4;
+constexpr std::size_t kFixedAclSize = kKSTHandleSize + 4 + 1 + 4 + 4;
 
 } // namespace
 
@@ -29,7 +29,8 @@ Result decodeVerifyAclConstraint(Bytes bytes, Secrets /*secrets*/) {
         })) {
         return *std::move(refusal);
     }
-    Decoded decoded{.fields = {}, .size = kFixedSize + constraint.length + parameters.wireSize()};
+    Decoded decoded{.fields = {},
+                    .size = kFixedAclSize + constraint.length + parameters.wireSize()};
     decoded.fields.add("handle", hexText(handle.bytes))
         .add("constraint", hexText(constraint.bytes()))
         .add("preflight", preflight != 0)

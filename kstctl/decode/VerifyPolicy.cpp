@@ -12,7 +12,7 @@ namespace kstctl::decode {
 
 namespace {
 
-constexpr std::size_t kFixedSize = kKSTHandleSize + 1 + 1 + 4 + 4;
+constexpr std::size_t kFixedPolicySize = kKSTHandleSize + 1 + 1 + 4 + 4;
 
 } // namespace
 
@@ -30,7 +30,7 @@ Result decodeVerifyPolicy(Bytes bytes, Secrets /*secrets*/) {
     }
     const std::size_t length = std::string_view(made).size();
     const Received<char> policy(made, [length](char* text) { DeallocDataBlob(text, length + 1); });
-    Decoded decoded{.fields = {}, .size = kFixedSize + length + parameters.wireSize()};
+    Decoded decoded{.fields = {}, .size = kFixedPolicySize + length + parameters.wireSize()};
     decoded.fields.add("handle", hexText(handle.bytes))
         .add("policy", std::string_view(policy.get()))
         .add("preflight", preflight != 0)

@@ -6,15 +6,15 @@ namespace platform {
 
 namespace {
 
-constexpr std::string_view kBlanks = " \t\r";
+constexpr std::string_view kBlanksOrReturn = " \t\r";
 constexpr std::string_view kEscapedInDoubleQuotes = "$`\"\\";
 
 bool startsWithBlank(std::string_view text) {
-    return kBlanks.find(text.front()) != std::string_view::npos;
+    return kBlanksOrReturn.find(text.front()) != std::string_view::npos;
 }
 
 std::string_view withoutLeadingBlanks(std::string_view text) {
-    text.remove_prefix(std::min(text.find_first_not_of(kBlanks), text.size()));
+    text.remove_prefix(std::min(text.find_first_not_of(kBlanksOrReturn), text.size()));
     return text;
 }
 

@@ -10,13 +10,13 @@ namespace platform {
 
 namespace {
 
-constexpr std::int64_t kNanosecondsPerMicrosecond = 1000;
+constexpr std::int64_t kOneMicrosecondInNanoseconds = 1000;
 
 /// Rounded up, so that the alarm is due when the timer elapses.
 AlarmTimerUnit::Time timeOf(Date date) {
     const std::int64_t nanoseconds = std::max<std::int64_t>(date.nanosecondsSince1970, 0);
-    const AlarmTimerUnit::Time time = nanoseconds / kNanosecondsPerMicrosecond +
-                                      (nanoseconds % kNanosecondsPerMicrosecond == 0 ? 0 : 1);
+    const AlarmTimerUnit::Time time = nanoseconds / kOneMicrosecondInNanoseconds +
+                                      (nanoseconds % kOneMicrosecondInNanoseconds == 0 ? 0 : 1);
     return std::min(time, AlarmTimerUnit::kLatest);
 }
 
