@@ -103,7 +103,7 @@ std::optional<Error> SystemdBus::runJob(const char* method, const Arguments& arg
                          then(arguments(call)) &&
                          then(sd_bus_call(bus_, call, kPatienceMicroseconds, &error, &reply)) &&
                          then(sd_bus_message_read(reply, "o", &job));
-    const std::optional<Error> failed = isBegun ? awaitRemoval(job) : errorOf(result, error);
+    std::optional<Error> failed = isBegun ? awaitRemoval(job) : errorOf(result, error);
     sd_bus_error_free(&error);
     sd_bus_message_unref(reply);
     sd_bus_message_unref(call);
