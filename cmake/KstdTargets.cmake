@@ -52,18 +52,16 @@ function(kstd_unoptimised)
         COMPILE_OPTIONS "${options}" SKIP_PRECOMPILE_HEADERS ON)
 endfunction()
 
-# kstd_library(NAME SOURCES... [LINK targets...] [TOGETHER] [ALONE sources...]): a static library of the
-# tree. The sources of a library with TOGETHER are compiled as one where KSTD_TOGETHER is on, as it is in
-# ./test: their headers are read once, not fifty times. Their inner names must differ then; a source
-# whose names do not, or that has headers which do not go with others, is named under ALONE, too.
+# kstd_library(NAME SOURCES... [LINK targets...] [TOGETHER]): a static library of the tree. The sources of
+# a library with TOGETHER are compiled as one where KSTD_TOGETHER is on, as it is in ./test: their headers
+# are read once, not fifty times. Their inner names must differ then.
 function(kstd_library name)
-    cmake_parse_arguments(ARG "TOGETHER" "" "SOURCES;LINK;ALONE" ${ARGN})
+    cmake_parse_arguments(ARG "TOGETHER" "" "SOURCES;LINK" ${ARGN})
     add_library(${name} STATIC ${ARG_SOURCES})
     target_link_libraries(${name} PUBLIC kstd_options ${ARG_LINK})
     target_precompile_headers(${name} REUSE_FROM kstd_headers)
     if(ARG_TOGETHER AND KSTD_TOGETHER)
         set_target_properties(${name} PROPERTIES UNITY_BUILD ON UNITY_BUILD_BATCH_SIZE 0)
-        set_source_files_properties(${ARG_ALONE} PROPERTIES SKIP_UNITY_BUILD_INCLUSION ON)
     endif()
 endfunction()
 

@@ -110,14 +110,14 @@ class Reader {
     const EventQuery& query_;
 };
 
-/// The connection is closed when this returns.
+/// The connection is closed when this returns. `code` is SQLite's.
 platform::Result<EventDatabase> readOnce(const std::string& path, Connection::Log log,
                                          const EventQuery& query,
-                                         std::chrono::milliseconds patience) {
+                                         std::chrono::milliseconds patience, int& code) {
     Connection connection(path, log, patience);
     EventDatabase database;
-    const int code = connection.code() == SQLITE_OK ? Reader(connection, query).read(database)
-                                                    : connection.code();
+    code = connection.code() == SQLITE_OK ? Reader(connection, query).read(database)
+                                          : connection.code();
     if (code == SQLITE_OK) {
         return database;
     }
@@ -126,6 +126,13 @@ platform::Result<EventDatabase> readOnce(const std::string& path, Connection::Lo
                          base::concat(path, ": not a database of kstd's events"))
                : failure(statusOfCode(code),
                          base::concat(path, ": ", connection.message(), " (", code, ')'));
+}
+
+/// Whether the log or its index was there to be seen and was not there to be opened, as when one
+/// writer ends; another one that begins makes them look as before.
+bool haveVanished(int code, const DatabaseFiles& files) {
+    const int primary = code & kPrimaryCodeMask;
+    return !files.isAtRest() && (primary == SQLITE_CANTOPEN || primary == SQLITE_READONLY);
 }
 
 /// Whether what was read, or why it was not, may come from files that changed meanwhile.
@@ -156,9 +163,15 @@ platform::Result<EventDatabase> readEventDatabase(const std::string& path, const
             ::poll(nullptr, 0, kMillisecondsBetweenLooks);
             continue;
         }
+        int code = SQLITE_OK;
         auto result =
             readOnce(path, files.isAtRest() ? Connection::Log::ignored : Connection::Log::used,
-                     query, patience);
+                     query, patience, code);
+        if (haveVanished(code, files)) {
+            reason = result.error();
+            ::poll(nullptr, 0, kMillisecondsBetweenLooks);
+            continue;
+        }
         if (!isDoubtful(static_cast<bool>(result), path, files)) {
             return result;
         }
