@@ -1,10 +1,10 @@
+#include "KSTLib/Command.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
 #include "KSTLib/PolicyVerification.h"
+#include "KSTLib/ProcessAclSerialization.h"
 #include "common/Allocation.h"
 #include "common/BuiltPayload.h"
-#include "common/Command.h"
-#include "common/ProcessAclSerialization.h"
 #include "common/RequiredFunction.h"
 
 #include <cstring>

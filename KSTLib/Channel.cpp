@@ -1,9 +1,9 @@
 #include "KSTLib/Channel.h"
 
+#include "KSTLib/Command.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/Platform.h"
 #include "common/Allocation.h"
-#include "common/Command.h"
 #include "common/CommandHeader.h"
 
 #include <cstring>

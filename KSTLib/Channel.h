@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/Status.h"
+#include "KSTLib/Status.h"
 #include "platform/KernelChannel.h"
 
 #include <cstddef>

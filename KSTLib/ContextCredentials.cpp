@@ -1,10 +1,10 @@
 #include "KSTLib/ContextCredentials.h"
 
+#include "KSTLib/Command.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
 #include "KSTLib/TemporaryContext.h"
 #include "base/ByteReader.h"
-#include "common/Command.h"
 #include "common/CredentialCommands.h"
 #include "common/RequiredArguments.h"
 

@@ -1,11 +1,11 @@
 #ifndef KST_KSTLIB_CONTEXT_CREDENTIALS_H
 #define KST_KSTLIB_CONTEXT_CREDENTIALS_H
 
-#include "common/Context.h"
-#include "common/Credential.h"
-#include "common/Handle.h"
-#include "common/Public.h"
-#include "common/Status.h"
+#include "KSTLib/Context.h"
+#include "KSTLib/Credential.h"
+#include "KSTLib/Handle.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Status.h"
 
 #include <stdint.h>
 
@@ -19,7 +19,7 @@
  *  How the functions send, on which threads they may be called and what every one of them may
  *  return is told in KSTLib/KSTLib.h. kKSTErrorBadParameter stands for a null credential and for a
  *  context that is null without need, and nothing is sent; kKSTErrorOutOfMemory also for the
- *  payload. A credential that cannot be written (common/CredentialSerialization.h) is not sent. */
+ *  payload. A credential that cannot be written (KSTLib/CredentialSerialization.h) is not sent. */
 
 #ifdef __cplusplus
 extern "C" {

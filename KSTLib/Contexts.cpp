@@ -1,11 +1,11 @@
 #include "KSTLib/Contexts.h"
 
 #include "KSTLib/Channel.h"
+#include "KSTLib/Command.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
 #include "base/ByteReader.h"
 #include "common/Allocation.h"
-#include "common/Command.h"
 #include "common/ContextObject.h"
 #include "common/RequiredArguments.h"
 #include "common/RequiredFunction.h"

@@ -1,10 +1,10 @@
 #ifndef KST_KSTLIB_CONTEXTS_H
 #define KST_KSTLIB_CONTEXTS_H
 
-#include "common/Blocks.h"
-#include "common/Context.h"
-#include "common/Public.h"
-#include "common/Status.h"
+#include "KSTLib/Blocks.h"
+#include "KSTLib/Context.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Status.h"
 
 #include <stdbool.h>
 #include <stddef.h>

@@ -1,8 +1,8 @@
 #include "KSTLib/CredentialObjects.h"
 
+#include "KSTLib/LibCallCredential.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/ObjectArguments.h"
-#include "common/LibCallCredential.h"
 
 KSTStatus KSTCredentialCreate(std::uint32_t type, KSTCredential** credential) noexcept {
     kst::logCalled(__func__);

@@ -1,15 +1,15 @@
 #ifndef KST_KSTLIB_CREDENTIAL_OBJECTS_H
 #define KST_KSTLIB_CREDENTIAL_OBJECTS_H
 
-#include "common/Blocks.h"
-#include "common/Credential.h"
-#include "common/Public.h"
-#include "common/Status.h"
+#include "KSTLib/Blocks.h"
+#include "KSTLib/Credential.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Status.h"
 
 #include <stddef.h>
 #include <stdint.h>
 
-/** Credentials (common/Credential.h) in the caller's memory: made empty, filled property by
+/** Credentials (KSTLib/Credential.h) in the caller's memory: made empty, filled property by
  *  property, deleted when done. Nothing is sent; the kernel service need not be there. The
  *  functions run on the calling thread.
  *

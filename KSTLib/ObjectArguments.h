@@ -1,7 +1,7 @@
 #pragma once
 
+#include "KSTLib/Blocks.h"
 #include "KSTLib/LibraryLogging.h"
-#include "common/Blocks.h"
 #include "common/RequiredArguments.h"
 #include "common/RequiredFunction.h"
 

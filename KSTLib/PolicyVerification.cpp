@@ -2,11 +2,11 @@
 
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
+#include "KSTLib/RequirementSerialization.h"
 #include "KSTLib/TemporaryContext.h"
 #include "common/PolicyCommands.h"
 #include "common/RequiredArguments.h"
 #include "common/RequiredFunction.h"
-#include "common/RequirementSerialization.h"
 
 #include <limits>
 

@@ -1,12 +1,12 @@
 #ifndef KST_KSTLIB_POLICY_VERIFICATION_H
 #define KST_KSTLIB_POLICY_VERIFICATION_H
 
-#include "common/Blocks.h"
-#include "common/Context.h"
-#include "common/Parameter.h"
-#include "common/Public.h"
-#include "common/Requirement.h"
-#include "common/Status.h"
+#include "KSTLib/Blocks.h"
+#include "KSTLib/Context.h"
+#include "KSTLib/Parameter.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Requirement.h"
+#include "KSTLib/Status.h"
 
 #include <stdbool.h>
 #include <stddef.h>
@@ -18,7 +18,7 @@
  *
  *  `policyId` is a text of at most 128 bytes. `preflight` asks without using anything up.
  *  `maxGlobalCredentialAge` bounds the age of credentials of the global context in a unit that is
- *  the kernel service's. `parameters` are at most 10 (common/Parameter.h), or null with the count
+ *  the kernel service's. `parameters` are at most 10 (KSTLib/Parameter.h), or null with the count
  *  0. All of them stay the caller's.
  *
  *  A block is handed the answer and, while it runs, the requirement tree, which is freed after it;

@@ -1,8 +1,8 @@
 #include "KSTLib/RequirementObjects.h"
 
+#include "KSTLib/LibCallRequirement.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/ObjectArguments.h"
-#include "common/LibCallRequirement.h"
 #include "common/RequirementLayout.h"
 #include "common/RequirementProperties.h"
 

@@ -1,15 +1,15 @@
 #ifndef KST_KSTLIB_REQUIREMENT_OBJECTS_H
 #define KST_KSTLIB_REQUIREMENT_OBJECTS_H
 
-#include "common/Blocks.h"
-#include "common/Public.h"
-#include "common/Requirement.h"
-#include "common/Status.h"
+#include "KSTLib/Blocks.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Requirement.h"
+#include "KSTLib/Status.h"
 
 #include <stddef.h>
 #include <stdint.h>
 
-/** Reads one node of a tree of requirements (common/Requirement.h). Nothing is copied, changed or
+/** Reads one node of a tree of requirements (KSTLib/Requirement.h). Nothing is copied, changed or
  *  sent. The functions run on the calling thread.
  *
  *  Properties, with the lengths of their data in bytes:

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "common/Context.h"
-#include "common/Status.h"
+#include "KSTLib/Context.h"
+#include "KSTLib/Status.h"
 
 namespace kst {
 

@@ -2,12 +2,12 @@
 // when the time for each node grows: a walk that goes back over what it has done would take 100
 // times as long in the largest tree.
 
+#include "KSTLib/RequirementSerialization.h"
 #include "base/Concat.h"
 #include "bench/codec/Samples.h"
 #include "bench/support/Benchmark.h"
 #include "bench/support/Comparison.h"
 #include "bench/support/SmallStack.h"
-#include "common/RequirementSerialization.h"
 
 #include <algorithm>
 #include <array>

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/AllocatedBytes.h"
+#include "KSTLib/AllocatedBytes.h"
 
 #include <cstddef>
 #include <cstdint>

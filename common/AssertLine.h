@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/Status.h"
+#include "KSTLib/Status.h"
 #include "platform/SystemLog.h"
 
 #include <cstdint>

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/Command.h"
+#include "KSTLib/Command.h"
 
 #include <cstdint>
 

@@ -1,7 +1,7 @@
 #pragma once
 
+#include "KSTLib/LibCall.h"
 #include "common/AssertLine.h"
-#include "common/LibCall.h"
 
 #include <cstddef>
 #include <cstdint>

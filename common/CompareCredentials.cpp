@@ -1,4 +1,4 @@
-#include "common/CredentialSerialization.h"
+#include "KSTLib/CredentialSerialization.h"
 #include "common/CredentialTypes.h"
 #include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "common/Context.h"
-#include "common/Handle.h"
+#include "KSTLib/Context.h"
+#include "KSTLib/Handle.h"
 
 /// What a KSTContextRef points to: the handle and, in memory that came from KSTContextCreate, one
 /// byte more behind it, which nobody reads again.

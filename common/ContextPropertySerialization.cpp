@@ -1,4 +1,4 @@
-#include "common/ContextPropertySerialization.h"
+#include "KSTLib/ContextPropertySerialization.h"
 
 #include "common/HandleWire.h"
 #include "common/RequiredArguments.h"

@@ -1,6 +1,6 @@
-#include "common/CredentialCommandSerialization.h"
+#include "KSTLib/CredentialCommandSerialization.h"
 
-#include "common/CredentialSerialization.h"
+#include "KSTLib/CredentialSerialization.h"
 #include "common/HandleWire.h"
 #include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"

@@ -1,10 +1,10 @@
 #include "common/CredentialCommands.h"
 
+#include "KSTLib/Command.h"
+#include "KSTLib/CredentialCommandSerialization.h"
 #include "common/Allocation.h"
 #include "common/BuiltPayload.h"
-#include "common/Command.h"
 #include "common/ContextObject.h"
-#include "common/CredentialCommandSerialization.h"
 #include "common/HandleWire.h"
 
 namespace kst {

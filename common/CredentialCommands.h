@@ -1,9 +1,9 @@
 #pragma once
 
+#include "KSTLib/Context.h"
+#include "KSTLib/Credential.h"
+#include "KSTLib/Handle.h"
 #include "common/CommandSender.h"
-#include "common/Context.h"
-#include "common/Credential.h"
-#include "common/Handle.h"
 
 #include <cstddef>
 #include <cstdint>

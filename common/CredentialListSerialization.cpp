@@ -1,6 +1,6 @@
+#include "KSTLib/CredentialSerialization.h"
 #include "base/ByteReader.h"
 #include "common/Allocation.h"
-#include "common/CredentialSerialization.h"
 #include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
 

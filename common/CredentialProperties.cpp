@@ -1,6 +1,6 @@
 #include "common/CredentialProperties.h"
 
-#include "common/Credential.h"
+#include "KSTLib/Credential.h"
 
 #include <array>
 

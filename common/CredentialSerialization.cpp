@@ -1,4 +1,4 @@
-#include "common/CredentialSerialization.h"
+#include "KSTLib/CredentialSerialization.h"
 
 #include "base/ByteReader.h"
 #include "common/Allocation.h"

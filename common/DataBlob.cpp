@@ -1,4 +1,4 @@
-#include "common/DataBlob.h"
+#include "KSTLib/DataBlob.h"
 
 #include "common/Allocation.h"
 

@@ -1,8 +1,8 @@
 #pragma once
 
+#include "KSTLib/Handle.h"
 #include "base/ByteReader.h"
 #include "base/ByteWriter.h"
-#include "common/Handle.h"
 
 namespace kst {
 

@@ -1,7 +1,7 @@
-#include "common/LibCall.h"
+#include "KSTLib/LibCall.h"
 
+#include "KSTLib/Command.h"
 #include "common/Allocation.h"
-#include "common/Command.h"
 #include "common/CommandHeader.h"
 #include "common/LibCallReport.h"
 #include "common/NumberedPayload.h"

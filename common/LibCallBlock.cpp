@@ -1,6 +1,6 @@
-#include "common/LibCallBlock.h"
+#include "KSTLib/LibCallBlock.h"
 
-#include "common/Command.h"
+#include "KSTLib/Command.h"
 #include "common/LibCallReport.h"
 #include "common/NumberedPayload.h"
 #include "common/RequiredFunction.h"

@@ -1,6 +1,6 @@
-#include "common/LibCallContext.h"
+#include "KSTLib/LibCallContext.h"
 
-#include "common/Command.h"
+#include "KSTLib/Command.h"
 #include "common/ContextObject.h"
 #include "common/CredentialCommands.h"
 #include "common/LibCallReport.h"

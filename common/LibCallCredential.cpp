@@ -1,8 +1,8 @@
-#include "common/LibCallCredential.h"
+#include "KSTLib/LibCallCredential.h"
 
+#include "KSTLib/CredentialSerialization.h"
 #include "common/Allocation.h"
 #include "common/CredentialProperties.h"
-#include "common/CredentialSerialization.h"
 #include "common/CredentialTypes.h"
 #include "common/LibCallReport.h"
 #include "common/RequiredArguments.h"

@@ -1,8 +1,8 @@
 #pragma once
 
+#include "KSTLib/Status.h"
 #include "common/AssertLine.h"
 #include "common/LibraryLog.h"
-#include "common/Status.h"
 
 /// How the LibCall functions report failures.
 namespace kst {

@@ -1,10 +1,10 @@
-#include "common/LibCallRequirement.h"
+#include "KSTLib/LibCallRequirement.h"
 
+#include "KSTLib/RequirementSerialization.h"
 #include "common/LibCallReport.h"
 #include "common/RequiredArguments.h"
 #include "common/RequiredFunction.h"
 #include "common/RequirementProperties.h"
-#include "common/RequirementSerialization.h"
 
 namespace {
 

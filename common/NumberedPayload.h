@@ -1,7 +1,7 @@
 #pragma once
 
+#include "KSTLib/Command.h"
 #include "common/AssertLine.h"
-#include "common/Command.h"
 #include "common/WipedBytes.h"
 
 #include <cstddef>

@@ -1,4 +1,4 @@
-#include "common/ParameterSerialization.h"
+#include "KSTLib/ParameterSerialization.h"
 
 #include "common/Allocation.h"
 #include "common/SerializationContext.h"

@@ -1,7 +1,7 @@
 #include "common/ParameterWire.h"
 
+#include "KSTLib/ParameterSerialization.h"
 #include "common/Allocation.h"
-#include "common/ParameterSerialization.h"
 #include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
 

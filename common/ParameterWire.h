@@ -1,9 +1,9 @@
 #pragma once
 
+#include "KSTLib/Parameter.h"
+#include "KSTLib/Status.h"
 #include "base/ByteReader.h"
 #include "base/ByteWriter.h"
-#include "common/Parameter.h"
-#include "common/Status.h"
 
 #include <cstdint>
 

@@ -1,12 +1,12 @@
 #pragma once
 
+#include "KSTLib/Handle.h"
+#include "KSTLib/Parameter.h"
+#include "KSTLib/Status.h"
 #include "base/ByteReader.h"
-#include "common/Handle.h"
-#include "common/Parameter.h"
 #include "common/ParameterWire.h"
 #include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
-#include "common/Status.h"
 
 #include <cstddef>
 #include <cstdint>

@@ -1,13 +1,13 @@
 #include "common/PolicyCommands.h"
 
+#include "KSTLib/Command.h"
+#include "KSTLib/RequirementSerialization.h"
+#include "KSTLib/VerifyAclSerialization.h"
+#include "KSTLib/VerifyPolicySerialization.h"
 #include "base/ByteReader.h"
 #include "common/Allocation.h"
 #include "common/BuiltPayload.h"
-#include "common/Command.h"
 #include "common/ContextObject.h"
-#include "common/RequirementSerialization.h"
-#include "common/VerifyAclSerialization.h"
-#include "common/VerifyPolicySerialization.h"
 
 namespace kst {
 

@@ -1,9 +1,9 @@
 #pragma once
 
+#include "KSTLib/Context.h"
+#include "KSTLib/Parameter.h"
+#include "KSTLib/Requirement.h"
 #include "common/CommandSender.h"
-#include "common/Context.h"
-#include "common/Parameter.h"
-#include "common/Requirement.h"
 
 #include <cstddef>
 #include <cstdint>

@@ -1,4 +1,4 @@
-#include "common/ProcessAclSerialization.h"
+#include "KSTLib/ProcessAclSerialization.h"
 
 #include "common/HandleWire.h"
 #include "common/ParameterWire.h"

@@ -1,7 +1,7 @@
 #pragma once
 
+#include "KSTLib/Status.h"
 #include "base/ByteReader.h"
-#include "common/Status.h"
 
 #include <cstddef>
 #include <cstdint>

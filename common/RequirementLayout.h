@@ -1,7 +1,7 @@
 #pragma once
 
+#include "KSTLib/Requirement.h"
 #include "common/AssertLine.h"
-#include "common/Requirement.h"
 
 #include <algorithm>
 #include <cstddef>

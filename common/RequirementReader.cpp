@@ -1,9 +1,9 @@
+#include "KSTLib/RequirementSerialization.h"
 #include "base/ByteReader.h"
 #include "common/Allocation.h"
 #include "common/LevelStack.h"
 #include "common/RequiredArguments.h"
 #include "common/RequirementLayout.h"
-#include "common/RequirementSerialization.h"
 #include "common/SerializationContext.h"
 
 #include <limits>

@@ -1,6 +1,6 @@
+#include "KSTLib/RequirementSerialization.h"
 #include "common/Allocation.h"
 #include "common/RequirementLayout.h"
-#include "common/RequirementSerialization.h"
 
 namespace {
 

@@ -1,4 +1,4 @@
-#include "common/RequirementSerialization.h"
+#include "KSTLib/RequirementSerialization.h"
 
 #include "base/ByteWriter.h"
 #include "common/LevelStack.h"

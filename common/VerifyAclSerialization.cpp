@@ -1,4 +1,4 @@
-#include "common/VerifyAclSerialization.h"
+#include "KSTLib/VerifyAclSerialization.h"
 
 #include "common/HandleWire.h"
 #include "common/ParameterWire.h"

@@ -1,4 +1,4 @@
-#include "common/VerifyPolicySerialization.h"
+#include "KSTLib/VerifyPolicySerialization.h"
 
 #include "common/HandleWire.h"
 #include "common/ParameterWire.h"

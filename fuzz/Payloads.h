@@ -1,8 +1,8 @@
 #pragma once
 
-#include "common/AllocatedBytes.h"
+#include "KSTLib/AllocatedBytes.h"
+#include "KSTLib/Parameter.h"
 #include "common/Allocation.h"
-#include "common/Parameter.h"
 
 #include <algorithm>
 #include <cstdint>

@@ -1,9 +1,9 @@
 // Credentials from outside: what can be read comes back the same, can be copied, compared and
 // looked at, and nothing stays allocated.
 
-#include "common/AllocatedBytes.h"
-#include "common/CredentialSerialization.h"
-#include "common/LibCallCredential.h"
+#include "KSTLib/AllocatedBytes.h"
+#include "KSTLib/CredentialSerialization.h"
+#include "KSTLib/LibCallCredential.h"
 
 #include <cstdint>
 #include <cstdlib>

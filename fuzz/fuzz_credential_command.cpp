@@ -1,9 +1,9 @@
 // Payloads of the credential commands and of the context property from outside: what can be read
 // comes back the same, and nothing stays allocated.
 
-#include "common/ContextPropertySerialization.h"
-#include "common/CredentialCommandSerialization.h"
-#include "common/CredentialSerialization.h"
+#include "KSTLib/ContextPropertySerialization.h"
+#include "KSTLib/CredentialCommandSerialization.h"
+#include "KSTLib/CredentialSerialization.h"
 #include "fuzz/Payloads.h"
 
 namespace {

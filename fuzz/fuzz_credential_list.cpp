@@ -1,8 +1,8 @@
 // Lists of credentials from outside: what can be read comes back the same, and nothing stays
 // allocated.
 
-#include "common/AllocatedBytes.h"
-#include "common/CredentialSerialization.h"
+#include "KSTLib/AllocatedBytes.h"
+#include "KSTLib/CredentialSerialization.h"
 
 #include <cstdint>
 #include <cstdlib>

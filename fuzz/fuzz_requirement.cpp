@@ -1,9 +1,9 @@
 // Trees of requirements from outside: what can be read can be walked, comes back the same after it
 // was written, and nothing stays allocated.
 
+#include "KSTLib/AllocatedBytes.h"
 #include "KSTLib/RequirementObjects.h"
-#include "common/AllocatedBytes.h"
-#include "common/RequirementSerialization.h"
+#include "KSTLib/RequirementSerialization.h"
 
 #include <cstdint>
 #include <cstdlib>

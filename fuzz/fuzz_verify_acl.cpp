@@ -1,9 +1,9 @@
 // Verify-ACL-constraint payloads from outside: what can be read comes back the same, and nothing
 // stays allocated.
 
-#include "common/DataBlob.h"
-#include "common/ParameterSerialization.h"
-#include "common/VerifyAclSerialization.h"
+#include "KSTLib/DataBlob.h"
+#include "KSTLib/ParameterSerialization.h"
+#include "KSTLib/VerifyAclSerialization.h"
 #include "fuzz/Payloads.h"
 
 namespace {

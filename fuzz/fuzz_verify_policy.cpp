@@ -1,9 +1,9 @@
 // Verify-policy payloads from outside: what can be read comes back the same, and nothing stays
 // allocated.
 
-#include "common/DataBlob.h"
-#include "common/ParameterSerialization.h"
-#include "common/VerifyPolicySerialization.h"
+#include "KSTLib/DataBlob.h"
+#include "KSTLib/ParameterSerialization.h"
+#include "KSTLib/VerifyPolicySerialization.h"
 #include "fuzz/Payloads.h"
 
 namespace {

@@ -1,6 +1,6 @@
+#include "KSTLib/Command.h"
+#include "KSTLib/ProcessAclSerialization.h"
 #include "base/ByteWriter.h"
-#include "common/Command.h"
-#include "common/ProcessAclSerialization.h"
 #include "keystrand-sim/Characteristics.h"
 #include "keystrand-sim/Commands.h"
 #include "keystrand-sim/Constraint.h"

@@ -1,6 +1,6 @@
 #include "keystrand-sim/Characteristics.h"
 
-#include "common/Credential.h"
+#include "KSTLib/Credential.h"
 
 #include <algorithm>
 

@@ -1,7 +1,7 @@
 #include "keystrand-sim/CommandFrame.h"
 
+#include "KSTLib/Command.h"
 #include "base/ByteReader.h"
-#include "common/Command.h"
 
 #include <string_view>
 

@@ -1,7 +1,7 @@
 #include "keystrand-sim/Commands.h"
 
+#include "KSTLib/Command.h"
 #include "base/ByteReader.h"
-#include "common/Command.h"
 
 #include <cassert>
 

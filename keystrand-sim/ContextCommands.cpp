@@ -1,5 +1,5 @@
-#include "common/Command.h"
-#include "common/ContextPropertySerialization.h"
+#include "KSTLib/Command.h"
+#include "KSTLib/ContextPropertySerialization.h"
 #include "keystrand-sim/Commands.h"
 #include "keystrand-sim/HandlePayload.h"
 

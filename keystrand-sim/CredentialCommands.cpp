@@ -1,5 +1,5 @@
-#include "common/Command.h"
-#include "common/CredentialCommandSerialization.h"
+#include "KSTLib/Command.h"
+#include "KSTLib/CredentialCommandSerialization.h"
 #include "common/CredentialTypes.h"
 #include "keystrand-sim/Commands.h"
 #include "keystrand-sim/HandlePayload.h"

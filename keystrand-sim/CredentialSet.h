@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/CredentialSerialization.h"
+#include "KSTLib/CredentialSerialization.h"
 
 #include <cstddef>
 #include <cstdint>

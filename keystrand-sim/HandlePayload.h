@@ -1,7 +1,7 @@
 #pragma once
 
+#include "KSTLib/Handle.h"
 #include "base/ByteReader.h"
-#include "common/Handle.h"
 
 #include <cassert>
 #include <cstdint>

@@ -1,7 +1,7 @@
 #include "keystrand-sim/LeafTypes.h"
 
-#include "common/Credential.h"
-#include "common/Requirement.h"
+#include "KSTLib/Credential.h"
+#include "KSTLib/Requirement.h"
 
 #include <algorithm>
 #include <array>

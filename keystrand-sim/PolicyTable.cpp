@@ -1,7 +1,7 @@
 #include "keystrand-sim/PolicyTable.h"
 
+#include "KSTLib/VerifyPolicySerialization.h"
 #include "base/Concat.h"
-#include "common/VerifyPolicySerialization.h"
 #include "keystrand-sim/RequirementParser.h"
 
 #include <fstream>

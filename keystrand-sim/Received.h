@@ -1,8 +1,8 @@
 #pragma once
 
-#include "common/DataBlob.h"
-#include "common/Parameter.h"
-#include "common/ParameterSerialization.h"
+#include "KSTLib/DataBlob.h"
+#include "KSTLib/Parameter.h"
+#include "KSTLib/ParameterSerialization.h"
 
 #include <cstddef>
 #include <cstdint>

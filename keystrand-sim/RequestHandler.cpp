@@ -1,7 +1,7 @@
 #include "keystrand-sim/RequestHandler.h"
 
+#include "KSTLib/Command.h"
 #include "base/ByteWriter.h"
-#include "common/Command.h"
 #include "keystrand-sim/CommandFrame.h"
 #include "keystrand-sim/Withholding.h"
 #include "wire/RestrictedMode.h"

@@ -1,7 +1,7 @@
 #include "keystrand-sim/RequirementParser.h"
 
+#include "KSTLib/Requirement.h"
 #include "base/Concat.h"
-#include "common/Requirement.h"
 #include "keystrand-sim/ControlArguments.h"
 
 #include <limits>

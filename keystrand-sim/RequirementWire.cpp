@@ -1,9 +1,9 @@
 #include "keystrand-sim/RequirementWire.h"
 
+#include "KSTLib/RequirementSerialization.h"
 #include "base/ByteWriter.h"
 #include "common/Allocation.h"
 #include "common/RequirementLayout.h"
-#include "common/RequirementSerialization.h"
 
 #include <cassert>
 #include <memory>

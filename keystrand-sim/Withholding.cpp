@@ -1,9 +1,9 @@
 #include "keystrand-sim/Withholding.h"
 
+#include "KSTLib/Command.h"
+#include "KSTLib/Handle.h"
 #include "base/ByteReader.h"
-#include "common/Command.h"
 #include "common/CredentialTypes.h"
-#include "common/Handle.h"
 
 #include <algorithm>
 

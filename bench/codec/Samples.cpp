@@ -1,7 +1,7 @@
 #include "bench/codec/Samples.h"
 
+#include "KSTLib/RequirementSerialization.h"
 #include "base/Concat.h"
-#include "common/RequirementSerialization.h"
 
 #include <cstring>
 #include <numeric>

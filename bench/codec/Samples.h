@@ -1,9 +1,9 @@
 #pragma once
 
-#include "common/Credential.h"
-#include "common/Handle.h"
-#include "common/Parameter.h"
-#include "common/Requirement.h"
+#include "KSTLib/Credential.h"
+#include "KSTLib/Handle.h"
+#include "KSTLib/Parameter.h"
+#include "KSTLib/Requirement.h"
 
 #include <cstdint>
 #include <memory>

@@ -1,4 +1,4 @@
-#include "common/ContextPropertySerialization.h"
+#include "KSTLib/ContextPropertySerialization.h"
 #include "kstctl/decode/Decoders.h"
 #include "kstctl/decode/LibraryCall.h"
 

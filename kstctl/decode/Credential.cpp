@@ -1,5 +1,5 @@
+#include "KSTLib/CredentialSerialization.h"
 #include "base/Concat.h"
-#include "common/CredentialSerialization.h"
 #include "common/CredentialTypes.h"
 #include "kstctl/decode/CredentialFields.h"
 #include "kstctl/decode/Decoders.h"

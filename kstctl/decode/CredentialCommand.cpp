@@ -1,5 +1,5 @@
-#include "common/CredentialCommandSerialization.h"
-#include "common/CredentialSerialization.h"
+#include "KSTLib/CredentialCommandSerialization.h"
+#include "KSTLib/CredentialSerialization.h"
 #include "common/CredentialTypes.h"
 #include "kstctl/decode/CredentialFields.h"
 #include "kstctl/decode/LibraryCall.h"

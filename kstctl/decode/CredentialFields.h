@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/Credential.h"
+#include "KSTLib/Credential.h"
 #include "kstctl/Report.h"
 #include "kstctl/decode/Decoded.h"
 

@@ -1,6 +1,6 @@
+#include "KSTLib/Command.h"
 #include "base/ByteReader.h"
 #include "base/Concat.h"
-#include "common/Command.h"
 #include "kstctl/decode/Decoders.h"
 #include "kstctl/decode/Payloads.h"
 

@@ -1,6 +1,6 @@
 #include "kstctl/decode/Kinds.h"
 
-#include "common/Command.h"
+#include "KSTLib/Command.h"
 #include "kstctl/decode/Decoders.h"
 #include "wire/EventDatagram.h"
 #include "wire/RestrictedMode.h"

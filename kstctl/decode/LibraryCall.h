@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/Status.h"
+#include "KSTLib/Status.h"
 #include "kstctl/decode/Decoded.h"
 
 #include <functional>

@@ -1,8 +1,8 @@
 // The payloads that are a number and bytes: environment variables and kernel control.
 
+#include "KSTLib/Command.h"
 #include "base/ByteReader.h"
 #include "base/Concat.h"
-#include "common/Command.h"
 #include "kstctl/decode/Payloads.h"
 #include "kstctl/decode/RecordFields.h"
 #include "wire/RestrictedMode.h"

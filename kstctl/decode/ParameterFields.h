@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/Parameter.h"
+#include "KSTLib/Parameter.h"
 #include "kstctl/Report.h"
 
 #include <cstddef>

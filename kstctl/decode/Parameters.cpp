@@ -1,5 +1,5 @@
+#include "KSTLib/ParameterSerialization.h"
 #include "base/ByteReader.h"
-#include "common/ParameterSerialization.h"
 #include "kstctl/decode/CredentialFields.h"
 #include "kstctl/decode/ParameterFields.h"
 

@@ -1,7 +1,7 @@
 #include "kstctl/decode/Payloads.h"
 
+#include "KSTLib/Command.h"
 #include "base/Concat.h"
-#include "common/Command.h"
 
 #include <algorithm>
 #include <iterator>

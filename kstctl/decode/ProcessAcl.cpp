@@ -1,6 +1,6 @@
+#include "KSTLib/Handle.h"
+#include "KSTLib/ProcessAclSerialization.h"
 #include "base/Saturate.h"
-#include "common/Handle.h"
-#include "common/ProcessAclSerialization.h"
 #include "kstctl/decode/AgeText.h"
 #include "kstctl/decode/LibraryCall.h"
 #include "kstctl/decode/ParameterFields.h"

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/DataBlob.h"
+#include "KSTLib/DataBlob.h"
 #include "kstctl/decode/Decoded.h"
 
 namespace kstctl::decode {

@@ -1,7 +1,7 @@
+#include "KSTLib/RequirementSerialization.h"
 #include "base/Concat.h"
 #include "common/RequirementLayout.h"
 #include "common/RequirementProperties.h"
-#include "common/RequirementSerialization.h"
 #include "kstctl/decode/Decoders.h"
 #include "kstctl/decode/LibraryCall.h"
 

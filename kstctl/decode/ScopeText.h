@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/Handle.h"
+#include "KSTLib/Handle.h"
 
 namespace kstctl::decode {
 

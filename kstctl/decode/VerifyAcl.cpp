@@ -1,6 +1,6 @@
+#include "KSTLib/Handle.h"
+#include "KSTLib/VerifyAclSerialization.h"
 #include "base/Saturate.h"
-#include "common/Handle.h"
-#include "common/VerifyAclSerialization.h"
 #include "kstctl/decode/AgeText.h"
 #include "kstctl/decode/LibraryCall.h"
 #include "kstctl/decode/ParameterFields.h"

@@ -1,4 +1,4 @@
-#include "common/LibCall.h"
+#include "KSTLib/LibCall.h"
 #include "tests/KSTLib/ChannelFixture.h"
 #include "tests/support/ScriptedGate.h"
 

@@ -4,6 +4,7 @@
 
 #include <filesystem>
 #include <fstream>
+#include <iterator>
 #include <map>
 #include <set>
 #include <string>
@@ -12,6 +13,9 @@
 namespace {
 
 namespace fs = std::filesystem;
+
+/// The library's public headers: a room of their own in the folder of the library.
+constexpr const char* kPublicHeaders = "KSTLib's public headers";
 
 /// Rooms by their folder; a folder inside a room may be one of its own.
 const std::vector<std::string> kRooms = {"platform/shared",
@@ -36,6 +40,7 @@ const std::vector<std::string> kRooms = {"platform/shared",
                                          "fuzz"};
 
 const std::map<std::string, std::set<std::string>> kMayInclude = {
+    {kPublicHeaders, {}},
     {"base", {}},
     {"wire", {"base"}},
     {"platform", {"base"}},
@@ -43,28 +48,28 @@ const std::map<std::string, std::set<std::string>> kMayInclude = {
     {"platform/https", {"platform", "platform/shared", "base"}},
     {"platform/linux", {"platform", "platform/shared", "wire", "base"}},
     {"platform/fake", {"platform", "platform/shared", "base"}},
-    {"common", {"platform", "base"}},
-    {"KSTLib", {"common", "platform", "base"}},
+    {"common", {kPublicHeaders, "platform", "base"}},
+    {"KSTLib", {kPublicHeaders, "common", "platform", "base"}},
     {"kstd/Analytics/SQLite", {"kstd", "common", "platform", "base"}},
     {"kstd/Analytics", {"kstd/Analytics/SQLite", "kstd", "common", "platform", "base"}},
     {"kstd/DeviceRestrictedMode",
-     {"kstd/Analytics", "kstd", "KSTLib", "common", "platform", "wire", "base"}},
+     {kPublicHeaders, "kstd/Analytics", "kstd", "KSTLib", "common", "platform", "wire", "base"}},
     {"kstd",
-     {"kstd/Analytics", "kstd/DeviceRestrictedMode", "KSTLib", "common", "platform", "wire",
-      "base"}},
-    {"keystrand-sim", {"common", "wire", "base"}},
+     {kPublicHeaders, "kstd/Analytics", "kstd/DeviceRestrictedMode", "KSTLib", "common", "platform",
+      "wire", "base"}},
+    {"keystrand-sim", {kPublicHeaders, "common", "wire", "base"}},
     {"kstd-https", {"platform/https", "platform/shared", "platform", "wire", "base"}},
     {"kstd-notify", {"platform", "platform/linux", "platform/shared", "wire", "base"}},
     {"kstctl",
-     {"kstd/Analytics", "kstd/Analytics/SQLite", "kstd/DeviceRestrictedMode", "keystrand-sim",
-      "common", "platform", "platform/linux", "platform/shared", "wire", "base"}},
+     {kPublicHeaders, "kstd/Analytics", "kstd/Analytics/SQLite", "kstd/DeviceRestrictedMode",
+      "keystrand-sim", "common", "platform", "platform/linux", "platform/shared", "wire", "base"}},
     {"tools",
-     {"kstd/Analytics", "kstd", "KSTLib", "common", "platform", "platform/linux", "keystrand-sim",
-      "wire", "base"}},
+     {kPublicHeaders, "kstd/Analytics", "kstd", "KSTLib", "common", "platform", "platform/linux",
+      "keystrand-sim", "wire", "base"}},
     {"bench",
-     {"kstd/Analytics", "kstd/Analytics/SQLite", "kstd/DeviceRestrictedMode", "kstd", "KSTLib",
-      "common", "platform", "platform/linux", "wire", "base"}},
-    {"fuzz", {"KSTLib", "common", "platform", "platform/shared", "wire", "base"}},
+     {kPublicHeaders, "kstd/Analytics", "kstd/Analytics/SQLite", "kstd/DeviceRestrictedMode",
+      "kstd", "KSTLib", "common", "platform", "platform/linux", "wire", "base"}},
+    {"fuzz", {kPublicHeaders, "KSTLib", "common", "platform", "platform/shared", "wire", "base"}},
 };
 
 /// What a single file may include beyond its room.
@@ -73,7 +78,18 @@ const std::map<std::string, std::set<std::string>> kMayIncludeToo = {
     {"KSTLib/shared/DefaultPlatform.cpp", {"platform/linux"}},
 };
 
+const std::set<std::string>& publicHeaders() {
+    static const std::set<std::string> headers = [] {
+        std::ifstream list(fs::path(SOURCE_ROOT) / "KSTLib/shared/public-headers");
+        return std::set<std::string>{std::istream_iterator<std::string>(list), {}};
+    }();
+    return headers;
+}
+
 std::string roomOf(const std::string& path) {
+    if (publicHeaders().contains(path)) {
+        return kPublicHeaders;
+    }
     for (const std::string& room : kRooms) {
         if (path.rfind(room + "/", 0) == 0) {
             return room;
@@ -93,7 +109,8 @@ std::vector<Include> includesOfTree() {
     for (const std::string& room : kRooms) {
         for (const auto& entry : fs::recursive_directory_iterator(fs::path(SOURCE_ROOT) / room)) {
             const std::string file = fs::relative(entry.path(), SOURCE_ROOT).string();
-            if (!entry.is_regular_file() || roomOf(file) != room) {
+            if (!entry.is_regular_file() ||
+                (roomOf(file) != room && roomOf(file) != kPublicHeaders)) {
                 continue;
             }
             std::ifstream stream(entry.path());
@@ -135,6 +152,9 @@ TEST(IncludeRulesTest, RulesRefuseWhatTheyShould) {
     EXPECT_FALSE(isAllowed({"kstd/Daemon.cpp", "platform/fake/FakeHost.h"}));
     EXPECT_FALSE(isAllowed({"keystrand-sim/main.cpp", "kstd/Daemon.h"}));
     EXPECT_FALSE(isAllowed({"common/LibCall.cpp", "KSTLib/Channel.h"}));
+    EXPECT_FALSE(isAllowed({"KSTLib/KSTLib.h", "KSTLib/Channel.h"}));
+    EXPECT_FALSE(isAllowed({"KSTLib/KSTLib.h", "common/Allocation.h"}));
+    EXPECT_TRUE(isAllowed({"common/LibCall.cpp", "KSTLib/Status.h"}));
     EXPECT_FALSE(isAllowed({"kstd/Analytics/Upload.cpp", "KSTLib/Channel.h"}));
     EXPECT_FALSE(isAllowed({"kstd/Analytics/SQLite/Opening.cpp", "kstd/Analytics/Analytics.h"}));
     EXPECT_FALSE(isAllowed({"fuzz/fuzz_json.cpp", "platform/linux/Paths.h"}));

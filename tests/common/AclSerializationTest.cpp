@@ -1,5 +1,5 @@
-#include "common/ProcessAclSerialization.h"
-#include "common/VerifyAclSerialization.h"
+#include "KSTLib/ProcessAclSerialization.h"
+#include "KSTLib/VerifyAclSerialization.h"
 #include "tests/common/ParameterPayloads.h"
 #include "tests/support/ScriptedGate.h"
 

@@ -1,4 +1,4 @@
-#include "common/Blocks.h"
+#include "KSTLib/Blocks.h"
 
 #include <gtest/gtest.h>
 

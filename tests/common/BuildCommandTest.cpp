@@ -1,5 +1,5 @@
+#include "KSTLib/LibCall.h"
 #include "common/Allocation.h"
-#include "common/LibCall.h"
 #include "tests/support/LibraryFixture.h"
 #include "tests/support/ScriptedGate.h"
 

@@ -1,7 +1,7 @@
-#include "common/Command.h"
+#include "KSTLib/Command.h"
 
+#include "KSTLib/Status.h"
 #include "common/CommandHeader.h"
-#include "common/Status.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

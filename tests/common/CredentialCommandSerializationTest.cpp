@@ -1,6 +1,6 @@
-#include "common/CredentialCommandSerialization.h"
+#include "KSTLib/CredentialCommandSerialization.h"
 
-#include "common/CredentialSerialization.h"
+#include "KSTLib/CredentialSerialization.h"
 #include "tests/common/CredentialSamples.h"
 #include "tests/support/ScriptedGate.h"
 

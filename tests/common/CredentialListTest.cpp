@@ -1,4 +1,4 @@
-#include "common/CredentialSerialization.h"
+#include "KSTLib/CredentialSerialization.h"
 #include "tests/common/CredentialSamples.h"
 #include "tests/support/ScriptedGate.h"
 

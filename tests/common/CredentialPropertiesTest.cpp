@@ -1,5 +1,5 @@
-#include "common/CredentialSerialization.h"
-#include "common/LibCallCredential.h"
+#include "KSTLib/CredentialSerialization.h"
+#include "KSTLib/LibCallCredential.h"
 #include "tests/common/CredentialSamples.h"
 #include "tests/support/ScriptedGate.h"
 

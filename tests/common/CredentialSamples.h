@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/Credential.h"
+#include "KSTLib/Credential.h"
 #include "tests/common/SerializationFixture.h"
 
 #include <array>

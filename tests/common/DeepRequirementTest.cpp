@@ -1,6 +1,6 @@
 // Trees that are deep, or that say they are large.
 
-#include "common/RequirementSerialization.h"
+#include "KSTLib/RequirementSerialization.h"
 #include "tests/common/RequirementSamples.h"
 #include "tests/support/ScriptedGate.h"
 

@@ -1,5 +1,5 @@
-#include "common/LibCall.h"
-#include "common/LibCallBlock.h"
+#include "KSTLib/LibCall.h"
+#include "KSTLib/LibCallBlock.h"
 #include "tests/support/LibraryFixture.h"
 #include "tests/support/RecordingBlock.h"
 #include "tests/support/ScriptedTransport.h"

@@ -1,4 +1,4 @@
-#include "common/LibCallBlock.h"
+#include "KSTLib/LibCallBlock.h"
 #include "tests/support/LibraryFixture.h"
 #include "tests/support/RecordingBlock.h"
 #include "tests/support/ScriptedTransport.h"

@@ -1,7 +1,7 @@
-#include "common/LibCallContext.h"
+#include "KSTLib/LibCallContext.h"
 
-#include "common/LibCallRequirement.h"
-#include "common/RequirementSerialization.h"
+#include "KSTLib/LibCallRequirement.h"
+#include "KSTLib/RequirementSerialization.h"
 #include "tests/common/CredentialSamples.h"
 #include "tests/support/ContextlessTransport.h"
 #include "tests/support/ScriptedGate.h"

@@ -1,10 +1,10 @@
 #pragma once
 
-#include "common/DataBlob.h"
-#include "common/ParameterSerialization.h"
-#include "common/ProcessAclSerialization.h"
-#include "common/VerifyAclSerialization.h"
-#include "common/VerifyPolicySerialization.h"
+#include "KSTLib/DataBlob.h"
+#include "KSTLib/ParameterSerialization.h"
+#include "KSTLib/ProcessAclSerialization.h"
+#include "KSTLib/VerifyAclSerialization.h"
+#include "KSTLib/VerifyPolicySerialization.h"
 #include "tests/common/SerializationFixture.h"
 
 #include <array>

@@ -1,6 +1,6 @@
-#include "common/ParameterSerialization.h"
+#include "KSTLib/ParameterSerialization.h"
 
-#include "common/LibCall.h"
+#include "KSTLib/LibCall.h"
 #include "tests/common/ParameterPayloads.h"
 #include "tests/support/ScriptedGate.h"
 

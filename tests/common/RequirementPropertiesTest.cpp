@@ -1,5 +1,5 @@
-#include "common/LibCallRequirement.h"
-#include "common/RequirementSerialization.h"
+#include "KSTLib/LibCallRequirement.h"
+#include "KSTLib/RequirementSerialization.h"
 #include "tests/common/RequirementSamples.h"
 
 #include <gtest/gtest.h>

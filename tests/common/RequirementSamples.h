@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/Requirement.h"
+#include "KSTLib/Requirement.h"
 #include "tests/common/SerializationFixture.h"
 
 #include <cstring>

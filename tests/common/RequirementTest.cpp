@@ -1,5 +1,5 @@
+#include "KSTLib/RequirementSerialization.h"
 #include "common/Allocation.h"
-#include "common/RequirementSerialization.h"
 #include "tests/common/RequirementSamples.h"
 #include "tests/support/ScriptedGate.h"
 

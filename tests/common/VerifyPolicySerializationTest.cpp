@@ -1,4 +1,4 @@
-#include "common/VerifyPolicySerialization.h"
+#include "KSTLib/VerifyPolicySerialization.h"
 
 #include "tests/common/ParameterPayloads.h"
 #include "tests/support/ScriptedGate.h"

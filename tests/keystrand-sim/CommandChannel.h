@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/Command.h"
+#include "KSTLib/Command.h"
 #include "keystrand-sim/CommandFrame.h"
 #include "keystrand-sim/DispatchTable.h"
 #include "platform/KernelChannel.h"

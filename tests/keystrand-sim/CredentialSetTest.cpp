@@ -1,6 +1,6 @@
 #include "keystrand-sim/CredentialSet.h"
 
-#include "common/AllocatedBytes.h"
+#include "KSTLib/AllocatedBytes.h"
 #include "tests/keystrand-sim/Credentials.h"
 #include "tests/support/ScriptedGate.h"
 

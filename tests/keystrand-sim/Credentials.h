@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/CredentialSerialization.h"
+#include "KSTLib/CredentialSerialization.h"
 #include "keystrand-sim/CredentialSet.h"
 #include "tests/keystrand-sim/Bytes.h"
 

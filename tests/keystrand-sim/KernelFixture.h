@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/AllocatedBytes.h"
+#include "KSTLib/AllocatedBytes.h"
 #include "keystrand-sim/Commands.h"
 #include "keystrand-sim/RequirementParser.h"
 #include "tests/keystrand-sim/Credentials.h"

@@ -1,7 +1,7 @@
 #include "keystrand-sim/RequirementWire.h"
 
-#include "common/AllocatedBytes.h"
-#include "common/RequirementSerialization.h"
+#include "KSTLib/AllocatedBytes.h"
+#include "KSTLib/RequirementSerialization.h"
 #include "keystrand-sim/RequirementParser.h"
 #include "tests/keystrand-sim/Credentials.h"
 

@@ -1,5 +1,5 @@
+#include "KSTLib/AllocatedBytes.h"
 #include "base/Concat.h"
-#include "common/AllocatedBytes.h"
 #include "kstctl/Forms.h"
 #include "kstctl/HexText.h"
 #include "kstctl/decode/Kinds.h"

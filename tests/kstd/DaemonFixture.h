@@ -1,9 +1,9 @@
 #pragma once
 
+#include "KSTLib/AllocatedBytes.h"
+#include "KSTLib/Command.h"
 #include "KSTLib/Platform.h"
 #include "base/ByteReader.h"
-#include "common/AllocatedBytes.h"
-#include "common/Command.h"
 #include "kstd/Analytics/AnalyticsLifetime.h"
 #include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
 #include "platform/fake/FakeHost.h"

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/AllocatedBytes.h"
+#include "KSTLib/AllocatedBytes.h"
 #include "common/LibraryLog.h"
 #include "tests/support/AssertionLines.h"
 #include "tests/support/RecordingLog.h"

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/LibCall.h"
+#include "KSTLib/LibCall.h"
 
 #include <algorithm>
 #include <cstring>

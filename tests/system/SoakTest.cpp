@@ -1,7 +1,7 @@
 // Many notifications through one daemon process: nothing grows.
 
+#include "KSTLib/AllocatedBytes.h"
 #include "KSTLib/Platform.h"
-#include "common/AllocatedBytes.h"
 #include "kstd/Analytics/AnalyticsLifetime.h"
 #include "kstd/Daemon.h"
 #include "platform/linux/EventSocket.h"

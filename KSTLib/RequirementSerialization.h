@@ -1,13 +1,13 @@
-#ifndef KST_COMMON_REQUIREMENT_SERIALIZATION_H
-#define KST_COMMON_REQUIREMENT_SERIALIZATION_H
+#ifndef KST_KSTLIB_REQUIREMENT_SERIALIZATION_H
+#define KST_KSTLIB_REQUIREMENT_SERIALIZATION_H
 
-#include "common/Public.h"
-#include "common/Requirement.h"
-#include "common/Status.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Requirement.h"
+#include "KSTLib/Status.h"
 
 #include <stddef.h>
 
-/** Sizes, writes, reads and frees trees of requirements (common/Requirement.h). All sizes are
+/** Sizes, writes, reads and frees trees of requirements (KSTLib/Requirement.h). All sizes are
  *  bytes.
  *
  *  The functions keep no state and run on the calling thread; a tree may be as deep as memory

@@ -1,15 +1,15 @@
-#ifndef KST_COMMON_LIB_CALL_REQUIREMENT_H
-#define KST_COMMON_LIB_CALL_REQUIREMENT_H
+#ifndef KST_KSTLIB_LIB_CALL_REQUIREMENT_H
+#define KST_KSTLIB_LIB_CALL_REQUIREMENT_H
 
-#include "common/LibCall.h"
-#include "common/Public.h"
-#include "common/Requirement.h"
-#include "common/Status.h"
+#include "KSTLib/LibCall.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Requirement.h"
+#include "KSTLib/Status.h"
 
 #include <stddef.h>
 #include <stdint.h>
 
-/** The LibCall functions (common/LibCall.h) over one requirement in the caller's memory. What the
+/** The LibCall functions (KSTLib/LibCall.h) over one requirement in the caller's memory. What the
  *  getters do is told with their namesakes in KSTLib/RequirementObjects.h. */
 
 #ifdef __cplusplus

@@ -1,16 +1,16 @@
-#ifndef KST_COMMON_VERIFY_ACL_SERIALIZATION_H
-#define KST_COMMON_VERIFY_ACL_SERIALIZATION_H
+#ifndef KST_KSTLIB_VERIFY_ACL_SERIALIZATION_H
+#define KST_KSTLIB_VERIFY_ACL_SERIALIZATION_H
 
-#include "common/Handle.h"
-#include "common/Parameter.h"
-#include "common/Public.h"
-#include "common/Status.h"
+#include "KSTLib/Handle.h"
+#include "KSTLib/Parameter.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Status.h"
 
 #include <stdint.h>
 
 /** The payload that asks whether a context satisfies one constraint of an access-control list. N is
  *  the length of the constraint, P that of the parameters on the wire
- *  (common/ParameterSerialization.h):
+ *  (KSTLib/ParameterSerialization.h):
  *
  *  | offset | width | field                                     |
  *  |      0 |    16 | handle of the context, or zeros           |

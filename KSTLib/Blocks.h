@@ -1,15 +1,15 @@
-#ifndef KST_COMMON_BLOCKS_H
-#define KST_COMMON_BLOCKS_H
+#ifndef KST_KSTLIB_BLOCKS_H
+#define KST_KSTLIB_BLOCKS_H
 
-#include "common/Requirement.h"
-#include "common/Status.h"
+#include "KSTLib/Requirement.h"
+#include "KSTLib/Status.h"
 
 #include <stdbool.h>
 #include <stddef.h>
 #include <stdint.h>
 
 #ifdef __cplusplus
-#include "common/BlockOf.h"
+#include "KSTLib/BlockOf.h"
 #endif
 
 /** Result blocks: what a library function calls to hand over what it found.

@@ -1,7 +1,7 @@
-#ifndef KST_COMMON_ALLOCATED_BYTES_H
-#define KST_COMMON_ALLOCATED_BYTES_H
+#ifndef KST_KSTLIB_ALLOCATED_BYTES_H
+#define KST_KSTLIB_ALLOCATED_BYTES_H
 
-#include "common/Public.h"
+#include "KSTLib/Public.h"
 
 #include <stdint.h>
 

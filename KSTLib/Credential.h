@@ -1,5 +1,5 @@
-#ifndef KST_COMMON_CREDENTIAL_H
-#define KST_COMMON_CREDENTIAL_H
+#ifndef KST_KSTLIB_CREDENTIAL_H
+#define KST_KSTLIB_CREDENTIAL_H
 
 #include <stdint.h>
 

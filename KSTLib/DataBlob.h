@@ -1,7 +1,7 @@
-#ifndef KST_COMMON_DATA_BLOB_H
-#define KST_COMMON_DATA_BLOB_H
+#ifndef KST_KSTLIB_DATA_BLOB_H
+#define KST_KSTLIB_DATA_BLOB_H
 
-#include "common/Public.h"
+#include "KSTLib/Public.h"
 
 #include <stddef.h>
 

@@ -1,10 +1,10 @@
-#ifndef KST_COMMON_CREDENTIAL_COMMAND_SERIALIZATION_H
-#define KST_COMMON_CREDENTIAL_COMMAND_SERIALIZATION_H
+#ifndef KST_KSTLIB_CREDENTIAL_COMMAND_SERIALIZATION_H
+#define KST_KSTLIB_CREDENTIAL_COMMAND_SERIALIZATION_H
 
-#include "common/Credential.h"
-#include "common/Handle.h"
-#include "common/Public.h"
-#include "common/Status.h"
+#include "KSTLib/Credential.h"
+#include "KSTLib/Handle.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Status.h"
 
 #include <stddef.h>
 
@@ -13,7 +13,7 @@
  *
  *  | offset | width  | field                           |
  *  |      0 |     16 | handle of the context, or zeros |
- *  |     16 | 32 + D | credential (common/Credential.h) |
+ *  |     16 | 32 + D | credential (KSTLib/Credential.h) |
  *  | 48 + D |      4 | scope                           |
  *
  *  The functions keep no state and run on the calling thread. A failed check writes one line to the

@@ -1,5 +1,5 @@
-#ifndef KST_COMMON_COMMAND_H
-#define KST_COMMON_COMMAND_H
+#ifndef KST_KSTLIB_COMMAND_H
+#define KST_KSTLIB_COMMAND_H
 
 /** The command frame that every call to the kernel service carries as its input:
  *

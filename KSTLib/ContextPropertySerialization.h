@@ -1,9 +1,9 @@
-#ifndef KST_COMMON_CONTEXT_PROPERTY_SERIALIZATION_H
-#define KST_COMMON_CONTEXT_PROPERTY_SERIALIZATION_H
+#ifndef KST_KSTLIB_CONTEXT_PROPERTY_SERIALIZATION_H
+#define KST_KSTLIB_CONTEXT_PROPERTY_SERIALIZATION_H
 
-#include "common/Handle.h"
-#include "common/Public.h"
-#include "common/Status.h"
+#include "KSTLib/Handle.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Status.h"
 
 #include <stddef.h>
 #include <stdint.h>

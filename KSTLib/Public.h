@@ -1,5 +1,5 @@
-#ifndef KST_COMMON_PUBLIC_H
-#define KST_COMMON_PUBLIC_H
+#ifndef KST_KSTLIB_PUBLIC_H
+#define KST_KSTLIB_PUBLIC_H
 
 /** Marks what the shared library shows; all else in it is hidden. */
 #ifdef __GNUC__

@@ -1,16 +1,16 @@
-#ifndef KST_COMMON_VERIFY_POLICY_SERIALIZATION_H
-#define KST_COMMON_VERIFY_POLICY_SERIALIZATION_H
+#ifndef KST_KSTLIB_VERIFY_POLICY_SERIALIZATION_H
+#define KST_KSTLIB_VERIFY_POLICY_SERIALIZATION_H
 
-#include "common/Handle.h"
-#include "common/Parameter.h"
-#include "common/Public.h"
-#include "common/Status.h"
+#include "KSTLib/Handle.h"
+#include "KSTLib/Parameter.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Status.h"
 
 #include <stddef.h>
 #include <stdint.h>
 
 /** The payload that asks whether a context satisfies a policy. L is the length of the policy's
- *  name, P that of the parameters on the wire (common/ParameterSerialization.h):
+ *  name, P that of the parameters on the wire (KSTLib/ParameterSerialization.h):
  *
  *  | offset | width | field                                     |
  *  |      0 |    16 | handle of the context                     |

@@ -1,8 +1,8 @@
-#ifndef KST_COMMON_LIB_CALL_H
-#define KST_COMMON_LIB_CALL_H
+#ifndef KST_KSTLIB_LIB_CALL_H
+#define KST_KSTLIB_LIB_CALL_H
 
-#include "common/Public.h"
-#include "common/Status.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Status.h"
 
 #include <stddef.h>
 #include <stdint.h>
@@ -31,11 +31,11 @@ typedef KSTStatus (*KSTTransport)(void* transportContext, uint32_t code, uint32_
                                   const void* inData, size_t inSize, void* outData,
                                   size_t* outSize);
 
-/** Allocates the frame of a command (common/Command.h) and copies `payloadSize` bytes at `payload`
+/** Allocates the frame of a command (KSTLib/Command.h) and copies `payloadSize` bytes at `payload`
  *  behind its header. Byte 7 of the frame is zero because the allocation is.
  *
  *  Returns the frame and stores its size, payloadSize + 8, in `*outFrameSize`. The frame is the
- *  caller's, who gives it to DeallocDataBlob (common/DataBlob.h) with its size.
+ *  caller's, who gives it to DeallocDataBlob (KSTLib/DataBlob.h) with its size.
  *
  *  Returns null, stores nothing and counts nothing when memory could not be had, when
  *  payloadSize + 8 cannot be expressed, when `payload` is null and `payloadSize` is not 0, or when

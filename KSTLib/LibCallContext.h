@@ -1,19 +1,19 @@
-#ifndef KST_COMMON_LIB_CALL_CONTEXT_H
-#define KST_COMMON_LIB_CALL_CONTEXT_H
+#ifndef KST_KSTLIB_LIB_CALL_CONTEXT_H
+#define KST_KSTLIB_LIB_CALL_CONTEXT_H
 
-#include "common/Context.h"
-#include "common/Credential.h"
-#include "common/Handle.h"
-#include "common/LibCall.h"
-#include "common/Parameter.h"
-#include "common/Public.h"
-#include "common/Requirement.h"
-#include "common/Status.h"
+#include "KSTLib/Context.h"
+#include "KSTLib/Credential.h"
+#include "KSTLib/Handle.h"
+#include "KSTLib/LibCall.h"
+#include "KSTLib/Parameter.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Requirement.h"
+#include "KSTLib/Status.h"
 
 #include <stdbool.h>
 #include <stdint.h>
 
-/** The LibCall functions (common/LibCall.h) for contexts. They hand a null context to the
+/** The LibCall functions (KSTLib/LibCall.h) for contexts. They hand a null context to the
  *  transport. What they do is told with their namesakes in KSTLib/Contexts.h,
  *  KSTLib/ContextCredentials.h and KSTLib/PolicyVerification.h; what differs is told here.
  *

@@ -1,5 +1,5 @@
-#ifndef KST_COMMON_STATUS_H
-#define KST_COMMON_STATUS_H
+#ifndef KST_KSTLIB_STATUS_H
+#define KST_KSTLIB_STATUS_H
 
 #include <stdint.h>
 

@@ -1,5 +1,5 @@
-#ifndef KST_COMMON_BLOCK_OF_H
-#define KST_COMMON_BLOCK_OF_H
+#ifndef KST_KSTLIB_BLOCK_OF_H
+#define KST_KSTLIB_BLOCK_OF_H
 
 #ifdef __cplusplus
 
@@ -12,7 +12,7 @@ namespace kst {
 template <typename Signature>
 struct BlockOf;
 
-/// What C++ adds to a result block (common/Blocks.h): it can be made from nullptr and from any
+/// What C++ adds to a result block (KSTLib/Blocks.h): it can be made from nullptr and from any
 /// callable.
 template <typename... Arguments>
 struct BlockOf<void(Arguments...)> {

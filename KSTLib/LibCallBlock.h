@@ -1,15 +1,15 @@
-#ifndef KST_COMMON_LIB_CALL_BLOCK_H
-#define KST_COMMON_LIB_CALL_BLOCK_H
+#ifndef KST_KSTLIB_LIB_CALL_BLOCK_H
+#define KST_KSTLIB_LIB_CALL_BLOCK_H
 
-#include "common/Blocks.h"
-#include "common/LibCall.h"
-#include "common/Public.h"
-#include "common/Status.h"
+#include "KSTLib/Blocks.h"
+#include "KSTLib/LibCall.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Status.h"
 
 #include <stddef.h>
 #include <stdint.h>
 
-/** The LibCall functions (common/LibCall.h) that hand their result to a block. */
+/** The LibCall functions (KSTLib/LibCall.h) that hand their result to a block. */
 
 #ifdef __cplusplus
 extern "C" {

@@ -1,5 +1,5 @@
-#ifndef KST_COMMON_HANDLE_H
-#define KST_COMMON_HANDLE_H
+#ifndef KST_KSTLIB_HANDLE_H
+#define KST_KSTLIB_HANDLE_H
 
 #include <stdint.h>
 

@@ -1,14 +1,14 @@
-#ifndef KST_COMMON_LIB_CALL_CREDENTIAL_H
-#define KST_COMMON_LIB_CALL_CREDENTIAL_H
+#ifndef KST_KSTLIB_LIB_CALL_CREDENTIAL_H
+#define KST_KSTLIB_LIB_CALL_CREDENTIAL_H
 
-#include "common/Credential.h"
-#include "common/Public.h"
-#include "common/Status.h"
+#include "KSTLib/Credential.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Status.h"
 
 #include <stddef.h>
 #include <stdint.h>
 
-/** The LibCall functions (common/LibCall.h) that make and edit credentials in the caller's memory.
+/** The LibCall functions (KSTLib/LibCall.h) that make and edit credentials in the caller's memory.
  *  They send nothing and so take no transport. What they do is told with their namesakes in
  *  KSTLib/CredentialObjects.h. */
 

@@ -1,13 +1,13 @@
-#ifndef KST_COMMON_PARAMETER_SERIALIZATION_H
-#define KST_COMMON_PARAMETER_SERIALIZATION_H
+#ifndef KST_KSTLIB_PARAMETER_SERIALIZATION_H
+#define KST_KSTLIB_PARAMETER_SERIALIZATION_H
 
-#include "common/Parameter.h"
-#include "common/Public.h"
-#include "common/Status.h"
+#include "KSTLib/Parameter.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Status.h"
 
 #include <stdint.h>
 
-/** Parameters (common/Parameter.h) on the wire, one behind the other without padding:
+/** Parameters (KSTLib/Parameter.h) on the wire, one behind the other without padding:
  *
  *  | offset | width | field               |
  *  |      0 |     4 | type                |

@@ -1,5 +1,5 @@
-#ifndef KST_COMMON_REQUIREMENT_H
-#define KST_COMMON_REQUIREMENT_H
+#ifndef KST_KSTLIB_REQUIREMENT_H
+#define KST_KSTLIB_REQUIREMENT_H
 
 #include <stdint.h>
 

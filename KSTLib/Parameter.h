@@ -1,5 +1,5 @@
-#ifndef KST_COMMON_PARAMETER_H
-#define KST_COMMON_PARAMETER_H
+#ifndef KST_KSTLIB_PARAMETER_H
+#define KST_KSTLIB_PARAMETER_H
 
 #include <stdint.h>
 

@@ -1,14 +1,14 @@
-#ifndef KST_COMMON_CREDENTIAL_SERIALIZATION_H
-#define KST_COMMON_CREDENTIAL_SERIALIZATION_H
+#ifndef KST_KSTLIB_CREDENTIAL_SERIALIZATION_H
+#define KST_KSTLIB_CREDENTIAL_SERIALIZATION_H
 
-#include "common/Credential.h"
-#include "common/Public.h"
-#include "common/Status.h"
+#include "KSTLib/Credential.h"
+#include "KSTLib/Public.h"
+#include "KSTLib/Status.h"
 
 #include <stddef.h>
 #include <stdint.h>
 
-/** Sizes, writes, reads, copies, compares and frees credentials (common/Credential.h) and counted
+/** Sizes, writes, reads, copies, compares and frees credentials (KSTLib/Credential.h) and counted
  *  lists of them. All sizes are bytes. A list on the wire is its 32-bit count and then its
  *  credentials, back to back.
  *
