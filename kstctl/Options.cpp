@@ -1,7 +1,7 @@
 #include "kstctl/Options.h"
 
 #include "kstctl/Output.h"
-#include "kstctl/decode/KindNames.h"
+#include "kstctl/decode/Kinds.h"
 
 #include <CLI/CLI.hpp>
 

@@ -1,10 +1,12 @@
 #pragma once
 
+#include "kstctl/Report.h"
 #include "kstctl/decode/Decoded.h"
+
+namespace kstctl::decode {
 
 /// One decoder for each byte format that has a kind of its own. Each reads with the product's own
 /// code and refuses what that refuses.
-namespace kstctl::decode {
 
 [[nodiscard]] Result decodeRecord(Bytes bytes, Secrets secrets);
 [[nodiscard]] Result decodeStateFile(Bytes bytes, Secrets secrets);
@@ -17,5 +19,12 @@ namespace kstctl::decode {
 [[nodiscard]] Result decodeCredentialList(Bytes bytes, Secrets secrets);
 [[nodiscard]] Result decodeRequirement(Bytes bytes, Secrets secrets);
 [[nodiscard]] Result decodeContextProperty(Bytes bytes, Secrets secrets);
+
+/// Adds the fields of a state record. `blob` holds at least as many bytes as one has.
+void addStateFields(Report& report, Bytes blob);
+
+/// Adds the fields of an analytics record, or its bytes when their layout is not known. `blob`
+/// holds at least as many bytes as one has.
+void addAnalyticsFields(Report& report, Bytes blob);
 
 } // namespace kstctl::decode

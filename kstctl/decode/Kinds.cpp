@@ -1,7 +1,9 @@
 #include "kstctl/decode/Kinds.h"
 
 #include "KSTLib/Command.h"
+#include "base/Concat.h"
 #include "kstctl/decode/Decoders.h"
+#include "kstctl/decode/Payloads.h"
 #include "wire/EventDatagram.h"
 #include "wire/RestrictedMode.h"
 
@@ -77,6 +79,23 @@ std::vector<const Kind*> kindsOf(Bytes bytes) {
         }
     }
     return found;
+}
+
+std::vector<std::string> kindNames() {
+    std::vector<std::string> names;
+    for (const Kind& kind : kinds()) {
+        names.emplace_back(kind.name);
+    }
+    return names;
+}
+
+std::vector<std::string> commandNames() {
+    std::vector<std::string> names;
+    for (const CommandPayload& command : commandPayloads()) {
+        names.emplace_back(command.name);
+        names.push_back(base::concat(command.code));
+    }
+    return names;
 }
 
 } // namespace kstctl::decode

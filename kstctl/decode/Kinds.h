@@ -30,4 +30,9 @@ struct Kind {
 /// The kinds that the bytes can be, from their first to their last one.
 [[nodiscard]] std::vector<const Kind*> kindsOf(Bytes bytes);
 
+[[nodiscard]] std::vector<std::string> kindNames();
+
+/// Names and codes.
+[[nodiscard]] std::vector<std::string> commandNames();
+
 } // namespace kstctl::decode

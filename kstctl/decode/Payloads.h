@@ -1,7 +1,11 @@
 #pragma once
 
+#include "KSTLib/Credential.h"
+#include "KSTLib/Handle.h"
+#include "kstctl/Report.h"
 #include "kstctl/decode/Decoded.h"
 
+#include <cstdint>
 #include <optional>
 #include <span>
 #include <string>
@@ -39,5 +43,31 @@ struct CommandPayload {
 [[nodiscard]] Result decodeSetEnvironmentVariable(Bytes bytes, Secrets secrets);
 [[nodiscard]] Result decodeGetEnvironmentVariable(Bytes bytes, Secrets secrets);
 [[nodiscard]] Result decodeKernelControl(Bytes bytes, Secrets secrets);
+
+/// What an age limit of global credentials stands for when it is no number; else empty.
+[[nodiscard]] inline const char* ageText(std::uint32_t maxGlobalCredentialAge) {
+    return maxGlobalCredentialAge == 0xffffffffU ? "any age" : "";
+}
+
+/// Empty for a scope that does not exist.
+[[nodiscard]] inline const char* scopeText(KSTScope scope) {
+    switch (scope) {
+    case kKSTScopeContext:
+        return "context";
+    case kKSTScopeGlobal:
+        return "global";
+    default:
+        return "";
+    }
+}
+
+/// The fields of a valid credential. A passphrase is told by its length unless secrets are shown.
+[[nodiscard]] Report credentialFields(const KSTCredential& credential, Secrets secrets);
+
+/// The name of a type of credential, empty for a type that does not exist.
+[[nodiscard]] const char* credentialTypeText(std::uint32_t type);
+
+/// What a user id stands for when it is nobody's; else empty.
+[[nodiscard]] const char* userText(std::uint32_t userId);
 
 } // namespace kstctl::decode

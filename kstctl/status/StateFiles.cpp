@@ -1,7 +1,7 @@
 #include "base/Concat.h"
 #include "kstctl/Environment.h"
 #include "kstctl/FileError.h"
-#include "kstctl/decode/RecordFields.h"
+#include "kstctl/decode/Decoders.h"
 #include "kstctl/status/Section.h"
 #include "kstd/DeviceRestrictedMode/StateFilePaths.h"
 #include "platform/Files.h"

@@ -1,4 +1,4 @@
-#include "kstctl/decode/LibraryCall.h"
+#include "kstctl/decode/Decoded.h"
 
 #include "base/Concat.h"
 #include "common/LibraryLog.h"

@@ -1,9 +1,10 @@
+#include "KSTLib/ContextPropertySerialization.h"
 #include "KSTLib/RequirementSerialization.h"
 #include "base/Concat.h"
 #include "common/RequirementLayout.h"
 #include "common/RequirementProperties.h"
+#include "kstctl/decode/Decoded.h"
 #include "kstctl/decode/Decoders.h"
-#include "kstctl/decode/LibraryCall.h"
 
 #include <cstring>
 
@@ -88,6 +89,19 @@ Result decodeRequirement(Bytes bytes, Secrets /*secrets*/) {
     }
     const Received<KSTRequirement> tree(made, DeallocRequirement);
     return Decoded{fieldsAtDepth(*tree, 1), size};
+}
+
+Result decodeContextProperty(Bytes bytes, Secrets /*secrets*/) {
+    KSTHandle handle{};
+    KSTContextProperty property = 0;
+    if (auto refusal = refusalOf("the payload that asks for a property of a context", [&] {
+            return DeserializeGetContextProperty(bytes.data(), bytes.size(), &handle, &property);
+        })) {
+        return *std::move(refusal);
+    }
+    Decoded decoded{.fields = {}, .size = sizeof handle + sizeof property};
+    decoded.fields.add("handle", hexText(handle.bytes)).add("property", property);
+    return decoded;
 }
 
 } // namespace kstctl::decode

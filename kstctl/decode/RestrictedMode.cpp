@@ -1,0 +1,150 @@
+#include "wire/RestrictedMode.h"
+
+#include "base/ByteReader.h"
+#include "base/Concat.h"
+#include "keystrand-sim/AnalyticsBlob.h"
+#include "kstctl/TimeText.h"
+#include "kstctl/decode/Decoders.h"
+#include "kstd/DeviceRestrictedMode/KSTDRMDeamonNotification.h"
+#include "wire/EventDatagram.h"
+
+#include <algorithm>
+
+namespace kstctl::decode {
+
+void addStateFields(Report& report, Bytes blob) {
+    base::ByteReader reader(blob);
+    std::uint32_t version = 0;
+    std::uint64_t start = 0;
+    std::uint8_t locked = 0;
+    if (reader.readU32(version) && reader.readU64(start) && reader.readU8(locked)) {
+        report.add("version", version)
+            .add("standardModeStartTimestamp", start, timeText(start))
+            .add("lockedInRestrictedMode", locked);
+    }
+}
+
+Result decodeStateFile(Bytes bytes, Secrets /*secrets*/) {
+    if (bytes.size() < wire::rm::kStateBlobSize) {
+        return malformed(base::concat("a state file has at least ", wire::rm::kStateBlobSize,
+                                      " bytes, not ", bytes.size()));
+    }
+    Decoded decoded{.fields = {}, .size = wire::rm::kStateBlobSize};
+    addStateFields(decoded.fields, bytes);
+    return decoded;
+}
+
+void addAnalyticsFields(Report& report, Bytes blob) {
+    sim::AnalyticsBytes bytes{};
+    std::copy_n(blob.begin(), bytes.size(), bytes.begin());
+    const auto figures = sim::decodeFigures(bytes);
+    if (!figures) {
+        report.add("layout", "opaque").add("bytes", hexText(bytes));
+        return;
+    }
+    report.add("layout", "keystrand-sim")
+        .add("periodStart", figures->periodStart, timeText(figures->periodStart))
+        .add("restrictedInPeriod", figures->restrictedInPeriod)
+        .add("totalRestricted", figures->totalRestricted)
+        .add("restrictedSince", figures->restrictedSince, timeText(figures->restrictedSince));
+}
+
+Result decodeAnalyticsFile(Bytes bytes, Secrets /*secrets*/) {
+    if (bytes.size() < wire::rm::kAnalyticsBlobSize) {
+        return malformed(base::concat("an analytics file has at least ",
+                                      wire::rm::kAnalyticsBlobSize, " bytes, not ", bytes.size()));
+    }
+    Decoded decoded{.fields = {}, .size = wire::rm::kAnalyticsBlobSize};
+    addAnalyticsFields(decoded.fields, bytes);
+    return decoded;
+}
+
+using namespace wire::rm;
+
+namespace {
+
+const char* typeText(std::uint32_t type) {
+    switch (type) {
+    case kKSTRMNotificationTimerRestarted:
+        return "timer restarted";
+    case kKSTRMNotificationAnalyticsCollected:
+        return "analytics collected";
+    case kKSTRMNotificationSaveAnalytics:
+        return "save analytics";
+    case kKSTRMNotificationTimerRestartedAnalyticsCollected:
+        return "timer restarted, analytics collected";
+    default:
+        return nullptr;
+    }
+}
+
+void addBody(Report& report, const kstd::KSTDRMDeamonNotification& record) {
+    switch (record.type()) {
+    case kKSTRMNotificationTimerRestarted:
+        report.add("alarmTimestamp", record.alarmTimestamp(), timeText(record.alarmTimestamp()));
+        addStateFields(report, record.stateBlob());
+        break;
+    case kKSTRMNotificationAnalyticsCollected:
+        report.add("eventPeriodDuration", record.eventPeriodDuration())
+            .add("restrictedModeDuration", record.restrictedModeDuration())
+            .add("restrictedMode", record.restrictedMode())
+            .add("policyDisabledByPasscodeNotSet", record.policyDisabledByPasscodeNotSet())
+            .add("policyDisabledByBootArg", record.policyDisabledByBootArg())
+            .add("policyDisabledByQuorvane", record.policyDisabledByQuorvane());
+        break;
+    case kKSTRMNotificationSaveAnalytics:
+        addAnalyticsFields(report, record.analyticsBlob());
+        break;
+    default:
+        report.add("totalRestrictedModeDuration", record.totalRestrictedModeDuration());
+    }
+}
+
+} // namespace
+
+Result decodeRecord(Bytes bytes, Secrets /*secrets*/) {
+    const auto record = kstd::KSTDRMDeamonNotification::fromBytes(bytes);
+    if (!record) {
+        return malformed(base::concat("a notification record has ", kNotificationSize,
+                                      " bytes, not ", bytes.size()));
+    }
+    const char* const text = typeText(record->type());
+    if (text == nullptr) {
+        return malformed(base::concat("there is no notification record of type ", record->type()));
+    }
+    Decoded decoded{.fields = {}, .size = kNotificationSize};
+    decoded.fields.add("type", record->type(), text);
+    addBody(decoded.fields, *record);
+    return decoded;
+}
+
+namespace {
+
+/// An alarm's date in the payload of its event.
+void addAlarmDate(Report& report, Bytes payload) {
+    base::ByteReader reader(payload);
+    std::uint64_t date = 0;
+    if (reader.readU64(date) && reader.left() == 0) {
+        const auto nanoseconds = static_cast<std::int64_t>(date);
+        report.add("date", nanoseconds, timeText(platform::Date{nanoseconds}));
+    }
+}
+
+} // namespace
+
+Result decodeEvent(Bytes bytes, Secrets /*secrets*/) {
+    const auto event = wire::decodeEvent(bytes);
+    if (!event) {
+        return malformed("not a well-formed event datagram");
+    }
+    Decoded decoded{.fields = {}, .size = bytes.size()};
+    decoded.fields.add("stream", event->stream)
+        .add("name", event->name)
+        .add("payload", hexText(event->payload));
+    if (event->stream == wire::kAlarmStream) {
+        addAlarmDate(decoded.fields, event->payload);
+    }
+    return decoded;
+}
+
+} // namespace kstctl::decode
