@@ -13,7 +13,8 @@ void writeLogLine(platform::SystemLog* log, const platform::CodePlace& place, co
     if (log == nullptr) {
         return;
     }
-    std::array<char, kMaxLogLineLength + 1> line;
+    constexpr std::string_view kEllipsis = "...";
+    std::array<char, kMaxLogLineLength + kEllipsis.size() + 1> line;
     std::va_list arguments;
     va_start(arguments, format);
     const int wanted = std::vsnprintf(line.data(), line.size(), format, arguments);
@@ -21,7 +22,14 @@ void writeLogLine(platform::SystemLog* log, const platform::CodePlace& place, co
     if (wanted < 0) {
         return;
     }
-    const std::size_t length = std::min(static_cast<std::size_t>(wanted), kMaxLogLineLength);
+    auto length = static_cast<std::size_t>(wanted);
+    // The newline at the end is no part of the line.
+    const bool isWhole = length <= kMaxLogLineLength ||
+                         (length == kMaxLogLineLength + 1 && line[kMaxLogLineLength] == '\n');
+    if (!isWhole) {
+        std::copy(kEllipsis.begin(), kEllipsis.end(), line.begin() + kMaxLogLineLength);
+        length = kMaxLogLineLength + kEllipsis.size();
+    }
     log->write(platform::LogLevel::info, std::string_view(line.data(), length), place);
 }
 

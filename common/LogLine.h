@@ -6,7 +6,7 @@
 
 namespace kst {
 
-/// What a line has room for; a longer one is cut.
+/// What a line has room for; a longer one is cut there and ends in "...".
 inline constexpr std::size_t kMaxLogLineLength = 1023;
 
 /// Writes one line, formatted as printf does, at level info. Writes nothing when `log` is null.

@@ -4,7 +4,7 @@
 
 namespace platform {
 
-enum class LogLevel { debug, info, warning, error };
+enum class LogLevel { debug, info, notice, warning, error };
 
 /// Where in the code a line comes from. Empty or 0 means not known.
 struct CodePlace {
@@ -15,9 +15,10 @@ struct CodePlace {
 
 /// The system's log.
 ///
-/// One call writes one line. One newline at the end of the text is dropped; every other control
-/// character is shown as an escape (\n, \t, \xNN), so that a text from outside can neither break
-/// nor forge a line. Writing never fails as far as the caller can see.
+/// One call writes one line. One newline at the end of the text is dropped. What could break, forge
+/// or turn round a line is shown as an escape: control characters (\n, \t, \xNN, \u{85}), line
+/// separators and bidirectional controls (\u{202e}), and bytes that are not UTF-8 (\xNN). Writing
+/// never fails as far as the caller can see, and leaves errno alone.
 ///
 /// May be called from any thread.
 class SystemLog {

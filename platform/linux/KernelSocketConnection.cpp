@@ -1,11 +1,12 @@
 #include "platform/linux/KernelSocketConnection.h"
 
-#include "base/Concat.h"
 #include "platform/linux/LocalConnection.h"
 
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <cstdint>
+#include <cstdio>
 #include <cstring>
 #include <sys/socket.h>
 #include <sys/uio.h>
@@ -75,10 +76,12 @@ Status KernelSocketConnection::openSocket() {
         return kSuccess;
     }
     if (connection.stranger) {
-        log_.write(LogLevel::warning,
-                   base::concat("kstd: KernelSocket: ", path_, " is served by user ",
-                                *connection.stranger, ", refused.\n"),
-                   {});
+        // On the stack: a client may have no memory left.
+        std::array<char, 256> line;
+        const int length = std::snprintf(line.data(), line.size(),
+                                         "kstd: KernelSocket: %s is served by user %ju, refused.\n",
+                                         path_.c_str(), std::uintmax_t{*connection.stranger});
+        log_.write(LogLevel::warning, {line.data(), static_cast<std::size_t>(length)}, {});
     }
     return statusFromErrno(connection.error);
 }

@@ -36,6 +36,9 @@ namespace platform {
 
 namespace {
 
+/// The daemon's lines bear its name whatever program it runs in.
+constexpr std::string_view kIdentifier = "kstd";
+
 RemoteHTTPOptions httpsOptions(const LinuxHostOptions& options) {
     RemoteHTTPOptions https = options.https;
     if (https.socket.empty()) {
@@ -49,7 +52,7 @@ RemoteHTTPOptions httpsOptions(const LinuxHostOptions& options) {
 /// In the order of construction: what stands below uses what stands above, and goes before it.
 struct LinuxHost::Parts {
     explicit Parts(LinuxHostOptions options)
-        : log(options.paths, options.messageClasses),
+        : log(options.paths, options.messageClasses, kIdentifier),
           files(options.paths),
           settings(options.paths, log),
           defaults(options.paths, propertyLists, log),

@@ -1,38 +1,59 @@
 #include "platform/linux/LinuxSystemLog.h"
 
-#include "base/Concat.h"
+#include "base/FileDescriptor.h"
+#include "base/UnixAddress.h"
 #include "platform/shared/LogText.h"
 #include "platform/shared/MessageClasses.h"
 
-// The fields of the code's place are the caller's, not this file's.
-#define SD_JOURNAL_SUPPRESS_LOCATION
-#include <systemd/sd-journal.h>
-
+#include <algorithm>
+#include <array>
 #include <cerrno>
+#include <charconv>
+#include <cstdint>
+#include <cstring>
+#include <endian.h>
+#include <sys/socket.h>
+#include <sys/time.h>
 #include <sys/uio.h>
 #include <syslog.h>
 #include <unistd.h>
-#include <vector>
 
 namespace platform {
 
 namespace {
 
-constexpr std::string_view kIdentifier = "kstd";
 constexpr std::string_view kEllipsis = "...";
 
-int priorityOf(LogLevel level) {
+/// The usual line is shorter; the threads of the library's clients may have small stacks.
+constexpr std::size_t kUsualTextSize = 1024;
+
+/// The longest name that a program's file can have.
+constexpr std::size_t kMaxIdentifierSize = 255;
+
+/// How long a journal that is there may take nothing.
+constexpr timeval kJournalPatience = {1, 0};
+
+std::string_view priorityOf(LogLevel level) {
     switch (level) {
     case LogLevel::debug:
-        return LOG_DEBUG;
+        return "7";
     case LogLevel::info:
-        return LOG_INFO;
+        return "6";
+    case LogLevel::notice:
+        return "5";
     case LogLevel::warning:
-        return LOG_WARNING;
+        return "4";
     case LogLevel::error:
-        return LOG_ERR;
+        return "3";
     }
-    return LOG_ERR;
+    return "3";
+}
+
+/// The program's name as it was started under, which is not our text and may be empty.
+std::string_view programName() {
+    const char* const name = program_invocation_short_name;
+    return name == nullptr ? std::string_view()
+                           : std::string_view(name, ::strnlen(name, kMaxIdentifierSize));
 }
 
 /// The bytes of UTF-8 that are not the first of their character.
@@ -40,76 +61,142 @@ bool continuesCharacter(char byte) {
     return (static_cast<unsigned char>(byte) & 0xc0U) == 0x80U;
 }
 
-std::string boundedLine(std::string_view text) {
-    if (text.ends_with('\n')) {
-        text.remove_suffix(1);
-    }
-    if (text.size() <= LinuxSystemLog::kMaxTextSize) {
-        return logLine(base::concat(text, '\n'));
-    }
+/// What is kept of a text that is too long.
+std::string_view beginningOf(std::string_view text) {
     // A character has at most three further bytes; text that is not UTF-8 is cut anywhere.
     std::size_t end = LinuxSystemLog::kMaxTextSize;
     for (int steps = 0; steps < 3 && continuesCharacter(text[end]); ++steps) {
         --end;
     }
-    return logLine(base::concat(text.substr(0, end), kEllipsis));
+    return text.substr(0, end);
 }
 
-bool sendToJournal(LogLevel level, const std::string& line, std::string_view messageId,
-                   const CodePlace& place) {
-    std::vector<std::string> fields = {
-        base::concat("MESSAGE=", line),
-        base::concat("PRIORITY=", priorityOf(level)),
-        base::concat("SYSLOG_IDENTIFIER=", kIdentifier),
-    };
-    if (!messageId.empty()) {
-        fields.push_back(base::concat("MESSAGE_ID=", messageId));
+/// A message in the journal's own protocol: for each field its name and a newline, the length of
+/// the value in eight bytes, the value, and a newline. Values lie where they are and must stay
+/// there.
+class JournalMessage {
+  public:
+    void add(std::string_view nameAndNewline, std::string_view value) {
+        std::uint64_t& length = lengths_[fieldCount_++];
+        length = htole64(value.size());
+        addPart(nameAndNewline);
+        addPart({reinterpret_cast<const char*>(&length), sizeof length});
+        addPart(value);
+        addPart("\n");
     }
-    if (!place.file.empty()) {
-        fields.push_back(base::concat("CODE_FILE=", place.file));
+
+    void addIfAny(std::string_view nameAndNewline, std::string_view value) {
+        if (!value.empty()) {
+            add(nameAndNewline, value);
+        }
     }
-    if (place.line > 0) {
-        fields.push_back(base::concat("CODE_LINE=", place.line));
+
+    [[nodiscard]] bool send() {
+        const auto address = base::UnixAddress::of(Paths::kJournalSocket);
+        const base::FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+        if (!address || !socket.isOpen()) {
+            return false;
+        }
+        msghdr message{};
+        message.msg_name = const_cast<sockaddr*>(address->get());
+        message.msg_namelen = address->size();
+        message.msg_iov = parts_.data();
+        message.msg_iovlen = partCount_;
+        if (sendOnce(socket.get(), message, MSG_DONTWAIT)) {
+            return true;
+        }
+        if (errno != EAGAIN) {
+            return false;
+        }
+        ::setsockopt(socket.get(), SOL_SOCKET, SO_SNDTIMEO, &kJournalPatience,
+                     sizeof kJournalPatience);
+        return sendOnce(socket.get(), message, 0);
     }
-    if (!place.function.empty()) {
-        fields.push_back(base::concat("CODE_FUNC=", place.function));
+
+  private:
+    static constexpr std::size_t kMaxFields = 7;
+
+    static bool sendOnce(int socket, const msghdr& message, int flags) {
+        ssize_t sent = -1;
+        do {
+            sent = ::sendmsg(socket, &message, flags | MSG_NOSIGNAL);
+        } while (sent < 0 && errno == EINTR);
+        return sent >= 0;
     }
-    std::vector<iovec> parts;
-    parts.reserve(fields.size());
-    for (std::string& field : fields) {
-        parts.push_back({field.data(), field.size()});
+
+    void addPart(std::string_view part) {
+        // The system only reads from it.
+        parts_[partCount_++] = {const_cast<char*>(part.data()), part.size()};
     }
-    return ::sd_journal_sendv(parts.data(), static_cast<int>(parts.size())) == 0;
-}
+
+    std::array<iovec, kMaxFields * 4> parts_;
+    std::size_t partCount_ = 0;
+    std::array<std::uint64_t, kMaxFields> lengths_;
+    std::size_t fieldCount_ = 0;
+};
 
 /// One line in one write where the system takes it whole. What cannot be written is lost.
-void writeToStandardError(std::string line) {
-    line += '\n';
-    std::string_view rest = line;
-    while (!rest.empty()) {
-        const ssize_t written = ::write(STDERR_FILENO, rest.data(), rest.size());
+void writeToStandardError(std::string_view line) {
+    while (!line.empty()) {
+        const ssize_t written = ::write(STDERR_FILENO, line.data(), line.size());
         if (written < 0 && errno == EINTR) {
             continue;
         }
         if (written <= 0) {
             return;
         }
-        rest.remove_prefix(static_cast<std::size_t>(written));
+        line.remove_prefix(static_cast<std::size_t>(written));
     }
 }
 
 } // namespace
 
-LinuxSystemLog::LinuxSystemLog(const Paths& paths, std::span<const MessageClass> classes)
-    : journalSocket_(paths.isSystemRoot() ? paths.journalSocket() : std::string()),
-      classes_(classes) {}
-
-void LinuxSystemLog::write(LogLevel level, std::string_view text, const CodePlace& place) {
-    std::string line = boundedLine(text);
-    const bool hasJournal = !journalSocket_.empty() && ::access(journalSocket_.c_str(), F_OK) == 0;
-    if (!hasJournal || !sendToJournal(level, line, messageIdOf(line, classes_), place)) {
-        writeToStandardError(std::move(line));
+bool LinuxSystemLog::sendToJournal(LogLevel level, std::string_view line,
+                                   const CodePlace& place) const noexcept {
+    char digits[16];
+    const auto digitsEnd = std::to_chars(std::begin(digits), std::end(digits), place.line).ptr;
+    JournalMessage message;
+    message.add("MESSAGE\n", line);
+    message.add("PRIORITY\n", priorityOf(level));
+    message.addIfAny("SYSLOG_IDENTIFIER\n", identifier_.empty() ? programName() : identifier_);
+    message.addIfAny("MESSAGE_ID\n", messageIdOf(line, classes_));
+    message.addIfAny("CODE_FILE\n", place.file);
+    if (place.line > 0) {
+        message.add("CODE_LINE\n", {digits, static_cast<std::size_t>(digitsEnd - digits)});
     }
+    message.addIfAny("CODE_FUNC\n", place.function);
+    return message.send();
+}
+
+/// Not inlined, so that a short line does not take the stack of a long one.
+template <std::size_t Room>
+[[gnu::noinline]] void LinuxSystemLog::writeOnStack(LogLevel level, std::string_view text,
+                                                    const CodePlace& place) noexcept {
+    constexpr std::size_t kNewlineSize = 1;
+    std::array<char, Room * kLogTextGrowth + kEllipsis.size() + kNewlineSize> buffer;
+    char* end = nullptr;
+    if (text.size() <= Room) {
+        end = showLogText(text, buffer.data());
+    } else {
+        end = showLogText(beginningOf(text), buffer.data());
+        end = std::copy(kEllipsis.begin(), kEllipsis.end(), end);
+    }
+    const auto size = static_cast<std::size_t>(end - buffer.data());
+    if (!hasJournal_ || !sendToJournal(level, {buffer.data(), size}, place)) {
+        *end = '\n';
+        writeToStandardError({buffer.data(), size + kNewlineSize});
+    }
+}
+
+void LinuxSystemLog::write(LogLevel level, std::string_view text, const CodePlace& place) noexcept {
+    const int error = errno;
+    text = withoutFinalNewline(text);
+    if (text.size() <= kUsualTextSize) {
+        writeOnStack<kUsualTextSize>(level, text, place);
+    } else {
+        writeOnStack<kMaxTextSize>(level, text, place);
+    }
+    errno = error;
 }
 
 } // namespace platform

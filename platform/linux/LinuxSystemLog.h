@@ -6,33 +6,44 @@
 
 #include <cstddef>
 #include <span>
-#include <string>
+#include <string_view>
 
 namespace platform {
 
-/// The system's log on Linux: the native journal, with the severity and the place in the code as
-/// fields of their own, or standard error, one plain line each.
+/// The system's log on Linux: the journal, in its own protocol, with the severity and the place in
+/// the code as fields of their own, or standard error, one plain line each.
 ///
-/// A line goes to the journal when its socket is there and takes it. That is looked at for every
-/// line, because the journal may come or go, and because libsystemd says yes to a line that it
-/// dropped for want of a journal. libsystemd knows only the socket of the real system, so under
-/// another root than "/" every line goes to standard error.
+/// A line goes to the journal when that takes it. This is tried for every line, over a socket of
+/// its own, because the journal may come or go, and because the descriptors of a program that uses
+/// the library are not ours to keep. Under another root than "/" there is no journal.
+///
+/// Nothing is allocated and nothing is thrown: a line is built on the stack, 5 KiB for a text of up
+/// to 1 KiB, 36 KiB for a longer one. Nor is anything kept between two lines, so that a process may
+/// fork at any time. A journal that takes nothing for a second loses its line to standard error.
 class LinuxSystemLog final : public SystemLog {
   public:
-    /// In the journal a line of one of the classes has that class's identifier. The classes must
-    /// outlive the log.
-    explicit LinuxSystemLog(const Paths& paths, std::span<const MessageClass> classes = {});
+    /// In the journal lines are `identifier`'s, or this program's when that is empty, and a line of
+    /// one of the classes has that class's identifier. Both must outlive the log.
+    explicit LinuxSystemLog(const Paths& paths, std::span<const MessageClass> classes = {},
+                            std::string_view identifier = {}) noexcept
+        : hasJournal_(paths.isSystemRoot()), classes_(classes), identifier_(identifier) {}
 
-    void write(LogLevel level, std::string_view text, const CodePlace& place) override;
+    void write(LogLevel level, std::string_view text, const CodePlace& place) noexcept override;
 
     /// A longer text is cut here, at the start of a character, and ends in "...". Texts hold names
     /// from outside: nobody shall fill the log with one line.
     static constexpr std::size_t kMaxTextSize = 8192;
 
   private:
-    /// Empty when there is no journal to write to.
-    std::string journalSocket_;
+    template <std::size_t Room>
+    void writeOnStack(LogLevel level, std::string_view text, const CodePlace& place) noexcept;
+
+    [[nodiscard]] bool sendToJournal(LogLevel level, std::string_view line,
+                                     const CodePlace& place) const noexcept;
+
+    bool hasJournal_;
     std::span<const MessageClass> classes_;
+    std::string_view identifier_;
 };
 
 } // namespace platform

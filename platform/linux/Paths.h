@@ -26,7 +26,8 @@ class Paths {
     }
     [[nodiscard]] std::string alarmDirectory() const { return under("/var/lib/kstd/alarms"); }
     [[nodiscard]] std::string systemBus() const { return under("/run/dbus/system_bus_socket"); }
-    [[nodiscard]] std::string journalSocket() const { return under("/run/systemd/journal/socket"); }
+    /// The journal of the whole system, which no other root has.
+    static constexpr std::string_view kJournalSocket = "/run/systemd/journal/socket";
     [[nodiscard]] std::string stateDirectory() const { return under("/var/root"); }
     [[nodiscard]] std::string osRelease() const { return under("/etc/os-release"); }
     [[nodiscard]] std::string vendorOsRelease() const { return under("/usr/lib/os-release"); }

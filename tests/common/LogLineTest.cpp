@@ -33,6 +33,16 @@ TEST(LogLine, LengthAtItsLimit) {
         RecordingLog log;
         const std::string text(length, 'x');
         kst::writeLogLine(&log, {}, "%s", text.c_str());
-        EXPECT_EQ(log.texts().front(), text.substr(0, 1023)) << length;
+        const std::string expected = length <= 1023 ? text : text.substr(0, 1023) + "...";
+        EXPECT_EQ(log.texts().front(), expected) << length;
     }
+}
+
+TEST(LogLine, NewlineAtTheEndIsNoPartOfTheLength) {
+    const std::string text(kst::kMaxLogLineLength, 'x');
+    RecordingLog log;
+    kst::writeLogLine(&log, {}, "%s\n", text.c_str());
+    kst::writeLogLine(&log, {}, "%sx\n", text.c_str());
+    EXPECT_EQ(log.texts()[0], text + "\n");
+    EXPECT_EQ(log.texts()[1], text + "...");
 }

@@ -3,6 +3,7 @@
 #include <gmock/gmock.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <string>
 #include <thread>
 #include <vector>
@@ -53,12 +54,23 @@ TEST_P(SystemLogContract, CharactersBeyondAsciiStayAsTheyAre) {
     EXPECT_THAT(fixture().lines(), ElementsAre("Schl\xc3\xbcssel"));
 }
 
+TEST_P(SystemLogContract, WhatDeceivesAReaderIsShown) {
+    write("a\xc2\x85 b\xe2\x80\xae c\xff\n");
+    EXPECT_THAT(fixture().lines(), ElementsAre("a\\u{85} b\\u{202e} c\\xff"));
+}
+
 TEST_P(SystemLogContract, EveryLevelIsWritten) {
     for (const LogLevel level :
-         {LogLevel::debug, LogLevel::info, LogLevel::warning, LogLevel::error}) {
+         {LogLevel::debug, LogLevel::info, LogLevel::notice, LogLevel::warning, LogLevel::error}) {
         fixture().log().write(level, "line\n", {"kstd/KSTService", 7, "main"});
     }
-    EXPECT_THAT(fixture().lines(), ElementsAre("line", "line", "line", "line"));
+    EXPECT_THAT(fixture().lines(), ElementsAre("line", "line", "line", "line", "line"));
+}
+
+TEST_P(SystemLogContract, ErrorNumberStaysAsItIs) {
+    errno = EXFULL;
+    write("text\n");
+    EXPECT_EQ(errno, EXFULL);
 }
 
 TEST_P(SystemLogContract, LinesOfSeveralThreadsStayWhole) {

@@ -1,17 +1,27 @@
+// The lines that come to the journal. The program's operator new can refuse, so this is a program
+// of its own.
+
+#include "base/UnixAddress.h"
 #include "platform/linux/LinuxSystemLog.h"
 #include "tests/platform/linux/StandardErrorCapture.h"
 
 #include <gmock/gmock.h>
 
+#include <algorithm>
+#include <cerrno>
 #include <cstdint>
+#include <cstdlib>
 #include <cstring>
 #include <filesystem>
 #include <functional>
+#include <iterator>
 #include <map>
+#include <new>
 #include <optional>
 #include <sched.h>
 #include <string>
 #include <sys/mount.h>
+#include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 #include <sys/wait.h>
@@ -32,6 +42,9 @@ constexpr char kSocketPath[] = "/run/systemd/journal/socket";
 
 constexpr char kId[] = "0123456789abcdef0123456789abcdef";
 constexpr platform::MessageClass kClasses[] = {{kId, "kstd: a failure of "}};
+
+/// Each request for memory ends the program while this is set.
+bool refusesMemory = false;
 
 using Fields = std::multimap<std::string, std::string>;
 
@@ -99,6 +112,7 @@ class JournalTest : public testing::Test {
         receive();
     }
 
+    std::string_view identifier_ = "kstd";
     std::vector<Fields> messages_;
     std::vector<std::string> standardError_;
 
@@ -122,7 +136,7 @@ class JournalTest : public testing::Test {
         if (!enterPrivateRun()) {
             ::_exit(1);
         }
-        LinuxSystemLog log(platform::Paths("/"), kClasses);
+        LinuxSystemLog log(platform::Paths("/"), kClasses, identifier_);
         if (journal != Journal::absent) {
             const int listener =
                 journal == Journal::listening ? socket_ : ::socket(AF_UNIX, SOCK_DGRAM, 0);
@@ -158,6 +172,48 @@ class JournalTest : public testing::Test {
     int socket_ = -1;
 };
 
+} // namespace
+
+void* operator new(std::size_t size) {
+    if (refusesMemory) {
+        ::_exit(4);
+    }
+    if (void* memory = std::malloc(size == 0 ? 1 : size)) {
+        return memory;
+    }
+    throw std::bad_alloc();
+}
+
+void operator delete(void* memory) noexcept {
+    std::free(memory);
+}
+
+void operator delete(void* memory, std::size_t /*size*/) noexcept {
+    std::free(memory);
+}
+
+namespace {
+
+TEST_F(JournalTest, NoLineNeedsMemory) {
+    constexpr std::size_t kMax = LinuxSystemLog::kMaxTextSize;
+    const std::string mixed = "kstd: a failure of \xe2\x80\xae \xff \t" + std::string(kMax, '\x01');
+    for (const Journal journal : {Journal::listening, Journal::gone, Journal::absent}) {
+        messages_.clear();
+        run(journal, [&mixed](LinuxSystemLog& log) {
+            refusesMemory = true;
+            for (const std::size_t size : {std::size_t{0}, std::size_t{40}, std::size_t{1024},
+                                           std::size_t{1025}, kMax, kMax + 1}) {
+                log.write(LogLevel::error, std::string_view(mixed).substr(0, size),
+                          {"kstd/Daemon.cpp", 42, "main"});
+            }
+            refusesMemory = false;
+        });
+        const bool isJournal = journal == Journal::listening;
+        EXPECT_EQ(messages_.size(), isJournal ? 6U : 0U);
+        EXPECT_EQ(standardError_.size(), isJournal ? 0U : 6U);
+    }
+}
+
 TEST_F(JournalTest, LineGoesToTheJournalWithItsFields) {
     run(Journal::listening, [](LinuxSystemLog& log) {
         log.write(LogLevel::info, "kstd: main: Entering the main runloop.\n",
@@ -179,6 +235,31 @@ TEST_F(JournalTest, UnknownPlaceGivesNoFieldsOfIt) {
                                                    Pair("SYSLOG_IDENTIFIER", "kstd")));
 }
 
+std::string identifierOf(const Fields& fields) {
+    const auto found = fields.find("SYSLOG_IDENTIFIER");
+    return found == fields.end() ? "none" : found->second;
+}
+
+TEST_F(JournalTest, LineIsOfTheProgramThatWroteIt) {
+    identifier_ = {};
+    run(Journal::listening, [](LinuxSystemLog& log) {
+        log.write(LogLevel::info, "as it was started", {});
+        std::string name(256, 'p');
+        for (char* const given : {name.data(), name.data() + 1, name.data() + 256}) {
+            ::program_invocation_short_name = given;
+            log.write(LogLevel::info, "renamed", {});
+        }
+        ::program_invocation_short_name = nullptr;
+        log.write(LogLevel::info, "nameless", {});
+    });
+    std::vector<std::string> identifiers;
+    std::transform(messages_.begin(), messages_.end(), std::back_inserter(identifiers),
+                   identifierOf);
+    const std::string longest(255, 'p');
+    EXPECT_THAT(identifiers,
+                ElementsAre("platform_linux_journal_test", longest, longest, "none", "none"));
+}
+
 TEST_F(JournalTest, LineOfAClassHasItsIdentifier) {
     run(Journal::listening, [](LinuxSystemLog& log) {
         log.write(LogLevel::error, "kstd: a failure of x\n", {});
@@ -195,6 +276,7 @@ TEST_F(JournalTest, EachLevelHasItsPriority) {
     run(Journal::listening, [](LinuxSystemLog& log) {
         log.write(LogLevel::debug, "debug", {});
         log.write(LogLevel::info, "info", {});
+        log.write(LogLevel::notice, "notice", {});
         log.write(LogLevel::warning, "warning", {});
         log.write(LogLevel::error, "error", {});
     });
@@ -203,7 +285,7 @@ TEST_F(JournalTest, EachLevelHasItsPriority) {
         priorities.push_back(fields.find("MESSAGE")->second + " " +
                              fields.find("PRIORITY")->second);
     }
-    EXPECT_THAT(priorities, ElementsAre("debug 7", "info 6", "warning 4", "error 3"));
+    EXPECT_THAT(priorities, ElementsAre("debug 7", "info 6", "notice 5", "warning 4", "error 3"));
 }
 
 TEST_F(JournalTest, TextCannotAddAField) {
@@ -236,6 +318,35 @@ TEST_F(JournalTest, JournalThatDoesNotListenLeavesTheLineToStandardError) {
     run(Journal::gone, [](LinuxSystemLog& log) { log.write(LogLevel::info, "text\n", {}); });
     EXPECT_THAT(messages_, IsEmpty());
     EXPECT_THAT(standardError_, ElementsAre("text"));
+}
+
+TEST_F(JournalTest, JournalThatTakesNothingLeavesTheLineToStandardError) {
+    run(Journal::listening, [](LinuxSystemLog& log) {
+        const int filler = ::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+        const auto address = base::UnixAddress::of(kSocketPath);
+        while (::sendto(filler, "F=\n", 3, MSG_DONTWAIT, address->get(), address->size()) == 3) {
+        }
+        log.write(LogLevel::info, "text\n", {});
+    });
+    EXPECT_THAT(messages_, testing::Each(testing::ElementsAre(Pair("F", ""))));
+    EXPECT_THAT(standardError_, ElementsAre("text"));
+}
+
+TEST_F(JournalTest, NoDescriptorIsLeftAndNoneIsNeededForStandardError) {
+    run(Journal::listening, [](LinuxSystemLog& log) {
+        const int before = ::dup(0);
+        ::close(before);
+        log.write(LogLevel::info, "first\n", {});
+        const int after = ::dup(0);
+        if (after != before) {
+            ::_exit(3);
+        }
+        const rlimit none{static_cast<rlim_t>(after), static_cast<rlim_t>(after)};
+        ::setrlimit(RLIMIT_NOFILE, &none);
+        log.write(LogLevel::info, "second\n", {});
+    });
+    ASSERT_EQ(messages_.size(), 1U);
+    EXPECT_THAT(standardError_, ElementsAre("second"));
 }
 
 TEST_F(JournalTest, JournalMayGoAndComeBack) {

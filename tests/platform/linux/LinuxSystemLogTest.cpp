@@ -66,11 +66,20 @@ TEST_F(LinuxSystemLogTest, TextIsCutAtTheStartOfACharacter) {
 }
 
 TEST_F(LinuxSystemLogTest, TextThatIsNoUtf8IsCutAllTheSame) {
-    const std::string text(kMax * 2, '\x80');
-    const std::string line = written(text);
-    EXPECT_LE(line.size(), kMax + 4);
-    EXPECT_GE(line.size(), kMax);
-    EXPECT_TRUE(line.ends_with("...\n"));
+    const std::string line = written(std::string(kMax * 2, '\x80'));
+    EXPECT_LE(line.size(), 4 * kMax + 4);
+    EXPECT_GE(line.size(), 4 * (kMax - 3) + 4);
+    EXPECT_TRUE(line.ends_with("\\x80...\n"));
+}
+
+TEST_F(LinuxSystemLogTest, EveryLengthThatIsShownLongestStaysWhole) {
+    for (const std::size_t size : {std::size_t{1023}, std::size_t{1024}, std::size_t{1025}, kMax}) {
+        std::string expected;
+        for (std::size_t count = 0; count < size; ++count) {
+            expected += "\\x01";
+        }
+        EXPECT_EQ(written(std::string(size, '\x01')), expected + "\n") << size;
+    }
 }
 
 TEST_F(LinuxSystemLogTest, JournalOfAnotherRootIsNotUsed) {

@@ -16,7 +16,7 @@ TEST(PathsTest, SystemRootAddsNothing) {
     EXPECT_EQ(paths.managedSettingsDirectory(), "/etc/kstd");
     EXPECT_EQ(paths.managedSettings(), "/etc/kstd/managed-settings.conf");
     EXPECT_EQ(paths.alarmDirectory(), "/var/lib/kstd/alarms");
-    EXPECT_EQ(paths.journalSocket(), "/run/systemd/journal/socket");
+    EXPECT_EQ(platform::Paths::kJournalSocket, "/run/systemd/journal/socket");
     EXPECT_EQ(paths.stateDirectory(), "/var/root");
     EXPECT_EQ(paths.osRelease(), "/etc/os-release");
     EXPECT_EQ(paths.vendorOsRelease(), "/usr/lib/os-release");
