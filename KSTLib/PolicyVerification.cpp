@@ -19,6 +19,25 @@ KSTStatus requireBlock(const Block& block, int line = __builtin_LINE()) {
     return kst::requireBlock(kst::libraryContext(), block, "processRequirement", line);
 }
 
+/// Context and policy are there.
+KSTStatus verifyPolicyInternal(const kst::PolicyQuestion& question, const char* policyId,
+                               kst::PolicyAnswer& answer) {
+    const KSTStatus err = kst::openChannel();
+    return err == kKSTErrorSuccess
+               ? kst::askAboutPolicy(kst::librarySender(), policyId, question, true, answer)
+               : err;
+}
+
+/// Context and constraint are there.
+KSTStatus verifyAclConstraintInternal(const kst::PolicyQuestion& question,
+                                      const void* aclConstraint, std::uint32_t length,
+                                      kst::PolicyAnswer& answer) {
+    const KSTStatus err = kst::openChannel();
+    return err == kKSTErrorSuccess ? kst::askAboutAclConstraint(kst::librarySender(), aclConstraint,
+                                                                length, question, true, answer)
+                                   : err;
+}
+
 /// Context, policy and block are checked in this order, then the question is sent.
 template <typename Block>
 KSTStatus verifyPolicy(const kst::PolicyQuestion& question, const char* policyId,
@@ -28,13 +47,7 @@ KSTStatus verifyPolicy(const kst::PolicyQuestion& question, const char* policyId
     if (err == kKSTErrorSuccess) {
         err = requireBlock(block);
     }
-    if (err == kKSTErrorSuccess) {
-        err = kst::openChannel();
-    }
-    if (err == kKSTErrorSuccess) {
-        err = kst::askAboutPolicy(kst::librarySender(), policyId, question, true, answer);
-    }
-    return err;
+    return err == kKSTErrorSuccess ? verifyPolicyInternal(question, policyId, answer) : err;
 }
 
 KSTStatus verifyAclConstraint(const kst::PolicyQuestion& question, const void* aclConstraint,
@@ -52,15 +65,10 @@ KSTStatus verifyAclConstraint(const kst::PolicyQuestion& question, const void* a
         err = kst::fail(kst::libraryContext(), "aclConstraintLength <= UINT32_MAX", 0,
                         kKSTErrorBadParameter);
     }
-    if (err == kKSTErrorSuccess) {
-        err = kst::openChannel();
-    }
-    if (err == kKSTErrorSuccess) {
-        err =
-            kst::askAboutAclConstraint(kst::librarySender(), aclConstraint,
-                                       static_cast<std::uint32_t>(length), question, true, answer);
-    }
-    return err;
+    return err == kKSTErrorSuccess
+               ? verifyAclConstraintInternal(question, aclConstraint,
+                                             static_cast<std::uint32_t>(length), answer)
+               : err;
 }
 
 /// Hands over an answer on success only.
