@@ -29,8 +29,9 @@ KSTStatus setEnvironmentVariable(KSTTransport transport, void* transportContext,
                          kKSTErrorBadParameter);
     }
     const kst::NumberedPayload payload(variable, data, dataLength, context);
-    return transport(transportContext, kKSTCommandSetEnvironmentVariable, 0, payload.data(),
-                     payload.size(), nullptr, nullptr);
+    const KSTStatus err = transport(transportContext, kKSTCommandSetEnvironmentVariable, 0,
+                                    payload.data(), payload.size(), nullptr, nullptr);
+    return err == kKSTErrorSuccess ? err : kst::failCall(context, err);
 }
 
 } // namespace

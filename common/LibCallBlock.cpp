@@ -31,7 +31,7 @@ KSTStatus getEnvironmentVariable(KSTTransport transport, void* transportContext,
     err = transport(transportContext, kKSTCommandGetEnvironmentVariable, 0, payload.data(),
                     payload.size(), outBuffer.data(), &outSize);
     if (err != kKSTErrorSuccess) {
-        return err;
+        return kst::failCall(context, err);
     }
     if (outSize > outBuffer.size()) {
         return kst::fail(context, kReplySizeCheck, 0, kKSTErrorUnexpected);
@@ -59,6 +59,9 @@ KSTStatus kernelControl(KSTTransport transport, void* transportContext, std::uin
     std::size_t outSize = outBuffer.size();
     err = transport(transportContext, kKSTCommandKernelControl, 0, payload.data(), payload.size(),
                     outBuffer.data(), &outSize);
+    if (err != kKSTErrorSuccess) {
+        static_cast<void>(kst::failCall(context, err));
+    }
     if (outSize > outBuffer.size()) {
         outSize = 0;
         if (err == kKSTErrorSuccess) {

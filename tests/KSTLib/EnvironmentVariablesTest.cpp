@@ -59,8 +59,9 @@ TEST_F(EnvironmentVariables, SetLengthsAtTheirLimits) {
 TEST_F(EnvironmentVariables, SetTakesNoReply) {
     channel.reportedSize = 1;
     EXPECT_EQ(KSTSetEnvironmentVariable(1, "a", 1), kKSTErrorUnexpected);
-    EXPECT_EQ(logged(), (Lines{failedCheck("replySize <= offeredSize"),
-                               "KSTLib: KSTSetEnvironmentVariable: returning, err = -5.\n"}));
+    EXPECT_EQ(logged(),
+              (Lines{failedCheck("replySize <= offeredSize"), transportFailed(-5, "LibCall"),
+                     "KSTLib: KSTSetEnvironmentVariable: returning, err = -5.\n"}));
     EXPECT_EQ(printed(), "KST: LibCall_KSTSetEnvironmentVariable: returning, err = -5.\n");
 }
 
@@ -106,10 +107,12 @@ TEST_F(EnvironmentVariables, FailuresPassThrough) {
         channel.structStatus = status;
         EXPECT_EQ(KSTSetEnvironmentVariable(5, "a", 1), status);
         EXPECT_EQ(KSTGetEnvironmentVariable(5, block), status);
-        ASSERT_EQ(logged().size(), 4U);
+        ASSERT_EQ(logged().size(), 6U);
         const std::string end = ": returning, err = " + std::to_string(status) + ".\n";
-        EXPECT_EQ(logged()[1], "KSTLib: KSTSetEnvironmentVariable" + end);
-        EXPECT_EQ(logged()[3], "KSTLib: KSTGetEnvironmentVariable" + end);
+        EXPECT_EQ(logged()[1], transportFailed(status, "LibCall"));
+        EXPECT_EQ(logged()[2], "KSTLib: KSTSetEnvironmentVariable" + end);
+        EXPECT_EQ(logged()[4], transportFailed(status, "LibCallBlock"));
+        EXPECT_EQ(logged()[5], "KSTLib: KSTGetEnvironmentVariable" + end);
     }
     EXPECT_TRUE(block.calls.empty());
 }
@@ -119,9 +122,9 @@ TEST_F(EnvironmentVariables, AbsentService) {
     EXPECT_EQ(KSTSetEnvironmentVariable(5, "a", 1), kKSTErrorUnexpected);
     EXPECT_EQ(KSTGetEnvironmentVariable(5, block), kKSTErrorUnexpected);
     EXPECT_TRUE(block.calls.empty());
-    EXPECT_EQ(logged(), (Lines{failedCheck("service"),
+    EXPECT_EQ(logged(), (Lines{failedCheck("service"), transportFailed(-5, "LibCall"),
                                "KSTLib: KSTSetEnvironmentVariable: returning, err = -5.\n",
-                               failedCheck("service"),
+                               failedCheck("service"), transportFailed(-5, "LibCallBlock"),
                                "KSTLib: KSTGetEnvironmentVariable: returning, err = -5.\n"}));
 }
 

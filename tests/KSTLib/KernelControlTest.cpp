@@ -72,6 +72,7 @@ TEST_F(LibraryKernelControl, AbsentServiceGivesExactlyTheseLines) {
     EXPECT_EQ(KSTKernelControl(6, Bytes(32).data(), 32, nullptr), kKSTErrorUnexpected);
     EXPECT_EQ(logged(),
               (Lines{"KSTLib: AssertMacros: service (value: 0x0),  file: KSTLib/KSTLib:<n>\n",
+                     transportFailed(-5, "LibCallBlock"),
                      "KSTLib: KSTKernelControl: returning, err = -5.\n"}));
     EXPECT_EQ(printed(), "KST: LibCall_KSTKernelControl_Block: returning, err = -5.\n");
 }
@@ -106,8 +107,9 @@ TEST_F(LibraryKernelControl, ReplyGoesToTheBlock) {
 TEST_F(LibraryKernelControl, ReplyBeyondWhatWasOffered) {
     channel.reportedSize = 257;
     EXPECT_EQ(KSTKernelControl(7, nullptr, 0, block), kKSTErrorUnexpected);
-    EXPECT_EQ(logged(), (Lines{failedCheck("replySize <= offeredSize"),
-                               "KSTLib: KSTKernelControl: returning, err = -5.\n"}));
+    EXPECT_EQ(logged(),
+              (Lines{failedCheck("replySize <= offeredSize"), transportFailed(-5, "LibCallBlock"),
+                     "KSTLib: KSTKernelControl: returning, err = -5.\n"}));
     ASSERT_EQ(block.calls.size(), 1U);
     EXPECT_EQ(block.calls.front().length, 256U);
 }
@@ -118,7 +120,8 @@ TEST_F(LibraryKernelControl, StatusesPassThrough) {
         log.clear();
         channel.structStatus = status;
         EXPECT_EQ(KSTKernelControl(7, "a", 1, block), status);
-        ASSERT_EQ(logged().size(), 2U);
+        ASSERT_EQ(logged().size(), 3U);
+        EXPECT_EQ(logged()[1], transportFailed(status, "LibCallBlock"));
         EXPECT_EQ(logged().back(),
                   "KSTLib: KSTKernelControl: returning, err = " + std::to_string(status) + ".\n");
         EXPECT_EQ(block.calls.back().length, 256U);
@@ -138,8 +141,8 @@ TEST_F(LibraryKernelControl, EachAllocationFailedInTurn) {
             break;
         }
         EXPECT_EQ(status, kKSTErrorOutOfMemory);
-        EXPECT_EQ(logged(),
-                  (Lines{failedCheck("cmd"), "KSTLib: KSTKernelControl: returning, err = -4.\n"}));
+        EXPECT_EQ(logged(), (Lines{failedCheck("cmd"), transportFailed(-4, "LibCallBlock"),
+                                   "KSTLib: KSTKernelControl: returning, err = -4.\n"}));
         EXPECT_TRUE(channel.structCalls.empty());
     }
     EXPECT_EQ(refused, 1U);

@@ -47,14 +47,15 @@ TEST_F(LogLevel, Successes) {
 
 TEST_F(LogLevel, Failures) {
     const std::string check = failedCheck("err == 0 ", "0xfffffffffffffff7");
+    const std::string transport = transportFailed(-9, "LibCallBlock");
     for (const int level : {0, 29, 30}) {
-        EXPECT_EQ(linesAt(level, -9), (Lines{kCalled, check, kFailed})) << level;
+        EXPECT_EQ(linesAt(level, -9), (Lines{kCalled, check, transport, kFailed})) << level;
     }
     for (const int level : {31, 40, 69, 70}) {
-        EXPECT_EQ(linesAt(level, -9), (Lines{check, kFailed})) << level;
+        EXPECT_EQ(linesAt(level, -9), (Lines{check, transport, kFailed})) << level;
     }
     for (const int level : {71, 255}) {
-        EXPECT_EQ(linesAt(level, -9), Lines{check}) << level;
+        EXPECT_EQ(linesAt(level, -9), (Lines{check, transport})) << level;
     }
 }
 

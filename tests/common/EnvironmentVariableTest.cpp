@@ -107,6 +107,7 @@ TEST_F(SetVariable, NoTransportIsFoundBeforeBadData) {
 
 TEST_F(SetVariable, StatusesPassThrough) {
     std::string expected;
+    Lines lines;
     for (const KSTStatus status : {std::numeric_limits<KSTStatus>::min(), -6007, -1110, -7, -5, -1,
                                    1, std::numeric_limits<KSTStatus>::max()}) {
         transport.status = status;
@@ -114,9 +115,10 @@ TEST_F(SetVariable, StatusesPassThrough) {
         expected +=
             "KST: LibCall_KSTSetEnvironmentVariable: returning, err = " + std::to_string(status) +
             ".\n";
+        lines.push_back(transportFailed(status, "LibCall"));
     }
     EXPECT_EQ(printed(), expected);
-    EXPECT_TRUE(logged().empty());
+    EXPECT_EQ(logged(), lines);
 }
 
 TEST_F(SetVariable, NothingIsWrittenWithoutALog) {
@@ -172,14 +174,16 @@ TEST_F(GetVariable, MoreThanWasOfferedIsRefusedBeforeAnyUse) {
 }
 
 TEST_F(GetVariable, FailureDoesNotCallTheBlock) {
+    Lines lines;
     for (const KSTStatus status : {std::numeric_limits<KSTStatus>::min(), -1110, -5, 1}) {
         transport.status = status;
         transport.reply = {1, 2, 3};
         transport.reportedSize = 3;
         EXPECT_EQ(get(), status);
+        lines.push_back(transportFailed(status, "LibCallBlock"));
     }
     EXPECT_TRUE(block.calls.empty());
-    EXPECT_TRUE(logged().empty());
+    EXPECT_EQ(logged(), lines);
     EXPECT_EQ(printed(),
               "KST: LibCall_KSTGetEnvironmentVariable_Block: returning, err = -2147483648.\n"
               "KST: LibCall_KSTGetEnvironmentVariable_Block: returning, err = -1110.\n"

@@ -131,7 +131,7 @@ TEST_F(KernelControl, FailureThatSetNoSizeGivesTheWholeBuffer) {
     ASSERT_EQ(block.calls.size(), 1U);
     EXPECT_EQ(block.calls.front().bytes, Bytes(256, 0));
     EXPECT_EQ(printed(), "KST: LibCall_KSTKernelControl_Block: returning, err = -1110.\n");
-    EXPECT_TRUE(logged().empty());
+    EXPECT_EQ(logged(), Lines{transportFailed(-1110, "LibCallBlock")});
 }
 
 TEST_F(KernelControl, FailureThatSetASizeGivesThatMuch) {
@@ -166,7 +166,7 @@ TEST_F(KernelControl, FailureThatClaimsMoreThanWasOfferedKeepsItsStatus) {
     transport.reportedSize = 257;
     EXPECT_EQ(control("a", 1, block), -1104);
     expectBlockGotNothing();
-    EXPECT_TRUE(logged().empty());
+    EXPECT_EQ(logged(), Lines{transportFailed(-1104, "LibCallBlock")});
 }
 
 TEST_F(KernelControl, StatusesPassThrough) {
@@ -174,6 +174,8 @@ TEST_F(KernelControl, StatusesPassThrough) {
                                    1, std::numeric_limits<KSTStatus>::max()}) {
         transport.status = status;
         EXPECT_EQ(control("a", 1, block), status);
+        EXPECT_EQ(logged(), Lines{transportFailed(status, "LibCallBlock")});
+        log.clear();
     }
     EXPECT_EQ(block.calls.size(), 8U);
     EXPECT_NE(printed().find("err = -2147483648.\n"), std::string::npos);

@@ -8,7 +8,9 @@
 
 #include <gtest/gtest.h>
 
+#include <cstdint>
 #include <optional>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -31,6 +33,15 @@ class LibraryFixture : public testing::Test {
 
     /// The lines in the log, with <n> for the line number of an assertion line.
     [[nodiscard]] std::vector<std::string> logged() const { return textsWithoutLineNumbers(log); }
+
+    /// The line of a LibCall function of `source`, "LibCall" or "LibCallBlock", whose transport
+    /// returned `status`, as `logged` shows it.
+    static std::string transportFailed(std::int32_t status, const std::string& source) {
+        std::ostringstream line;
+        line << "KST: AssertMacros: err == 0  (value: 0x" << std::hex << std::int64_t{status}
+             << "),  file: common/" << source << ":<n>\n";
+        return line.str();
+    }
 
     [[nodiscard]] std::string printed() const { return output->text(); }
 

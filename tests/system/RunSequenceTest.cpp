@@ -141,6 +141,8 @@ TEST_F(RunSequenceTest, KernelAbsentAtTheStartAndPresentLater) {
                             "kstd: -[DeviceRestrictedModeService loadDataBlob:]: called, filePath "
                             "= /var/root/.usbrestrictedmode_analytics.",
                             "KSTLib: AssertMacros: service (value: 0x0),  file: KSTLib/KSTLib:<n>",
+                            "KST: AssertMacros: err == 0  (value: 0xfffffffffffffffb),  file: "
+                            "common/LibCallBlock:<n>",
                             "KST: LibCall_KSTKernelControl_Block: returning, err = -5.",
                             "KSTLib: KSTKernelControl: returning, err = -5.",
                             "kstd: AssertMacros: err == 0  (value: 0xfffffffffffffffb),  file: "

@@ -99,6 +99,8 @@ TEST_F(LifecycleTest, FailedRequest6EndsTheStartBeforeTheStateFileAndTheSettings
                 ElementsAre(kLoadAnalytics,
                             "KSTLib: AssertMacros: err == 0  (value: 0xffffffffffffffd6),  file: "
                             "KSTLib/KSTLib:#",
+                            "KST: AssertMacros: err == 0  (value: 0xffffffffffffffd6),  file: "
+                            "common/LibCallBlock:#",
                             "KSTLib: KSTKernelControl: returning, err = -42.",
                             assertion("err == 0 ", "ffffffffffffffd6"),
                             notified("returning, err = -5.")));
@@ -135,6 +137,8 @@ TEST_F(LifecycleTest, StartWithAnAnalyticsFileWhileTheKernelIsAbsent) {
                     "kstd: -[DeviceRestrictedModeService loadDataBlob:]: called, filePath = "
                     "/var/root/.usbrestrictedmode_analytics.",
                     "KSTLib: AssertMacros: service (value: 0x0),  file: KSTLib/KSTLib:#",
+                    "KST: AssertMacros: err == 0  (value: 0xfffffffffffffffb),  file: "
+                    "common/LibCallBlock:#",
                     "KSTLib: KSTKernelControl: returning, err = -5.",
                     "kstd: AssertMacros: err == 0  (value: 0xfffffffffffffffb),  file: "
                     "kstd/DeviceRestrictedMode/DeviceRestrictedModeService:#",

@@ -135,6 +135,8 @@ TEST_F(NotificationsTest, FailedAcknowledgementGivesMinus5WithTheKernelsCodeInTh
                 ElementsAre(acknowledging("XXX Daemon: SENDING ACK P."),
                             "KSTLib: AssertMacros: err == 0  (value: 0xfffffffffffffed4),  file: "
                             "KSTLib/KSTLib:#",
+                            "KST: AssertMacros: err == 0  (value: 0xfffffffffffffed4),  file: "
+                            "common/LibCallBlock:#",
                             "KSTLib: KSTKernelControl: returning, err = -300.",
                             assertion("err == 0 ", "fffffffffffffed4"),
                             acknowledging("returning, err = -5.")));
