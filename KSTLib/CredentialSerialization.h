@@ -67,8 +67,9 @@ void DeallocCredential(KSTCredential* credential) KST_PUBLIC;
  *  | 9                 | 8 to 23                                                             |
  *  | 10                | 4 to 35                                                             |
  *
- *  as far as the data areas reach. A stored passphrase length above 128 counts as 128. When type or
- *  dataLength differ, a type outside 1 to 12 is no error: they are not equal. */
+ *  as far as the data areas reach. Two passphrases are the same when their lengths are, as stored,
+ *  and the bytes that these count, of which at most 128 are looked at. When type or dataLength
+ *  differ, a type outside 1 to 12 is no error: they are not equal. */
 KSTStatus CompareCredentials(const KSTCredential* credential1, const KSTCredential* credential2,
                              uint8_t* outEqual) KST_PUBLIC;
 

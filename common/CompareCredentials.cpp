@@ -33,15 +33,14 @@ bool haveEqualData(const KSTCredential* a, const KSTCredential* b, const Range& 
     return areEqual(range.of(kst::credentialData(a)), range.of(kst::credentialData(b)));
 }
 
-/// Everything about two passphrases but the headers.
+/// Everything about two passphrases but the headers. The lengths count as they are stored, also
+/// those that no passphrase can have.
 bool areEqualPassphrases(const KSTCredential* a, const KSTCredential* b) {
     using Data = KSTCredentialDataPassphraseEntered;
-    const auto passphraseOf = [](const KSTCredential* credential) {
-        const Range range{offsetof(Data, passphrase), kst::passphraseLength(credential)};
-        return range.of(kst::credentialData(credential));
-    };
     return haveEqualData(a, b, {offsetof(Data, purpose), sizeof(Data::purpose)}) &&
-           areEqual(passphraseOf(a), passphraseOf(b));
+           haveEqualData(a, b,
+                         {offsetof(Data, passphraseLength), sizeof(Data::passphraseLength)}) &&
+           haveEqualData(a, b, {offsetof(Data, passphrase), kst::passphraseLength(a)});
 }
 
 /// For two credentials of the same valid type and the same length.

@@ -92,10 +92,23 @@ TEST_F(CompareCredentials, PassphrasesByTheirOwnLengths) {
     EXPECT_EQ(areEqual(passphrase(127), other), 1);
 }
 
-TEST_F(CompareCredentials, StoredLengthAbove128CountsAs128) {
-    for (const std::uint32_t length : {129U, 0x80000000U, 0xffffffffU}) {
-        EXPECT_EQ(areEqual(passphrase(128), passphrase(length)), 1);
+TEST_F(CompareCredentials, LengthsCountAsStoredAndOfTheBytesAtMost128) {
+    for (const std::uint32_t length : {128U, 129U, 0x80000000U, 0xffffffffU}) {
+        SCOPED_TRACE(length);
+        EXPECT_EQ(areEqual(passphrase(length), passphrase(length)), 1);
+        EXPECT_EQ(areEqual(passphrase(length - 1), passphrase(length)), 0);
         EXPECT_EQ(areEqual(passphrase(127), passphrase(length)), 0);
+        Bytes other = passphrase(length);
+        other.back() = 0;
+        EXPECT_EQ(areEqual(passphrase(length), other), 0);
+        // What stands behind the 128 bytes is no part of the passphrase.
+        Bytes longer = passphrase(length);
+        Bytes another = passphrase(length);
+        for (Bytes* bytes : {&longer, &another}) {
+            bytes->resize(bytes->size() + 8, bytes == &longer ? 1 : 2);
+            support::putU32(*bytes, 28, 136 + 8);
+        }
+        EXPECT_EQ(areEqual(longer, another), 1);
     }
 }
 
