@@ -51,7 +51,8 @@ KST_BLOCK(KSTDataBlock, const void* data, size_t length);
 /** Gets one property: its number and its `length` bytes at `data`. */
 KST_BLOCK(KSTPropertyBlock, uint32_t propertyId, const void* data, size_t length);
 
-/** Gets one requirement, which is not the block's to free. */
+/** Gets one requirement, which is not the block's to free; null for an empty place in a tree that
+ *  the caller put together. */
 KST_BLOCK(KSTRequirementBlock, const KSTRequirement* requirement);
 
 /** Gets how the call ended, and `length` bytes at `data`, which are wiped after it. */

@@ -16,8 +16,7 @@ KSTStatus getProperties(const KSTRequirement* requirement,
         return err;
     }
     for (const kst::RequirementProperty& property : kst::requirementProperties()) {
-        if (property.enumeratedLength > 0 && property.belongsTo(requirement) &&
-            property.fitsIn(requirement)) {
+        if (property.isEnumeratedFor(requirement)) {
             processProperty.invoke(processProperty.captured, property.id, property.in(requirement),
                                    property.enumeratedLength);
         }

@@ -55,14 +55,17 @@ KSTStatus KSTRequirementGetProperty(const KSTRequirement* requirement, uint32_t 
 
 /** Calls `processProperty` with every property of `requirement`, in the order 1, 2, 3, 100, 200,
  *  300, 302, 301, 700, and with the table's own lengths: who wants the whole of a property asks for
- *  it alone. A property that the requirement's data are too short for is left out.
+ *  it alone. A property is there when the requirement's data have the bytes that it is given with,
+ *  and left out otherwise; for the whole of it the data may still be too short.
  *
  *  kKSTErrorBadParameter: `requirement` is null or `processProperty` is a null block. */
 KSTStatus KSTRequirementGetProperties(const KSTRequirement* requirement,
                                       KSTPropertyBlock processProperty) KST_PUBLIC;
 
 /** Calls `processSubrequirement` with each child of `requirement`, in order; a leaf has none. The
- *  children belong to the tree. A null requirement and a null block are logged and ignored. */
+ *  children belong to the tree. A tree that this library has read has no null child; where a tree
+ *  that the caller put together has one, the block is called with null. A null requirement and a
+ *  null block are logged and ignored. */
 void KSTRequirementGetSubrequirements(const KSTRequirement* requirement,
                                       KSTRequirementBlock processSubrequirement) KST_PUBLIC;
 

@@ -28,9 +28,16 @@ struct RequirementProperty {
         return type == kEveryType || type == requirement->type;
     }
 
-    /// Whether the data of `requirement` reach as far as the property does.
+    /// Whether the data of `requirement` have the whole property.
     [[nodiscard]] bool fitsIn(const KSTRequirement* requirement) const {
         return offset + length <= sizeof(KSTRequirement) + requirement->dataLength;
+    }
+
+    /// Whether the enumeration gives the property, and the data of `requirement` have what it
+    /// gives of it.
+    [[nodiscard]] bool isEnumeratedFor(const KSTRequirement* requirement) const {
+        return enumeratedLength > 0 && belongsTo(requirement) &&
+               offset + enumeratedLength <= sizeof(KSTRequirement) + requirement->dataLength;
     }
 
     [[nodiscard]] const std::uint8_t* in(const KSTRequirement* requirement) const {

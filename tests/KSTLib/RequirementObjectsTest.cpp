@@ -103,12 +103,16 @@ TEST_F(RequirementObjects, EnumerationLeavesOutWhatIsNotThere) {
         {0, {1, 2, 3}},
         {3, {1, 2, 3}},
         {4, {1, 2, 3, 100}},
-        {12, {1, 2, 3, 100}},
-        {19, {1, 2, 3, 100}},
-        {20, {1, 2, 3, 100, 300}},
-        {35, {1, 2, 3, 100, 300}},
-        {36, {1, 2, 3, 100, 300, 302}},
-        {67, {1, 2, 3, 100, 300, 302}},
+        {11, {1, 2, 3, 100}},
+        {12, {1, 2, 3, 100, 300}},
+        {13, {1, 2, 3, 100, 300}},
+        {27, {1, 2, 3, 100, 300}},
+        {28, {1, 2, 3, 100, 300, 302}},
+        {29, {1, 2, 3, 100, 300, 302}},
+        {43, {1, 2, 3, 100, 300, 302}},
+        {44, {1, 2, 3, 100, 300, 302, 301}},
+        {45, {1, 2, 3, 100, 300, 302, 301}},
+        {67, {1, 2, 3, 100, 300, 302, 301}},
         {68, {1, 2, 3, 100, 300, 302, 301}},
     };
     for (const auto& [length, expected] : byLength) {
@@ -117,6 +121,20 @@ TEST_F(RequirementObjects, EnumerationLeavesOutWhatIsNotThere) {
             ids.push_back(property.id);
         }
         EXPECT_EQ(ids, expected) << length;
+    }
+}
+
+TEST_F(RequirementObjects, WhatIsEnumeratedInPartIsReadOnlyAsAWhole) {
+    const std::pair<std::uint32_t, std::size_t> wholeLengths[] = {{300, 20}, {302, 36}, {301, 68}};
+    const void* data = nullptr;
+    std::size_t length = 0;
+    for (const auto& [id, whole] : wholeLengths) {
+        Bytes bytes = leafBytes(3, static_cast<std::uint32_t>(whole - 1));
+        EXPECT_EQ(KSTRequirementGetPropertyData(asRequirement(bytes), id, &data, &length), -3);
+        EXPECT_EQ(data, nullptr) << id;
+        bytes = leafBytes(3, static_cast<std::uint32_t>(whole));
+        EXPECT_EQ(KSTRequirementGetPropertyData(asRequirement(bytes), id, &data, &length), 0);
+        data = nullptr;
     }
 }
 
@@ -143,6 +161,12 @@ TEST_F(RequirementObjects, ChildrenInOrder) {
     for (const std::uint32_t type : support::kLeafTypes) {
         Bytes leaf = leafBytes(type, 100);
         EXPECT_TRUE(childrenOf(leaf).empty());
+    }
+    // A slot that nothing was put into is handed over as it is.
+    for (const std::uint32_t type : support::kCompositeTypes) {
+        Bytes sparse = support::compositeInMemory(type, {nullptr, asRequirement(first), nullptr});
+        EXPECT_EQ(childrenOf(sparse),
+                  (std::vector<const KSTRequirement*>{nullptr, asRequirement(first), nullptr}));
     }
     Bytes inMemory = leafBytes(1000, 100);
     EXPECT_TRUE(childrenOf(inMemory).empty());
