@@ -4,11 +4,11 @@
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
 #include "KSTLib/TemporaryContext.h"
-#include "base/ByteReader.h"
 #include "common/CredentialCommands.h"
 #include "common/RequiredArguments.h"
+#include "common/WipedBytes.h"
 
-#include <array>
+#include <algorithm>
 
 namespace {
 
@@ -44,7 +44,7 @@ KSTStatus isContained(std::uint32_t code, KSTContextRef context, std::uint32_t n
     if (err == kKSTErrorSuccess) {
         err = kst::openChannel();
     }
-    std::array<std::uint8_t, sizeof(std::uint32_t)> reply{};
+    kst::WipedBytes<sizeof(std::uint32_t)> reply;
     std::size_t outSize = reply.size();
     if (err == kKSTErrorSuccess) {
         err = kst::sendNumbers(kst::librarySender(), code, context, number, argument, reply.data(),
@@ -53,9 +53,9 @@ KSTStatus isContained(std::uint32_t code, KSTContextRef context, std::uint32_t n
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    std::uint32_t contained = 0;
-    static_cast<void>(base::ByteReader(reply).readU32(contained));
-    return contained != 0 ? kKSTErrorSuccess : kKSTErrorNotContained;
+    const bool contained = std::any_of(reply.data(), reply.data() + reply.size(),
+                                       [](std::uint8_t byte) { return byte != 0; });
+    return contained ? kKSTErrorSuccess : kKSTErrorNotContained;
 }
 
 KSTStatus addGlobally(const KSTCredential* credential) {

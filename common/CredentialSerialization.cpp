@@ -30,18 +30,22 @@ KSTStatus measure(const KSTCredential* credential, std::size_t& size) {
     return kKSTErrorSuccess;
 }
 
-/// Reads and checks the header at the start of `buffer`.
-KSTStatus readHeader(const void* buffer, std::size_t size, KSTCredential& header) {
+/// Checks the header at the start of `buffer`, of which no copy is made, and stores its
+/// `dataLength`.
+KSTStatus checkHeader(const void* buffer, std::size_t size, std::uint32_t& dataLength) {
     const kst::AssertionContext context = kst::serializationContext();
     base::ByteReader reader(buffer, size);
-    if (!reader.readBytes(&header, sizeof header)) {
+    std::uint32_t number = 0;
+    if (size < sizeof(KSTCredential) || !reader.readU32(number) ||
+        !reader.skip(offsetof(KSTCredential, dataLength) - sizeof number) ||
+        !reader.readU32(dataLength)) {
         return kst::fail(context, "size >= sizeof(KSTCredential)", 0, kKSTErrorBadParameter);
     }
-    const kst::CredentialType* type = kst::findCredentialType(header.type);
+    const kst::CredentialType* type = kst::findCredentialType(number);
     if (type == nullptr) {
         return kst::fail(context, "0", 0, kKSTErrorBadParameter);
     }
-    if (header.dataLength != type->dataSize) {
+    if (dataLength != type->dataSize) {
         return kst::fail(context, type->sizeCheck, 0, kKSTErrorBadParameter);
     }
     return kKSTErrorSuccess;
@@ -86,16 +90,16 @@ KSTStatus DeserializeCredential(const void* buffer, std::size_t size, KSTCredent
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    KSTCredential header{};
-    err = readHeader(buffer, size, header);
+    std::uint32_t dataLength = 0;
+    err = checkHeader(buffer, size, dataLength);
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    KSTCredential* credential = newCredential(header.dataLength);
+    KSTCredential* credential = newCredential(dataLength);
     if (credential == nullptr) {
         return kst::fail(context, "cred", 0, kKSTErrorOutOfMemory);
     }
-    const std::size_t wholeSize = kst::credentialSize(header.dataLength);
+    const std::size_t wholeSize = kst::credentialSize(dataLength);
     if (wholeSize > size) {
         DeallocCredential(credential);
         return kst::fail(context, "size >= credSize", 0, kKSTErrorBadParameter);

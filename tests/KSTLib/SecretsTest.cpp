@@ -11,6 +11,7 @@
 
 #include <gtest/gtest.h>
 
+#include <array>
 #include <functional>
 #include <memory>
 
@@ -50,6 +51,61 @@ class ForgetfulChannel : public platform::KernelChannel {
         *outputs = 40;
         return 0;
     }
+};
+
+constexpr support::OwnStack::TurnedWord kTurnedWord = {0x6a, 0x15, 0xc8, 0x37};
+
+/// Fills memory with one word again and again, byte by byte, so that filling leaves no copy.
+void fillWithSecret(void* memory, std::size_t size) {
+    auto* bytes = static_cast<std::uint8_t*>(memory);
+    for (std::size_t i = 0; i < size; ++i) {
+        bytes[i] = static_cast<std::uint8_t>(~kTurnedWord[i % kTurnedWord.size()]);
+    }
+}
+
+/// Fills every reply with secrets, and then succeeds or not.
+class TalkativeChannel : public ForgetfulChannel {
+  public:
+    platform::Status structCall(platform::ConnectionHandle /*connection*/,
+                                std::uint32_t /*selector*/, const void* /*input*/,
+                                std::size_t /*inputSize*/, void* output,
+                                std::size_t* outputSize) override {
+        fillWithSecret(output, *outputSize);
+        return status;
+    }
+};
+
+/// A library that is called on a stack of its own.
+class SecretsOnTheStack : public testing::Test {
+  protected:
+    void SetUp() override {
+        kst::installPlatform({log, registry, channel});
+        fillWithSecret(secret.data(), secret.size());
+        ASSERT_EQ(LibCall_KSTContextCreate(kst::channelTransport, &context, nullptr), 0);
+    }
+
+    void TearDown() override {
+        static_cast<void>(KSTContextDelete(context, false));
+        kst::removePlatform();
+    }
+
+    /// How many copies a call leaves behind that returns `expected`.
+    std::size_t copiesAfter(const std::function<KSTStatus()>& call, KSTStatus expected) {
+        support::OwnStack stack;
+        KSTStatus seen = 0;
+        stack.run([&] { seen = call(); });
+        EXPECT_EQ(seen, expected);
+        return stack.places(kTurnedWord);
+    }
+
+    static void look(const void* /*data*/, std::size_t /*length*/) {}
+
+    support::RecordingLog log;
+    support::ScriptedRegistry registry;
+    TalkativeChannel channel;
+    support::StandardOutputCapture output;
+    std::array<std::uint8_t, 256> secret{};
+    KSTContextRef context = nullptr;
 };
 
 class Secrets : public testing::Test {
@@ -156,4 +212,96 @@ TEST_F(Secrets, NoneAfterReading) {
     }
     ::explicit_bzero(payload.get(), size);
     EXPECT_EQ(copies(), 0U);
+}
+
+TEST_F(SecretsOnTheStack, ScanFindsACopy) {
+    EXPECT_EQ(copiesAfter([] { return 0; }, 0), 0U);
+    EXPECT_EQ(copiesAfter(
+                  [] {
+                      std::uint8_t copy[9] = {};
+                      fillWithSecret(copy, sizeof copy);
+                      return 0;
+                  },
+                  0),
+              2U);
+}
+
+TEST_F(SecretsOnTheStack, NoneOfARequestOrAReply) {
+    struct Call {
+        const char* name;
+        std::function<KSTStatus()> call;
+    };
+    const Call kCalls[] = {
+        {"contains type",
+         [this] {
+             return KSTContextContainsCredentialType(context, 1);
+         }},
+        {"contains passphrase",
+         [this] {
+             return KSTContextContainsPassphraseCredentialWithPurpose(context, 1, 0);
+         }},
+        {"create",
+         [] {
+             KSTContextRef made = nullptr;
+             const KSTStatus status = KSTContextCreate(&made);
+             return status == 0 ? KSTContextDelete(made, false) : status;
+         }},
+        {"create over a transport",
+         [] {
+             KSTContextRef made = nullptr;
+             const KSTStatus status =
+                 LibCall_KSTContextCreate(kst::channelTransport, &made, nullptr);
+             return status == 0 ? KSTContextDelete(made, false) : status;
+         }},
+        {"open by external form",
+         [this] {
+             KSTContextRef same = KSTContextCreateWithExternalForm(secret.data(), 16);
+             return same != nullptr ? KSTContextDelete(same, false) : channel.status;
+         }},
+        {"set variable",
+         [this] {
+             return KSTSetEnvironmentVariable(1, secret.data(), 64);
+         }},
+        {"get variable",
+         [] {
+             return KSTGetEnvironmentVariable(1, look);
+         }},
+        {"kernel control",
+         [this] {
+             return KSTKernelControl(1, secret.data(), secret.size(), look);
+         }},
+        {"parse",
+         [this] {
+             return KSTParseAclAndCopyConstraintCharacteristics(
+                 secret.data(), secret.size(), [](KSTStatus, const void*, std::size_t) {});
+         }},
+    };
+    for (const Call& call : kCalls) {
+        for (const KSTStatus status : {0, -9}) {
+            channel.status = status;
+            EXPECT_EQ(copiesAfter(call.call, status), 0U) << call.name << ", status " << status;
+        }
+    }
+}
+
+TEST_F(SecretsOnTheStack, NoneOfACredentialThatIsReadAndWritten) {
+    std::array<std::uint8_t, 168> bytes{};
+    fillWithSecret(bytes.data(), bytes.size());
+    const std::uint32_t type = kKSTCredentialTypePassphraseEntered;
+    const std::uint32_t dataLength = 136;
+    std::memcpy(bytes.data(), &type, sizeof type);
+    std::memcpy(bytes.data() + 28, &dataLength, sizeof dataLength);
+    const auto readAndWrite = [&bytes](std::size_t size) {
+        KSTCredential* credential = nullptr;
+        std::size_t consumed = 0;
+        KSTStatus status = DeserializeCredential(bytes.data(), size, &credential, &consumed);
+        if (status == 0) {
+            std::size_t room = bytes.size();
+            status = SerializeCredential(credential, bytes.data(), &room);
+            DeallocCredential(credential);
+        }
+        return status;
+    };
+    EXPECT_EQ(copiesAfter([&] { return readAndWrite(bytes.size()); }, 0), 0U);
+    EXPECT_EQ(copiesAfter([&] { return readAndWrite(bytes.size() - 1); }, -3), 0U);
 }

@@ -7,9 +7,12 @@
 #include <cstring>
 #include <fcntl.h>
 #include <fstream>
+#include <functional>
+#include <pthread.h>
 #include <stdexcept>
 #include <string>
 #include <string_view>
+#include <sys/mman.h>
 #include <unistd.h>
 
 namespace support {
@@ -100,6 +103,65 @@ class MemoryScan {
     Turned turned_;
     int memory_;
     std::array<std::uint8_t, 65536> buffer_{};
+};
+
+/// A stack that one piece of work has for itself, and that can be looked at afterwards: nobody else
+/// has written over what was left on it.
+class OwnStack {
+  public:
+    /// Four bytes with their bits turned round, as with MemoryScan.
+    using TurnedWord = std::array<std::uint8_t, 4>;
+
+    OwnStack()
+        : bytes_(
+              ::mmap(nullptr, kSize, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0)) {
+        if (bytes_ == MAP_FAILED) {
+            throw std::runtime_error("no memory for a stack");
+        }
+    }
+    OwnStack(const OwnStack&) = delete;
+    OwnStack& operator=(const OwnStack&) = delete;
+    ~OwnStack() { ::munmap(bytes_, kSize); }
+
+    /// Runs `work` to its end.
+    void run(std::function<void()> work) {
+        pthread_attr_t attributes;
+        pthread_t thread{};
+        ::pthread_attr_init(&attributes);
+        const bool runs = ::pthread_attr_setstack(&attributes, bytes_, kSize) == 0 &&
+                          ::pthread_create(&thread, &attributes, callWork, &work) == 0 &&
+                          ::pthread_join(thread, nullptr) == 0;
+        ::pthread_attr_destroy(&attributes);
+        if (!runs) {
+            throw std::runtime_error("no thread on a stack of its own");
+        }
+    }
+
+    /// How many places on the stack hold the four bytes.
+    [[nodiscard]] std::size_t places(const TurnedWord& turned) const {
+        // Not through functions of the C library, which a sanitizer would stop here.
+        const auto* at = static_cast<const volatile std::uint8_t*>(bytes_);
+        std::size_t found = 0;
+        for (std::size_t i = 0; i + turned.size() <= kSize; ++i) {
+            std::size_t equal = 0;
+            while (equal < turned.size() &&
+                   static_cast<std::uint8_t>(~at[i + equal]) == turned[equal]) {
+                ++equal;
+            }
+            found += equal == turned.size() ? 1 : 0;
+        }
+        return found;
+    }
+
+  private:
+    static constexpr std::size_t kSize = 1U << 20U;
+
+    static void* callWork(void* work) {
+        (*static_cast<std::function<void()>*>(work))();
+        return nullptr;
+    }
+
+    void* bytes_;
 };
 
 } // namespace support
