@@ -7,7 +7,7 @@
 #include <array>
 #include <iterator>
 
-namespace sim {
+namespace keystrand::sim {
 
 namespace {
 
@@ -46,7 +46,7 @@ ControlOutcome list(const CredentialSet& credentials, Clock::Seconds now) {
 
 /// Of a context, or the global ones.
 ControlOutcome credentials(ControlContext& context, ControlArguments& arguments) {
-    const Clock::Seconds now = context.restrictedMode.clock().now();
+    const Clock::Seconds now = context.clock.now();
     if (!arguments.hasWord()) {
         const auto problem = arguments.problem();
         return problem ? ControlOutcome::failed(*problem)
@@ -105,4 +105,4 @@ std::span<const ControlCommand> clientStateCommands() {
     return kCommands;
 }
 
-} // namespace sim
+} // namespace keystrand::sim

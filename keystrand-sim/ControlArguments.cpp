@@ -5,7 +5,7 @@
 
 #include <algorithm>
 
-namespace sim {
+namespace keystrand::sim {
 
 namespace {
 
@@ -93,4 +93,4 @@ std::optional<std::string> ControlArguments::problem() const {
     return std::nullopt;
 }
 
-} // namespace sim
+} // namespace keystrand::sim

@@ -1,6 +1,7 @@
 #pragma once
 
-#include <charconv>
+#include "base/Digits.h"
+
 #include <concepts>
 #include <cstdint>
 #include <limits>
@@ -8,22 +9,9 @@
 #include <optional>
 #include <string>
 #include <string_view>
-#include <system_error>
 #include <vector>
 
-namespace sim {
-
-/// The whole of `text` as a decimal number of the type, or none.
-template <std::integral Number>
-[[nodiscard]] std::optional<Number> parseNumber(std::string_view text) {
-    Number value{};
-    const char* end = text.data() + text.size();
-    const auto result = std::from_chars(text.data(), end, value);
-    if (text.empty() || result.ec != std::errc() || result.ptr != end) {
-        return std::nullopt;
-    }
-    return value;
-}
+namespace keystrand::sim {
 
 /// The words of a control line, taken one by one. A word with '=' in it is a named value, any other
 /// stands for itself. The line outlives the arguments.
@@ -70,7 +58,7 @@ class ControlArguments {
   private:
     template <std::integral Number>
     Number inRange(std::string_view what, std::string_view text, Number min, Number max) {
-        const auto value = parseNumber<Number>(text);
+        const auto value = base::parseNumber<Number>(text);
         if (!value || *value < min || *value > max) {
             fail(what, "bad number");
             return min;
@@ -83,4 +71,4 @@ class ControlArguments {
     std::string problem_;
 };
 
-} // namespace sim
+} // namespace keystrand::sim

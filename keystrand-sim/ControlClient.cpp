@@ -11,7 +11,7 @@
 #include <unistd.h>
 #include <utility>
 
-namespace sim {
+namespace keystrand::sim {
 
 namespace {
 
@@ -134,4 +134,4 @@ void ControlClient::hangUp() {
     }
 }
 
-} // namespace sim
+} // namespace keystrand::sim

@@ -6,7 +6,7 @@
 #include <string_view>
 #include <vector>
 
-namespace sim {
+namespace keystrand::sim {
 
 /// A connection to the control socket of a running simulator. Calls block.
 class ControlClient {
@@ -53,4 +53,4 @@ class ControlClient {
     std::string received_;
 };
 
-} // namespace sim
+} // namespace keystrand::sim

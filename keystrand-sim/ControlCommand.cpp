@@ -5,7 +5,7 @@
 #include <array>
 #include <utility>
 
-namespace sim {
+namespace keystrand::sim {
 
 namespace {
 
@@ -88,4 +88,4 @@ ControlOutcome runControlLine(ControlContext& context, std::string_view line) {
     return ControlOutcome::failed("unknown command");
 }
 
-} // namespace sim
+} // namespace keystrand::sim

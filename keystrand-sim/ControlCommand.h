@@ -1,13 +1,14 @@
 #pragma once
 
 #include "keystrand-sim/ControlArguments.h"
-#include "keystrand-sim/EventSender.h"
 #include "keystrand-sim/FaultScript.h"
-#include "keystrand-sim/KernelSocketServer.h"
-#include "keystrand-sim/KernelState.h"
-#include "keystrand-sim/NotificationPublisher.h"
+#include "keystrand-sim/ManualClock.h"
 #include "keystrand-sim/RequestLog.h"
-#include "keystrand-sim/RestrictedModeController.h"
+#include "keystrand/EventSender.h"
+#include "keystrand/KernelSocketServer.h"
+#include "keystrand/KernelState.h"
+#include "keystrand/NotificationPublisher.h"
+#include "keystrand/RestrictedModeController.h"
 
 #include <chrono>
 #include <cstdint>
@@ -17,11 +18,12 @@
 #include <string_view>
 #include <vector>
 
-namespace sim {
+namespace keystrand::sim {
 
 /// What control commands work on.
 struct ControlContext {
     KernelState& kernel;
+    ManualClock& clock;
     RestrictedModeController& restrictedMode;
     NotificationPublisher& publisher;
     EventSender& events;
@@ -72,4 +74,4 @@ struct ControlCommand {
 /// Carries out one line.
 [[nodiscard]] ControlOutcome runControlLine(ControlContext& context, std::string_view line);
 
-} // namespace sim
+} // namespace keystrand::sim

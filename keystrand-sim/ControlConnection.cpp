@@ -10,7 +10,7 @@
 #include <sys/socket.h>
 #include <utility>
 
-namespace sim {
+namespace keystrand::sim {
 
 ControlConnection::ControlConnection(EventLoop& loop, base::FileDescriptor fd, Handlers handlers)
     : fd_(std::move(fd)),
@@ -138,4 +138,4 @@ void ControlConnection::endUnless(bool alive) const {
     }
 }
 
-} // namespace sim
+} // namespace keystrand::sim

@@ -2,7 +2,7 @@
 
 #include "base/FileDescriptor.h"
 #include "keystrand-sim/ControlCommand.h"
-#include "keystrand-sim/EventLoop.h"
+#include "keystrand/EventLoop.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -10,7 +10,7 @@
 #include <string>
 #include <string_view>
 
-namespace sim {
+namespace keystrand::sim {
 
 /// One client of the control socket: lines in, answers out, one after the other. While an answer is
 /// due or has not been read by the client, nothing more is read from it.
@@ -59,4 +59,4 @@ class ControlConnection {
     EventSource timeout_;
 };
 
-} // namespace sim
+} // namespace keystrand::sim

@@ -2,7 +2,7 @@
 
 #include <utility>
 
-namespace sim {
+namespace keystrand::sim {
 
 ControlSocket::ControlSocket(EventLoop& loop, ListeningSocket socket, const ControlContext& context)
     : loop_(loop),
@@ -27,4 +27,4 @@ std::unique_ptr<ControlConnection> ControlSocket::serve(base::FileDescriptor fd,
             .ended = std::move(ended)});
 }
 
-} // namespace sim
+} // namespace keystrand::sim

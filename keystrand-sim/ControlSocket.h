@@ -1,14 +1,14 @@
 #pragma once
 
-#include "keystrand-sim/ConnectionTable.h"
 #include "keystrand-sim/ControlCommand.h"
 #include "keystrand-sim/ControlConnection.h"
-#include "keystrand-sim/EventLoop.h"
+#include "keystrand/ConnectionTable.h"
+#include "keystrand/EventLoop.h"
 
 #include <cstddef>
 #include <memory>
 
-namespace sim {
+namespace keystrand::sim {
 
 /// Serves the control socket to a bounded number of clients.
 class ControlSocket {
@@ -28,4 +28,4 @@ class ControlSocket {
     Table connections_;
 };
 
-} // namespace sim
+} // namespace keystrand::sim

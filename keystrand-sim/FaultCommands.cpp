@@ -3,7 +3,7 @@
 
 #include <array>
 
-namespace sim {
+namespace keystrand::sim {
 
 namespace {
 
@@ -34,7 +34,7 @@ std::uint64_t takeTimes(ControlArguments& arguments) {
     if (*text == "always") {
         return FaultScript::kAlways;
     }
-    const auto times = parseNumber<std::uint64_t>(*text);
+    const auto times = base::parseNumber<std::uint64_t>(*text);
     if (!times || *times == 0) {
         arguments.fail("times", "bad number");
         return 1;
@@ -153,4 +153,4 @@ std::span<const ControlCommand> faultCommands() {
     return kFaultCommands;
 }
 
-} // namespace sim
+} // namespace keystrand::sim

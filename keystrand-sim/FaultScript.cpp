@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-namespace sim {
+namespace keystrand::sim {
 
 namespace {
 
@@ -92,4 +92,4 @@ std::size_t FaultScript::pending() const {
     return faults_.size() + hidden_.size() + (refusals_ > 0 ? 1U : 0U) + (entryPresent_ ? 0U : 1U);
 }
 
-} // namespace sim
+} // namespace keystrand::sim

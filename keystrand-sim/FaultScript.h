@@ -10,7 +10,7 @@
 #include <string_view>
 #include <vector>
 
-namespace sim {
+namespace keystrand::sim {
 
 /// What is known of a request before it is handled.
 struct RequestKind {
@@ -88,4 +88,4 @@ class FaultScript {
     bool entryPresent_ = true;
 };
 
-} // namespace sim
+} // namespace keystrand::sim

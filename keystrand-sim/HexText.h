@@ -7,7 +7,7 @@
 #include <string_view>
 #include <vector>
 
-namespace sim {
+namespace keystrand::sim {
 
 /// Two lower-case digits for each byte; the word `empty` for no bytes.
 [[nodiscard]] std::string toHexWord(std::span<const std::uint8_t> bytes);
@@ -16,4 +16,4 @@ namespace sim {
 /// else.
 [[nodiscard]] std::optional<std::vector<std::uint8_t>> fromHexWord(std::string_view word);
 
-} // namespace sim
+} // namespace keystrand::sim

@@ -4,7 +4,7 @@
 
 #include <array>
 
-namespace sim {
+namespace keystrand::sim {
 
 namespace {
 
@@ -96,4 +96,4 @@ std::span<const ControlCommand> kernelStateCommands() {
     return kKernelStateCommands;
 }
 
-} // namespace sim
+} // namespace keystrand::sim

@@ -4,7 +4,7 @@
 
 #include <limits>
 
-namespace sim {
+namespace keystrand::sim {
 
 std::optional<Options> parseOptions(int argc, const char* const* argv, int& exitStatus) {
     constexpr auto kMaxPeriod = std::numeric_limits<std::uint32_t>::max();
@@ -51,4 +51,4 @@ std::optional<Options> parseOptions(int argc, const char* const* argv, int& exit
     return options;
 }
 
-} // namespace sim
+} // namespace keystrand::sim

@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-namespace sim {
+namespace keystrand::sim {
 
 /// What the command line asks for.
 struct Options {
@@ -20,4 +20,4 @@ struct Options {
 [[nodiscard]] std::optional<Options> parseOptions(int argc, const char* const* argv,
                                                   int& exitStatus);
 
-} // namespace sim
+} // namespace keystrand::sim

@@ -1,6 +1,6 @@
 #include "keystrand-sim/Paths.h"
 
-namespace sim {
+namespace keystrand::sim {
 
 namespace {
 
@@ -20,4 +20,4 @@ Paths::Paths(const std::string& root)
       controlSocket(serviceDirectory + "/control.sock"),
       eventSocket(runDirectory + "/kstd/events.sock") {}
 
-} // namespace sim
+} // namespace keystrand::sim

@@ -2,7 +2,7 @@
 
 #include <string>
 
-namespace sim {
+namespace keystrand::sim {
 
 /// Where the program's sockets are, under its root directory.
 struct Paths {
@@ -15,4 +15,4 @@ struct Paths {
     std::string eventSocket;
 };
 
-} // namespace sim
+} // namespace keystrand::sim

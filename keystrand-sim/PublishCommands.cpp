@@ -6,7 +6,7 @@
 #include <algorithm>
 #include <array>
 
-namespace sim {
+namespace keystrand::sim {
 
 namespace {
 
@@ -36,8 +36,8 @@ ControlOutcome publishTimerRestarted(ControlContext& context, ControlArguments& 
 }
 
 ControlOutcome publishAnalyticsCollected(ControlContext& context, ControlArguments& arguments) {
-    const RestrictedModeController& controller = context.restrictedMode;
-    AnalyticsCollected values = controller.timer().analyticsCollected(controller.clock().now());
+    AnalyticsCollected values =
+        context.restrictedMode.timer().analyticsCollected(context.clock.now());
     override(arguments, "period", values.eventPeriodDuration);
     override(arguments, "restricted", values.restrictedModeDuration);
     override(arguments, "mode", values.restrictedMode);
@@ -62,8 +62,7 @@ ControlOutcome publishSaveAnalytics(ControlContext& context, ControlArguments& a
 
 ControlOutcome publishTimerRestartedAnalytics(ControlContext& context,
                                               ControlArguments& arguments) {
-    const RestrictedModeController& controller = context.restrictedMode;
-    std::uint32_t total = controller.timer().totalRestricted(controller.clock().now());
+    std::uint32_t total = context.restrictedMode.timer().totalRestricted(context.clock.now());
     override(arguments, "total", total);
     return publish(context, arguments, makeTimerRestartedAnalytics(total));
 }
@@ -111,4 +110,4 @@ std::span<const ControlCommand> publishCommands() {
     return kPublishCommands;
 }
 
-} // namespace sim
+} // namespace keystrand::sim

@@ -5,7 +5,7 @@
 #include <algorithm>
 #include <array>
 
-namespace sim {
+namespace keystrand::sim {
 
 namespace {
 
@@ -115,4 +115,4 @@ std::span<const ControlCommand> requestCommands() {
     return kRequestCommands;
 }
 
-} // namespace sim
+} // namespace keystrand::sim

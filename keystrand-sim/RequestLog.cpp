@@ -2,7 +2,7 @@
 
 #include <utility>
 
-namespace sim {
+namespace keystrand::sim {
 
 void RequestLog::setObserver(Observer observer) {
     observer_ = std::move(observer);
@@ -47,4 +47,4 @@ void RequestLog::dropOldest() {
     entries_.pop_front();
 }
 
-} // namespace sim
+} // namespace keystrand::sim

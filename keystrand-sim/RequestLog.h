@@ -8,7 +8,7 @@
 #include <optional>
 #include <vector>
 
-namespace sim {
+namespace keystrand::sim {
 
 /// One struct call that was received.
 struct LoggedRequest {
@@ -65,4 +65,4 @@ class RequestLog {
     };
 };
 
-} // namespace sim
+} // namespace keystrand::sim

@@ -10,7 +10,7 @@
 #include <system_error>
 #include <utility>
 
-namespace sim {
+namespace keystrand::sim {
 
 namespace {
 
@@ -80,19 +80,18 @@ Simulator::Simulator(const Settings& settings, const Paths& paths, PolicyTable p
                      ListeningSocket control)
     : loop_(std::move(loop)),
       events_(*loop_, paths.eventSocket),
+      clock_(settings.clock),
       publisher_(kernel_.registry, events_),
-      restrictedMode_(settings.periods, Clock(settings.clock), kernel_.registry, publisher_),
+      restrictedMode_(settings.periods, clock_, kernel_.registry, publisher_),
       kernelControls_(makeKernelControls(restrictedMode_, kernel_.registry)),
       commands_(makeCommands(
-          kernel_, [this] { return restrictedMode_.clock().now(); }, kernelControls_)),
-      handler_({.registry = kernel_.registry,
-                .commands = commands_,
-                .logLevel = kernel_.logLevel,
-                .faults = faults_,
-                .log = requests_}),
-      server_(*loop_, std::move(service), handler_, faults_),
+          kernel_, [this] { return clock_.now(); }, kernelControls_)),
+      handler_({.registry = kernel_.registry, .commands = commands_, .logLevel = kernel_.logLevel},
+               faults_, requests_),
+      server_(*loop_, std::move(service), handler_, [this] { return !faults_.takeRefusal(); }),
       control_(*loop_, std::move(control),
                {.kernel = kernel_,
+                .clock = clock_,
                 .restrictedMode = restrictedMode_,
                 .publisher = publisher_,
                 .events = events_,
@@ -113,7 +112,7 @@ bool Simulator::run() {
 }
 
 void Simulator::armDeadline() {
-    if (restrictedMode_.clock().isManual()) {
+    if (clock_.isManual()) {
         deadline_.disable();
         return;
     }
@@ -126,4 +125,4 @@ void Simulator::armDeadline() {
     deadline_.expireAt(seconds * kMicrosecondsPerSecond);
 }
 
-} // namespace sim
+} // namespace keystrand::sim

@@ -1,27 +1,28 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
-#include "keystrand-sim/Commands.h"
 #include "keystrand-sim/ControlSocket.h"
-#include "keystrand-sim/EventLoop.h"
-#include "keystrand-sim/EventSender.h"
 #include "keystrand-sim/FaultScript.h"
-#include "keystrand-sim/KernelControls.h"
-#include "keystrand-sim/KernelSocketServer.h"
-#include "keystrand-sim/KernelState.h"
-#include "keystrand-sim/ListeningSocket.h"
-#include "keystrand-sim/NotificationPublisher.h"
+#include "keystrand-sim/FaultyRequestHandler.h"
+#include "keystrand-sim/ManualClock.h"
 #include "keystrand-sim/Paths.h"
-#include "keystrand-sim/RequestHandler.h"
 #include "keystrand-sim/RequestLog.h"
-#include "keystrand-sim/RestrictedModeController.h"
+#include "keystrand/Commands.h"
+#include "keystrand/EventLoop.h"
+#include "keystrand/EventSender.h"
+#include "keystrand/KernelControls.h"
+#include "keystrand/KernelSocketServer.h"
+#include "keystrand/KernelState.h"
+#include "keystrand/ListeningSocket.h"
+#include "keystrand/NotificationPublisher.h"
+#include "keystrand/RestrictedModeController.h"
 
 #include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
 
-namespace sim {
+namespace keystrand::sim {
 
 /// The kernel side as a whole, under one root directory.
 class Simulator {
@@ -57,11 +58,12 @@ class Simulator {
     FaultScript faults_;
     RequestLog requests_;
     EventSender events_;
+    ManualClock clock_;
     NotificationPublisher publisher_;
     RestrictedModeController restrictedMode_;
     DispatchTable kernelControls_;
     DispatchTable commands_;
-    RequestHandler handler_;
+    FaultyRequestHandler handler_;
     KernelSocketServer server_;
     ControlSocket control_;
     EventSource deadline_;
@@ -69,4 +71,4 @@ class Simulator {
     EventSource interrupt_;
 };
 
-} // namespace sim
+} // namespace keystrand::sim

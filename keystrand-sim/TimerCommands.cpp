@@ -3,7 +3,7 @@
 
 #include <array>
 
-namespace sim {
+namespace keystrand::sim {
 
 namespace {
 
@@ -43,36 +43,44 @@ ControlOutcome quiet(ControlContext& context, ControlArguments& arguments) {
 }
 
 ControlOutcome clockReal(ControlContext& context, ControlArguments& arguments) {
-    return actUnlessProblem(arguments, [&] { context.restrictedMode.setRealClock(); });
+    return actUnlessProblem(arguments, [&] {
+        context.clock.setReal();
+        context.restrictedMode.catchUp();
+    });
+}
+
+void moveClock(ControlContext& context, Clock::Seconds time) {
+    context.clock.set(time);
+    context.restrictedMode.catchUp();
 }
 
 ControlOutcome clockSet(ControlContext& context, ControlArguments& arguments) {
     const auto time =
         arguments.numberWord<Clock::Seconds>("time", 1, RestrictedModeTimer::kLatestTime);
-    return actUnlessProblem(arguments, [&] { context.restrictedMode.setManualClock(time); });
+    return actUnlessProblem(arguments, [&] { moveClock(context, time); });
 }
 
 ControlOutcome clockAdvance(ControlContext& context, ControlArguments& arguments) {
-    const Clock& clock = context.restrictedMode.clock();
+    const ManualClock& clock = context.clock;
     if (!clock.isManual()) {
         return ControlOutcome::failed("the clock is the real one");
     }
     const auto seconds = arguments.numberWord<Clock::Seconds>(
         "seconds", 0, RestrictedModeTimer::kLatestTime - clock.now());
-    return actUnlessProblem(arguments,
-                            [&] { context.restrictedMode.setManualClock(clock.now() + seconds); });
+    return actUnlessProblem(arguments, [&] { moveClock(context, clock.now() + seconds); });
 }
 
 const char* onOff(bool value) {
     return value ? "on" : "off";
 }
 
-std::vector<std::string> timerStatus(const RestrictedModeController& controller) {
+std::vector<std::string> timerStatus(const RestrictedModeController& controller,
+                                     const ManualClock& clock) {
     const RestrictedModeTimer& timer = controller.timer();
-    const Clock::Seconds now = controller.clock().now();
+    const Clock::Seconds now = clock.now();
     const TimerRestarted record = timer.timerRestarted();
     const AnalyticsCollected analytics = timer.analyticsCollected(now);
-    return {concat("clock ", controller.clock().isManual() ? "manual" : "real"),
+    return {concat("clock ", clock.isManual() ? "manual" : "real"),
             concat("now ", now),
             concat("locked ", onOff(timer.locked())),
             concat("restricted ", onOff(timer.restricted())),
@@ -96,7 +104,7 @@ ControlOutcome status(ControlContext& context, ControlArguments& arguments) {
         return ControlOutcome::failed(*problem);
     }
     ControlOutcome outcome;
-    outcome.lines = timerStatus(context.restrictedMode);
+    outcome.lines = timerStatus(context.restrictedMode, context.clock);
     for (std::string line :
          {concat("published ", context.publisher.publishedCount()),
           concat("events-queued ", context.events.queued()),
@@ -135,4 +143,4 @@ std::span<const ControlCommand> timerCommands() {
     return kTimerCommands;
 }
 
-} // namespace sim
+} // namespace keystrand::sim

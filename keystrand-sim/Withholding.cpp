@@ -7,7 +7,7 @@
 
 #include <algorithm>
 
-namespace sim {
+namespace keystrand::sim {
 
 namespace {
 
@@ -35,4 +35,4 @@ std::optional<Withholding> withholdingFrom(std::uint8_t command,
     return withholding;
 }
 
-} // namespace sim
+} // namespace keystrand::sim

@@ -5,7 +5,7 @@
 #include <optional>
 #include <span>
 
-namespace sim {
+namespace keystrand::sim {
 
 /// What the request log leaves out of an input that carries a credential.
 struct Withholding {
@@ -19,4 +19,4 @@ struct Withholding {
 [[nodiscard]] std::optional<Withholding> withholdingFrom(std::uint8_t command,
                                                          std::span<const std::uint8_t> payload);
 
-} // namespace sim
+} // namespace keystrand::sim

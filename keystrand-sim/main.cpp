@@ -1,9 +1,9 @@
 #include "base/Concat.h"
-#include "keystrand-sim/ActivatedSocket.h"
 #include "keystrand-sim/ControlClient.h"
 #include "keystrand-sim/Options.h"
 #include "keystrand-sim/Paths.h"
 #include "keystrand-sim/Simulator.h"
+#include "keystrand/ActivatedSocket.h"
 
 #include <systemd/sd-daemon.h>
 
@@ -24,8 +24,8 @@ std::string joined(const std::vector<std::string>& words) {
     return line;
 }
 
-int sendControlCommand(const sim::Paths& paths, const std::vector<std::string>& words) {
-    auto client = sim::ControlClient::connect(paths.controlSocket);
+int sendControlCommand(const keystrand::sim::Paths& paths, const std::vector<std::string>& words) {
+    auto client = keystrand::sim::ControlClient::connect(paths.controlSocket);
     if (!client) {
         std::fprintf(stderr, "keystrand-sim: nobody listens at %s\n", paths.controlSocket.c_str());
         return kUnreachable;
@@ -41,11 +41,12 @@ int sendControlCommand(const sim::Paths& paths, const std::vector<std::string>& 
     return 0;
 }
 
-int simulate(const sim::Simulator::Settings& settings) {
+int simulate(const keystrand::sim::Simulator::Settings& settings) {
     std::string error;
-    auto activated = sim::takeActivatedServiceSocket(error);
+    auto activated = keystrand::takeActivatedServiceSocket(error);
     const auto simulator =
-        activated ? sim::Simulator::create(settings, std::move(*activated), error) : nullptr;
+        activated ? keystrand::sim::Simulator::create(settings, std::move(*activated), error)
+                  : nullptr;
     if (!simulator) {
         std::fprintf(stderr, "keystrand-sim: %s\n", error.c_str());
         return 1;
@@ -61,12 +62,13 @@ int simulate(const sim::Simulator::Settings& settings) {
 int main(int argc, char** argv) {
     std::signal(SIGPIPE, SIG_IGN);
     int exitStatus = 0;
-    const auto options = sim::parseOptions(argc, argv, exitStatus);
+    const auto options = keystrand::sim::parseOptions(argc, argv, exitStatus);
     if (!options) {
         return exitStatus;
     }
     if (options->controlWords) {
-        return sendControlCommand(sim::Paths(options->settings.root), *options->controlWords);
+        return sendControlCommand(keystrand::sim::Paths(options->settings.root),
+                                  *options->controlWords);
     }
     return simulate(options->settings);
 }

@@ -1,6 +1,7 @@
 #include "kstctl/HexText.h"
 
 #include "base/Concat.h"
+#include "base/Digits.h"
 #include "kstctl/ExitStatus.h"
 
 #include <optional>
@@ -10,15 +11,6 @@ namespace kstctl {
 namespace {
 
 constexpr std::string_view kBlanks = " \t\r\n";
-
-std::optional<unsigned> digitOf(char character) {
-    constexpr std::string_view kDigits = "0123456789abcdef";
-    const char lower =
-        character >= 'A' && character <= 'F' ? static_cast<char>(character - 'A' + 'a') : character;
-    const std::size_t value = kDigits.find(lower);
-    return value == std::string_view::npos ? std::nullopt
-                                           : std::optional(static_cast<unsigned>(value));
-}
 
 platform::Error notHex(std::size_t at, std::string_view why) {
     return failure(ExitStatus::malformed,
@@ -30,10 +22,10 @@ platform::Error notHex(std::size_t at, std::string_view why) {
 platform::Result<platform::Bytes> bytesOfHex(std::string_view text) {
     platform::Bytes bytes;
     bytes.reserve(text.size() / 2);
-    std::optional<unsigned> high;
+    std::optional<std::uint8_t> high;
     for (std::size_t i = 0; i < text.size(); ++i) {
         const bool isBlank = kBlanks.find(text[i]) != std::string_view::npos;
-        const std::optional<unsigned> digit = digitOf(text[i]);
+        const std::optional<std::uint8_t> digit = base::hexDigitValue(text[i]);
         if (isBlank && high) {
             return notHex(i, "half a byte");
         }

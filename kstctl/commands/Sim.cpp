@@ -30,8 +30,8 @@ platform::Error unreachable(const std::string& path) {
 } // namespace
 
 ExitStatus run(const SimCommand& command, const Environment& environment) {
-    const std::string path = sim::Paths(environment.paths.under("/")).controlSocket;
-    auto client = sim::ControlClient::connect(path);
+    const std::string path = keystrand::sim::Paths(environment.paths.under("/")).controlSocket;
+    auto client = keystrand::sim::ControlClient::connect(path);
     if (!client) {
         return environment.output.finish(unreachable(path));
     }

@@ -2,7 +2,7 @@
 
 #include "base/ByteReader.h"
 #include "base/Concat.h"
-#include "keystrand-sim/AnalyticsBlob.h"
+#include "keystrand/AnalyticsBlob.h"
 #include "kstctl/TimeText.h"
 #include "kstctl/decode/Decoders.h"
 #include "kstd/DeviceRestrictedMode/KSTDRMDeamonNotification.h"
@@ -35,9 +35,9 @@ Result decodeStateFile(Bytes bytes, Secrets /*secrets*/) {
 }
 
 void addAnalyticsFields(Report& report, Bytes blob) {
-    sim::AnalyticsBytes bytes{};
+    keystrand::AnalyticsBytes bytes{};
     std::copy_n(blob.begin(), bytes.size(), bytes.begin());
-    const auto figures = sim::decodeFigures(bytes);
+    const auto figures = keystrand::decodeFigures(bytes);
     if (!figures) {
         report.add("layout", "opaque").add("bytes", hexText(bytes));
         return;

@@ -31,6 +31,7 @@ const std::vector<std::string> kRooms = {"platform/shared",
                                          "kstd/Analytics",
                                          "kstd/DeviceRestrictedMode",
                                          "kstd",
+                                         "keystrand",
                                          "keystrand-sim",
                                          "kstd-https",
                                          "kstd-notify",
@@ -57,12 +58,14 @@ const std::map<std::string, std::set<std::string>> kMayInclude = {
     {"kstd",
      {kPublicHeaders, "kstd/Analytics", "kstd/DeviceRestrictedMode", "KSTLib", "common", "platform",
       "wire", "base"}},
-    {"keystrand-sim", {kPublicHeaders, "common", "wire", "base"}},
+    {"keystrand", {kPublicHeaders, "common", "wire", "base"}},
+    {"keystrand-sim", {"keystrand", kPublicHeaders, "common", "wire", "base"}},
     {"kstd-https", {"platform/https", "platform/shared", "platform", "wire", "base"}},
     {"kstd-notify", {"platform", "platform/linux", "platform/shared", "wire", "base"}},
     {"kstctl",
      {kPublicHeaders, "kstd/Analytics", "kstd/Analytics/SQLite", "kstd/DeviceRestrictedMode",
-      "keystrand-sim", "common", "platform", "platform/linux", "platform/shared", "wire", "base"}},
+      "keystrand", "keystrand-sim", "common", "platform", "platform/linux", "platform/shared",
+      "wire", "base"}},
     {"tools",
      {kPublicHeaders, "kstd/Analytics", "kstd", "KSTLib", "common", "platform", "platform/linux",
       "keystrand-sim", "wire", "base"}},
@@ -151,6 +154,7 @@ TEST(IncludeRulesTest, RulesRefuseWhatTheyShould) {
     EXPECT_FALSE(isAllowed({"kstd/Daemon.cpp", "platform/linux/LinuxHost.h"}));
     EXPECT_FALSE(isAllowed({"kstd/Daemon.cpp", "platform/fake/FakeHost.h"}));
     EXPECT_FALSE(isAllowed({"keystrand-sim/main.cpp", "kstd/Daemon.h"}));
+    EXPECT_FALSE(isAllowed({"keystrand/RequestHandler.cpp", "keystrand-sim/FaultScript.h"}));
     EXPECT_FALSE(isAllowed({"common/LibCall.cpp", "KSTLib/Channel.h"}));
     EXPECT_FALSE(isAllowed({"KSTLib/KSTLib.h", "KSTLib/Channel.h"}));
     EXPECT_FALSE(isAllowed({"KSTLib/KSTLib.h", "common/Allocation.h"}));

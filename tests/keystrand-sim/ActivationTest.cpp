@@ -5,7 +5,9 @@
 #include <sys/socket.h>
 #include <sys/un.h>
 
-namespace sim::test {
+namespace keystrand::sim::test {
+
+using namespace keystrand::test;
 
 namespace {
 
@@ -89,4 +91,4 @@ TEST_F(ActivationTest, SocketOfAnotherTypeIsRefused) {
 
 } // namespace
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

@@ -1,8 +1,8 @@
 // What clients put in, seen through the control socket.
 
 #include "base/ByteReader.h"
-#include "tests/keystrand-sim/Credentials.h"
 #include "tests/keystrand-sim/SimulatorProcess.h"
+#include "tests/keystrand/Credentials.h"
 
 #include <cerrno>
 #include <fcntl.h>
@@ -10,7 +10,9 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-namespace sim::test {
+namespace keystrand::sim::test {
+
+using namespace keystrand::test;
 
 namespace {
 
@@ -208,4 +210,4 @@ TEST_F(ClientStateTest, NoCopyOfACredentialIsLeftWhenItWasRemoved) {
 
 } // namespace
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

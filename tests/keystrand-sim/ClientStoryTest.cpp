@@ -2,7 +2,9 @@
 
 #include "tests/keystrand-sim/LibraryClient.h"
 
-namespace sim::test {
+namespace keystrand::sim::test {
+
+using namespace keystrand::test;
 
 namespace {
 
@@ -169,4 +171,4 @@ TEST_F(ClientStoryTest, FaultReachesTheCaller) {
 
 } // namespace
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

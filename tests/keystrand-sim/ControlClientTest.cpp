@@ -9,7 +9,7 @@
 #include <sys/un.h>
 #include <unistd.h>
 
-namespace sim::test {
+namespace keystrand::sim::test {
 
 namespace {
 
@@ -86,4 +86,4 @@ TEST_F(ControlClientTest, NobodyListens) {
 
 } // namespace
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

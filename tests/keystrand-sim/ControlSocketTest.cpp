@@ -5,7 +5,9 @@
 #include <sys/un.h>
 #include <unistd.h>
 
-namespace sim::test {
+namespace keystrand::sim::test {
+
+using namespace keystrand::test;
 
 namespace {
 
@@ -209,4 +211,4 @@ TEST_F(ControlSocketTest, ClientsBeyondTheLimitWaitForOneToGo) {
 
 } // namespace
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

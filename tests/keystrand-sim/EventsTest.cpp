@@ -1,9 +1,11 @@
-#include "tests/keystrand-sim/Records.h"
 #include "tests/keystrand-sim/SimulatorProcess.h"
+#include "tests/keystrand/Records.h"
 
 #include <filesystem>
 
-namespace sim::test {
+namespace keystrand::sim::test {
+
+using namespace keystrand::test;
 
 namespace {
 
@@ -243,4 +245,4 @@ TEST_F(EventsTest, RecordPublishedWhileTheOlderIsHandledIsNotLost) {
 
 } // namespace
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

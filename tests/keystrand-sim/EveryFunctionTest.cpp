@@ -11,7 +11,9 @@
 #include <map>
 #include <set>
 
-namespace sim::test {
+namespace keystrand::sim::test {
+
+using namespace keystrand::test;
 
 namespace {
 
@@ -738,4 +740,4 @@ TEST_F(EveryFunctionTest, LogLevelComesFromTheKernelSide) {
 
 } // namespace
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

@@ -2,7 +2,7 @@
 
 #include <gtest/gtest.h>
 
-namespace sim::test {
+namespace keystrand::sim::test {
 
 namespace {
 
@@ -126,4 +126,4 @@ TEST(FaultScriptTest, OnlyEffectsOfTheFirstGroupReplaceTheHandling) {
 
 } // namespace
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

@@ -1,6 +1,8 @@
 #include "tests/keystrand-sim/SimulatorProcess.h"
 
-namespace sim::test {
+namespace keystrand::sim::test {
+
+using namespace keystrand::test;
 
 namespace {
 
@@ -197,4 +199,4 @@ TEST_F(FaultsTest, OrdersThatMakeNoSense) {
 
 } // namespace
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

@@ -12,7 +12,9 @@
 #include <optional>
 #include <string>
 
-namespace sim::test {
+namespace keystrand::sim::test {
+
+using namespace keystrand::test;
 
 /// The requirement as text: its type, its state where it is not 1, its children.
 inline std::string textOf(const KSTRequirement* requirement) {
@@ -96,4 +98,4 @@ class LibraryClient : public SimulatorProcess {
     std::optional<platform::LinuxKernelChannel> channel_;
 };
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

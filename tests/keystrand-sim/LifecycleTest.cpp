@@ -10,7 +10,9 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-namespace sim::test {
+namespace keystrand::sim::test {
+
+using namespace keystrand::test;
 
 namespace {
 
@@ -224,4 +226,4 @@ TEST_F(LifecycleTest, PeersOfAnotherUserAreTurnedAwayWithoutAWord) {
 
 } // namespace
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

@@ -2,7 +2,9 @@
 
 #include <sys/ioctl.h>
 
-namespace sim::test {
+namespace keystrand::sim::test {
+
+using namespace keystrand::test;
 
 namespace {
 
@@ -224,4 +226,4 @@ TEST_F(OperationsTest, ClientsBeyondTheLimitWaitForOneToGo) {
 
 } // namespace
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

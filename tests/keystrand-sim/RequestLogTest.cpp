@@ -2,7 +2,7 @@
 
 #include <gtest/gtest.h>
 
-namespace sim::test {
+namespace keystrand::sim::test {
 
 namespace {
 
@@ -91,4 +91,4 @@ TEST(RequestLogTest, ObserverSeesTheNewCount) {
 
 } // namespace
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

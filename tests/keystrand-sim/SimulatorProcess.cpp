@@ -9,7 +9,9 @@
 #include <unistd.h>
 #include <utility>
 
-namespace sim::test {
+namespace keystrand::sim::test {
+
+using namespace keystrand::test;
 
 namespace {
 
@@ -133,4 +135,4 @@ ByteVector SimulatorProcess::call(const PacketSocket& client, const ByteVector& 
     return exchange(client, structCall(2, 256, input));
 }
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "keystrand-sim/ControlClient.h"
-#include "tests/keystrand-sim/Bytes.h"
+#include "tests/keystrand/Bytes.h"
 #include "tests/support/Program.h"
 #include "tests/support/TemporaryDirectory.h"
 
@@ -12,7 +12,9 @@
 #include <string>
 #include <vector>
 
-namespace sim::test {
+namespace keystrand::sim::test {
+
+using namespace keystrand::test;
 
 /// A packet socket of the test's own, for one end or the other. Waits are bounded.
 class PacketSocket {
@@ -100,4 +102,4 @@ inline ByteVector eventDatagram(std::string_view stream, std::string_view name) 
         .text(name);
 }
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

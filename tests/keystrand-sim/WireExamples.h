@@ -1,7 +1,7 @@
 #pragma once
 
 #include "keystrand-sim/HexText.h"
-#include "tests/keystrand-sim/Bytes.h"
+#include "tests/keystrand/Bytes.h"
 
 #include <gtest/gtest.h>
 
@@ -10,7 +10,9 @@
 #include <string>
 #include <vector>
 
-namespace sim::test {
+namespace keystrand::sim::test {
+
+using namespace keystrand::test;
 
 /// The lines of a block as bytes; 16 on every line but the last.
 inline ByteVector bytesOf(const std::vector<std::string>& lines) {
@@ -44,4 +46,4 @@ inline std::map<std::string, ByteVector> readExamples(const char* path) {
     return examples;
 }
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

@@ -8,16 +8,18 @@
 #include "base/Concat.h"
 #include "common/ContextObject.h"
 #include "keystrand-sim/HexText.h"
-#include "tests/keystrand-sim/CommandChannel.h"
-#include "tests/keystrand-sim/KernelFixture.h"
 #include "tests/keystrand-sim/WireExamples.h"
+#include "tests/keystrand/CommandChannel.h"
+#include "tests/keystrand/KernelFixture.h"
 #include "tests/support/RecordingLog.h"
 #include "tests/support/ScriptedRegistry.h"
 
 #include <cstring>
 #include <map>
 
-namespace sim::test {
+namespace keystrand::sim::test {
+
+using namespace keystrand::test;
 
 namespace {
 
@@ -568,4 +570,4 @@ TEST_F(WireFormatsTest, EveryExampleIsWrittenAndReadAsTheDocumentSays) {
 
 } // namespace
 
-} // namespace sim::test
+} // namespace keystrand::sim::test

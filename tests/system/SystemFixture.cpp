@@ -52,7 +52,8 @@ void SystemFixture::startKernel(const std::vector<std::string>& options) {
     kernelProgram =
         std::make_unique<Program>(joined({KEYSTRAND_SIM, "--root", root.path().string()}, options));
     ASSERT_TRUE(kernelProgram->awaitLine("keystrand-sim: ready"));
-    control_ = sim::ControlClient::connect(real("/run/keystrand/control.sock"), kConnectAttempts);
+    control_ = keystrand::sim::ControlClient::connect(real("/run/keystrand/control.sock"),
+                                                      kConnectAttempts);
     ASSERT_TRUE(control_);
 }
 

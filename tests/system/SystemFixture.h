@@ -69,7 +69,7 @@ class SystemFixture : public testing::Test {
     std::unique_ptr<Program> kernelProgram;
 
   private:
-    std::optional<sim::ControlClient> control_;
+    std::optional<keystrand::sim::ControlClient> control_;
     int sender_;
 };
 

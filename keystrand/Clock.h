@@ -1,0 +1,35 @@
+#pragma once
+
+#include "keystrand/RestrictedModeTimer.h"
+
+#include <algorithm>
+#include <chrono>
+#include <cstdint>
+
+namespace keystrand {
+
+/// The time in seconds since 1970-01-01 UTC, always between 1 and RestrictedModeTimer::kLatestTime.
+class Clock {
+  public:
+    using Seconds = RestrictedModeTimer::Seconds;
+
+    Clock() = default;
+    Clock(const Clock&) = delete;
+    Clock& operator=(const Clock&) = delete;
+    virtual ~Clock() = default;
+
+    [[nodiscard]] virtual Seconds now() const = 0;
+};
+
+/// The system's clock.
+class SystemClock : public Clock {
+  public:
+    [[nodiscard]] Seconds now() const override {
+        using std::chrono::system_clock;
+        const auto sinceEpoch = std::chrono::duration_cast<std::chrono::seconds>(
+            system_clock::now().time_since_epoch());
+        return static_cast<Seconds>(std::max<std::int64_t>(sinceEpoch.count(), 1));
+    }
+};
+
+} // namespace keystrand

@@ -1,0 +1,35 @@
+#pragma once
+
+#include "keystrand/DispatchTable.h"
+#include "keystrand/KernelState.h"
+
+#include <cstdint>
+#include <functional>
+
+namespace keystrand {
+
+/// The time in seconds, which ages are counted in.
+using Now = std::function<CredentialSet::Seconds()>;
+
+/// The commands of a frame. The table refers to the state and to the controls.
+[[nodiscard]] DispatchTable makeCommands(KernelState& kernel, const Now& now,
+                                         const DispatchTable& kernelControls);
+
+/// The groups of commands, a file of source for each.
+void addContextCommands(DispatchTable& table, KernelState& kernel);
+void addCredentialCommands(DispatchTable& table, KernelState& kernel, const Now& now);
+void addPolicyCommands(DispatchTable& table, KernelState& kernel, const Now& now);
+void addAccessListCommand(DispatchTable& table, KernelState& kernel);
+
+/// A result whose output is a number: 1 for yes, 0 for no.
+[[nodiscard]] inline CommandResult answeredWith(bool isYes) {
+    const std::uint8_t flag = isYes ? 1 : 0;
+    return {.status = kKernelSuccess, .output = {flag, 0, 0, 0}};
+}
+
+/// A result without output.
+[[nodiscard]] inline CommandResult endedWith(KernelStatus status) {
+    return {.status = status, .output = {}};
+}
+
+} // namespace keystrand

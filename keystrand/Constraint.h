@@ -1,0 +1,47 @@
+#pragma once
+
+#include "keystrand/PolicyTable.h"
+#include "keystrand/Requirement.h"
+#include "keystrand/TextParser.h"
+
+#include <cstddef>
+#include <optional>
+#include <string>
+#include <variant>
+#include <vector>
+
+namespace keystrand {
+
+/// What an access-control list asks for: the name of a policy, or a requirement of its own.
+using Constraint = std::variant<std::string, Requirement>;
+
+/// The longest constraint, and the longest list, that is read.
+inline constexpr std::size_t kMaxConstraintSize = 4096;
+
+/// Takes a constraint:
+///
+///     constraint = "policy" name | requirement
+///
+/// None, with the parser's error set, when something else is there.
+[[nodiscard]] std::optional<Constraint> parseConstraint(TextParser& parser);
+
+/// The requirement that a constraint stands for; null for a policy that is not there. Valid as long
+/// as both.
+[[nodiscard]] const Requirement* resolve(const Constraint& constraint, const PolicyTable& policies);
+
+/// One line of an access-control list.
+struct AccessRule {
+    std::string operation;
+    Constraint constraint;
+};
+
+inline constexpr std::size_t kMaxAccessRules = 64;
+
+/// Takes an access-control list of 1 to kMaxAccessRules rules:
+///
+///     list = { "allow" operation "=" constraint }
+///
+/// None, with the parser's error set, when something else is there or an operation is there twice.
+[[nodiscard]] std::optional<std::vector<AccessRule>> parseAccessList(TextParser& parser);
+
+} // namespace keystrand

@@ -1,0 +1,114 @@
+#include "keystrand/Evaluation.h"
+
+#include <algorithm>
+#include <utility>
+
+namespace keystrand {
+
+namespace {
+
+using Member = CredentialSet::Member;
+
+/// How well a credential meets a leaf, better ones last.
+enum class Fit { no, tooOld, yes };
+
+struct Match {
+    Fit fit = Fit::no;
+    const KSTCredential* credential = nullptr;
+};
+
+template <typename Wanted, typename Actual>
+bool agrees(const std::optional<Wanted>& wanted, const Actual& actual) {
+    return !wanted || *wanted == actual;
+}
+
+Fit fitOf(const Requirement& leaf, const Member& member, std::uint32_t ageLimit,
+          const Situation& situation) {
+    const KSTCredential& credential = *member.credential;
+    const auto& user = leaf.user ? leaf.user : situation.user;
+    if (credential.type != leaf.type->credential || !agrees(user, credential.userId) ||
+        !agrees(leaf.purpose, purposeOf(credential))) {
+        return Fit::no;
+    }
+    const auto age = situation.now - std::min(member.addedAt, situation.now);
+    return ageLimit == kNoAgeLimit || age <= ageLimit ? Fit::yes : Fit::tooOld;
+}
+
+void lookIn(const CredentialSet& set, const Requirement& leaf, std::uint32_t ageLimit,
+            const Situation& situation, Match& best) {
+    for (const Member& member : set.members()) {
+        const Fit fit = fitOf(leaf, member, ageLimit, situation);
+        if (fit > best.fit) {
+            best = {.fit = fit, .credential = member.credential.get()};
+        }
+    }
+}
+
+Match bestMatch(const Requirement& leaf, const Situation& situation) {
+    const std::uint32_t ageLimit = leaf.maxAge.value_or(kNoAgeLimit);
+    Match best;
+    lookIn(situation.own, leaf, ageLimit, situation, best);
+    if (situation.maxGlobalAge > 0) {
+        lookIn(situation.global, leaf, std::min(ageLimit, situation.maxGlobalAge), situation, best);
+    }
+    return best;
+}
+
+std::optional<Missing> missingLeaf(const Requirement& leaf, const Situation& situation) {
+    const Fit fit = bestMatch(leaf, situation).fit;
+    if (fit == Fit::yes) {
+        return std::nullopt;
+    }
+    Missing missing;
+    missing.requirement = &leaf;
+    missing.state = fit == Fit::tooOld ? Missing::State::tooOld : Missing::State::absent;
+    return missing;
+}
+
+/// Appends what the requirement, which is met, uses up.
+void collect(const Requirement& requirement, const Situation& situation,
+             std::vector<const KSTCredential*>& used) {
+    if (requirement.kind == Requirement::Kind::leaf) {
+        if (requirement.once) {
+            used.push_back(bestMatch(requirement, situation).credential);
+        }
+        return;
+    }
+    std::uint32_t left = requirement.needed;
+    for (const Requirement& child : requirement.children) {
+        if (left > 0 && !whatIsMissing(child, situation)) {
+            collect(child, situation, used);
+            --left;
+        }
+    }
+}
+
+} // namespace
+
+std::optional<Missing> whatIsMissing(const Requirement& requirement, const Situation& situation) {
+    if (requirement.kind == Requirement::Kind::leaf) {
+        return missingLeaf(requirement, situation);
+    }
+    Missing missing;
+    missing.requirement = &requirement;
+    for (const Requirement& child : requirement.children) {
+        if (auto missingChild = whatIsMissing(child, situation)) {
+            missing.children.push_back(std::move(*missingChild));
+        }
+    }
+    const std::size_t met = requirement.children.size() - missing.children.size();
+    if (met >= requirement.needed) {
+        return std::nullopt;
+    }
+    missing.needed = requirement.needed - static_cast<std::uint32_t>(met);
+    return missing;
+}
+
+std::vector<const KSTCredential*> whatIsUsedUp(const Requirement& requirement,
+                                               const Situation& situation) {
+    std::vector<const KSTCredential*> used;
+    collect(requirement, situation, used);
+    return used;
+}
+
+} // namespace keystrand

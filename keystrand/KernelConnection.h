@@ -1,0 +1,49 @@
+#pragma once
+
+#include "base/FileDescriptor.h"
+#include "keystrand/EventLoop.h"
+#include "keystrand/RequestHandler.h"
+
+#include <cstdint>
+#include <functional>
+#include <span>
+#include <vector>
+
+namespace keystrand {
+
+/// One client of the kernel service. At most one reply is held: the next request is read only when
+/// the reply to the last one is with the client, so a client that does not read holds up nobody
+/// but itself.
+class KernelConnection {
+  public:
+    /// Called last of all when the connection has ended; may destroy it.
+    using Ended = std::function<void()>;
+
+    /// `packetBuffer` is scratch space for one packet, one byte larger than the largest that is
+    /// allowed; connections may share it. Loop, handler and buffer outlive the connection.
+    KernelConnection(EventLoop& loop, base::FileDescriptor fd, RequestHandler& handler,
+                     std::span<std::uint8_t> packetBuffer, Ended ended);
+
+    /// False when the loop had no room to watch it; such a connection never ends by itself.
+    [[nodiscard]] bool isWatched() const { return source_ && delay_; }
+
+  private:
+    enum class Alive : bool { no, yes };
+
+    void onReady(std::uint32_t events);
+    [[nodiscard]] Alive receive();
+    [[nodiscard]] Alive carryOut(RequestOutcome outcome);
+    [[nodiscard]] Alive sendReply();
+    void endUnless(Alive alive);
+
+    base::FileDescriptor fd_;
+    RequestHandler& handler_;
+    std::span<std::uint8_t> packetBuffer_;
+    Ended ended_;
+    ConnectionState state_;
+    std::vector<std::uint8_t> reply_;
+    EventSource source_;
+    EventSource delay_;
+};
+
+} // namespace keystrand

@@ -1,0 +1,33 @@
+#include "keystrand/NotificationPublisher.h"
+
+#include "base/Concat.h"
+#include "wire/EventDatagram.h"
+
+namespace keystrand {
+
+bool NotificationPublisher::publish(const Notification& notification) {
+    const char* property = propertyNameOf(notification.type);
+    if (!registry_.set(property, notification.record)) {
+        return false;
+    }
+    ++publishedCount_;
+    rememberKept(notification);
+    if (!events_.post(wire::kNotifydMatchingStream,
+                      base::concat(wire::rm::kNotificationNamePrefix, property))) {
+        return false;
+    }
+    registry_.announce(property);
+    return true;
+}
+
+void NotificationPublisher::rememberKept(const Notification& notification) {
+    if (notification.type == wire::rm::kKSTRMNotificationTimerRestarted) {
+        lastState_ =
+            bytesAt<wire::rm::kStateBlobSize>(notification.record, wire::rm::kStateBlobOffset);
+    } else if (notification.type == wire::rm::kKSTRMNotificationSaveAnalytics) {
+        lastAnalytics_ = bytesAt<wire::rm::kAnalyticsBlobSize>(notification.record,
+                                                               wire::rm::kAnalyticsBlobOffset);
+    }
+}
+
+} // namespace keystrand

@@ -1,0 +1,40 @@
+#pragma once
+
+#include "keystrand/EventPoster.h"
+#include "keystrand/NotificationRecord.h"
+#include "keystrand/Registry.h"
+
+#include <cstdint>
+#include <optional>
+
+namespace keystrand {
+
+/// Puts records into their properties and posts the events that announce them. The registry and
+/// the poster outlive it.
+class NotificationPublisher {
+  public:
+    NotificationPublisher(Registry& registry, EventPoster& events)
+        : registry_(registry), events_(events) {}
+
+    /// False when the record could not be put into the registry or its event was not taken.
+    bool publish(const Notification& notification);
+
+    [[nodiscard]] std::uint64_t publishedCount() const { return publishedCount_; }
+
+    /// What the last records of types 1 and 3 gave the daemon to keep.
+    [[nodiscard]] const std::optional<StateBytes>& lastState() const { return lastState_; }
+    [[nodiscard]] const std::optional<AnalyticsBytes>& lastAnalytics() const {
+        return lastAnalytics_;
+    }
+
+  private:
+    void rememberKept(const Notification& notification);
+
+    Registry& registry_;
+    EventPoster& events_;
+    std::uint64_t publishedCount_ = 0;
+    std::optional<StateBytes> lastState_;
+    std::optional<AnalyticsBytes> lastAnalytics_;
+};
+
+} // namespace keystrand

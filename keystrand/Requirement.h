@@ -1,0 +1,40 @@
+#pragma once
+
+#include "keystrand/LeafTypes.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace keystrand {
+
+/// What a policy asks for: a leaf, which one credential meets, or a number of its children.
+struct Requirement {
+    enum class Kind { leaf, allOf, anyOf, someOf };
+
+    Kind kind = Kind::leaf;
+
+    /// Of a leaf. What is not given is not asked for.
+    const LeafType* type = nullptr;
+    std::optional<std::uint32_t> user;
+    std::optional<std::uint32_t> maxAge;
+    std::optional<std::uint32_t> purpose;
+    std::uint32_t priority = 0;
+    /// The credential that meets the leaf is used up by it.
+    bool once = false;
+
+    /// Of the others; at least one.
+    std::vector<Requirement> children;
+    /// How many of the children are asked for, 1 to all of them.
+    std::uint32_t needed = 0;
+};
+
+/// The bytes of the requirement on the wire.
+[[nodiscard]] std::size_t wireSize(const Requirement& requirement);
+
+/// The requirement as policies write it, on one line.
+[[nodiscard]] std::string toText(const Requirement& requirement);
+
+} // namespace keystrand
