@@ -1,7 +1,7 @@
 #include "base/Concat.h"
 #include "common/CredentialTypes.h"
+#include "keystrand-sim/ControlArguments.h"
 #include "keystrand-sim/ControlCommand.h"
-#include "keystrand-sim/HexText.h"
 
 #include <algorithm>
 #include <array>

@@ -7,6 +7,7 @@
 #include <limits>
 #include <map>
 #include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -70,5 +71,12 @@ class ControlArguments {
     std::map<std::string_view, std::string_view> named_;
     std::string problem_;
 };
+
+/// Two lower-case digits for each byte; the word `empty` for no bytes.
+[[nodiscard]] std::string toHexWord(std::span<const std::uint8_t> bytes);
+
+/// The bytes of a word that `toHexWord` made, or of upper-case digits. None when it is anything
+/// else.
+[[nodiscard]] std::optional<std::vector<std::uint8_t>> fromHexWord(std::string_view word);
 
 } // namespace keystrand::sim

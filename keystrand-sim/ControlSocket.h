@@ -2,8 +2,8 @@
 
 #include "keystrand-sim/ControlCommand.h"
 #include "keystrand-sim/ControlConnection.h"
-#include "keystrand/ConnectionTable.h"
 #include "keystrand/EventLoop.h"
+#include "keystrand/ListeningSocket.h"
 
 #include <cstddef>
 #include <memory>

@@ -1,8 +1,8 @@
 #include "keystrand-sim/FaultyRequestHandler.h"
 
 #include "KSTLib/Command.h"
-#include "keystrand-sim/Withholding.h"
-#include "keystrand/CommandFrame.h"
+#include "keystrand-sim/RequestLog.h"
+#include "keystrand/DispatchTable.h"
 #include "wire/RestrictedMode.h"
 
 #include <utility>

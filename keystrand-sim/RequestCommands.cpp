@@ -1,6 +1,6 @@
 #include "base/Concat.h"
+#include "keystrand-sim/ControlArguments.h"
 #include "keystrand-sim/ControlCommand.h"
-#include "keystrand-sim/HexText.h"
 
 #include <algorithm>
 #include <array>

@@ -3,7 +3,7 @@
 #include "keystrand-sim/Options.h"
 #include "keystrand-sim/Paths.h"
 #include "keystrand-sim/Simulator.h"
-#include "keystrand/ActivatedSocket.h"
+#include "keystrand/ListeningSocket.h"
 
 #include <systemd/sd-daemon.h>
 

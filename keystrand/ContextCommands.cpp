@@ -1,7 +1,6 @@
 #include "KSTLib/Command.h"
 #include "KSTLib/ContextPropertySerialization.h"
 #include "keystrand/Commands.h"
-#include "keystrand/HandlePayload.h"
 
 #include <iterator>
 

@@ -2,7 +2,6 @@
 #include "KSTLib/CredentialCommandSerialization.h"
 #include "common/CredentialTypes.h"
 #include "keystrand/Commands.h"
-#include "keystrand/HandlePayload.h"
 
 #include <optional>
 #include <utility>

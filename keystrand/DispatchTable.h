@@ -1,16 +1,48 @@
 #pragma once
 
-#include "keystrand/KernelStatus.h"
-
 #include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <limits>
 #include <map>
+#include <optional>
 #include <span>
 #include <vector>
 
 namespace keystrand {
+
+/// What the kernel service answers when it refuses; listed in docs/kernel-socket.md.
+using KernelStatus = std::int32_t;
+
+inline constexpr KernelStatus kKernelSuccess = 0;
+inline constexpr KernelStatus kKernelMalformedRequest = -6001;
+inline constexpr KernelStatus kKernelNoSuchEntry = -6002;
+inline constexpr KernelStatus kKernelNotOpen = -6003;
+inline constexpr KernelStatus kKernelUnknownSelector = -6004;
+inline constexpr KernelStatus kKernelMalformedFrame = -6005;
+inline constexpr KernelStatus kKernelUnknownCommand = -6006;
+inline constexpr KernelStatus kKernelBadPayload = -6007;
+inline constexpr KernelStatus kKernelReplyDoesNotFit = -6008;
+inline constexpr KernelStatus kKernelTableFull = -6009;
+inline constexpr KernelStatus kKernelNoSuchContext = -6010;
+inline constexpr KernelStatus kKernelTooManyContexts = -6011;
+inline constexpr KernelStatus kKernelTooManyCredentials = -6012;
+inline constexpr KernelStatus kKernelNoSuchPolicy = -6013;
+inline constexpr KernelStatus kKernelBadConstraint = -6014;
+
+/// A command frame as it stands in the input of a struct call; the payload points into the input.
+struct CommandFrame {
+    std::uint8_t code = 0;
+    std::span<const std::uint8_t> payload;
+};
+
+/// The frame in `input`, or none when it is shorter than its header or has another magic. The
+/// second, third and fourth byte after the magic may be anything.
+[[nodiscard]] std::optional<CommandFrame> decodeCommandFrame(std::span<const std::uint8_t> input);
+
+/// The control code with which the payload of a kernel-control command begins, none for any other
+/// command and for a payload that is too short.
+[[nodiscard]] std::optional<std::uint32_t> controlCodeOf(const CommandFrame& frame);
 
 /// What a command did. `output` is empty unless `status` is 0.
 struct CommandResult {

@@ -2,9 +2,90 @@
 
 #include "wire/KernelSocket.h"
 
+#include <cerrno>
+#include <ctime>
+#include <string.h>
+#include <sys/epoll.h>
+#include <sys/socket.h>
 #include <utility>
 
 namespace keystrand {
+
+KernelConnection::KernelConnection(EventLoop& loop, base::FileDescriptor fd,
+                                   RequestHandler& handler, std::span<std::uint8_t> packetBuffer,
+                                   Ended ended)
+    : fd_(std::move(fd)),
+      handler_(handler),
+      packetBuffer_(packetBuffer),
+      ended_(std::move(ended)),
+      source_(loop.watch(fd_.get(), EPOLLIN, [this](std::uint32_t events) { onReady(events); })),
+      delay_(loop.timer(CLOCK_MONOTONIC, [this] { endUnless(sendReply()); })) {}
+
+void KernelConnection::onReady(std::uint32_t events) {
+    if ((events & EPOLLIN) != 0) {
+        endUnless(receive());
+    } else if ((events & EPOLLOUT) != 0) {
+        endUnless(sendReply());
+    } else {
+        endUnless(Alive::no);
+    }
+}
+
+KernelConnection::Alive KernelConnection::receive() {
+    const ssize_t size =
+        ::recv(fd_.get(), packetBuffer_.data(), packetBuffer_.size(), MSG_DONTWAIT);
+    if (size < 0) {
+        return errno == EAGAIN || errno == EINTR ? Alive::yes : Alive::no;
+    }
+    if (size == 0) {
+        return Alive::no;
+    }
+    const auto packet = packetBuffer_.first(static_cast<std::size_t>(size));
+    RequestOutcome outcome = handler_.handle(packet, state_);
+    // There may be a credential in it.
+    ::explicit_bzero(packet.data(), packet.size());
+    return carryOut(std::move(outcome));
+}
+
+KernelConnection::Alive KernelConnection::carryOut(RequestOutcome outcome) {
+    switch (outcome.kind) {
+    case RequestOutcome::Kind::hangUp:
+        return Alive::no;
+    case RequestOutcome::Kind::silence:
+        return Alive::yes;
+    case RequestOutcome::Kind::reply:
+        break;
+    }
+    reply_ = std::move(outcome.packet);
+    if (outcome.delay.count() == 0) {
+        return sendReply();
+    }
+    source_.listenFor(0);
+    delay_.expireIn(outcome.delay);
+    return Alive::yes;
+}
+
+KernelConnection::Alive KernelConnection::sendReply() {
+    const ssize_t size =
+        ::send(fd_.get(), reply_.data(), reply_.size(), MSG_DONTWAIT | MSG_NOSIGNAL);
+    if (size >= 0) {
+        reply_.clear();
+        source_.listenFor(EPOLLIN);
+        return Alive::yes;
+    }
+    if (errno != EAGAIN && errno != EINTR && errno != ENOBUFS) {
+        return Alive::no;
+    }
+    source_.listenFor(EPOLLOUT);
+    return Alive::yes;
+}
+
+void KernelConnection::endUnless(Alive alive) {
+    if (alive == Alive::no) {
+        const Ended ended = ended_;
+        ended();
+    }
+}
 
 KernelSocketServer::KernelSocketServer(EventLoop& loop, ListeningSocket socket,
                                        RequestHandler& handler, Admits admits)

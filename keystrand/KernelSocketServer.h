@@ -1,17 +1,53 @@
 #pragma once
 
-#include "keystrand/ConnectionTable.h"
+#include "base/FileDescriptor.h"
 #include "keystrand/EventLoop.h"
-#include "keystrand/KernelConnection.h"
+#include "keystrand/ListeningSocket.h"
 #include "keystrand/RequestHandler.h"
 
 #include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <span>
 #include <vector>
 
 namespace keystrand {
+
+/// One client of the kernel service. At most one reply is held: the next request is read only when
+/// the reply to the last one is with the client, so a client that does not read holds up nobody
+/// but itself.
+class KernelConnection {
+  public:
+    /// Called last of all when the connection has ended; may destroy it.
+    using Ended = std::function<void()>;
+
+    /// `packetBuffer` is scratch space for one packet, one byte larger than the largest that is
+    /// allowed; connections may share it. Loop, handler and buffer outlive the connection.
+    KernelConnection(EventLoop& loop, base::FileDescriptor fd, RequestHandler& handler,
+                     std::span<std::uint8_t> packetBuffer, Ended ended);
+
+    /// False when the loop had no room to watch it; such a connection never ends by itself.
+    [[nodiscard]] bool isWatched() const { return source_ && delay_; }
+
+  private:
+    enum class Alive : bool { no, yes };
+
+    void onReady(std::uint32_t events);
+    [[nodiscard]] Alive receive();
+    [[nodiscard]] Alive carryOut(RequestOutcome outcome);
+    [[nodiscard]] Alive sendReply();
+    void endUnless(Alive alive);
+
+    base::FileDescriptor fd_;
+    RequestHandler& handler_;
+    std::span<std::uint8_t> packetBuffer_;
+    Ended ended_;
+    ConnectionState state_;
+    std::vector<std::uint8_t> reply_;
+    EventSource source_;
+    EventSource delay_;
+};
 
 /// Serves the kernel service's socket to a bounded number of clients.
 class KernelSocketServer {

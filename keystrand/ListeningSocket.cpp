@@ -3,10 +3,19 @@
 #include "base/Concat.h"
 #include "base/UnixAddress.h"
 
+#include <systemd/sd-daemon.h>
+
 #include <cerrno>
+#include <chrono>
+#include <cstdlib>
+#include <ctime>
+#include <fcntl.h>
+#include <string_view>
+#include <sys/epoll.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <system_error>
+#include <unistd.h>
 #include <utility>
 
 namespace keystrand {
@@ -89,6 +98,95 @@ ListeningSocket::~ListeningSocket() {
     if (fd_.isOpen() && file_ && ::lstat(file_->path.c_str(), &present) == 0 &&
         present.st_dev == file_->device && present.st_ino == file_->inode) {
         ::unlink(file_->path.c_str());
+    }
+}
+
+namespace {
+
+constexpr std::string_view kActivationName = "service";
+
+/// What was handed over under that name.
+base::FileDescriptor takeNamed(std::string_view name) {
+    char** names = nullptr;
+    const int count = sd_listen_fds_with_names(1, &names);
+    base::FileDescriptor found;
+    for (int i = 0; i < count; ++i) {
+        base::FileDescriptor candidate(SD_LISTEN_FDS_START + i);
+        if (names[i] == name && !found.isOpen()) {
+            found = std::move(candidate);
+        }
+        std::free(names[i]);
+    }
+    std::free(names);
+    return found;
+}
+
+} // namespace
+
+std::optional<base::FileDescriptor> takeActivatedServiceSocket(std::string& error) {
+    base::FileDescriptor socket = takeNamed(kActivationName);
+    if (!socket.isOpen()) {
+        return socket;
+    }
+    if (sd_is_socket(socket.get(), AF_UNIX, SOCK_SEQPACKET, 1) <= 0) {
+        error = "the activated socket is not a listening packet socket";
+        return std::nullopt;
+    }
+    // The loop that watches it never waits for a client.
+    if (::fcntl(socket.get(), F_SETFL, O_NONBLOCK) != 0) {
+        error = "the activated socket cannot be used";
+        return std::nullopt;
+    }
+    return socket;
+}
+
+namespace {
+
+constexpr std::chrono::milliseconds kRetryDelay{200};
+
+bool isOutOfRoom(int error) {
+    return error == EMFILE || error == ENFILE || error == ENOBUFS || error == ENOMEM;
+}
+
+/// Whether the process at the other end runs as root or as this process's user.
+bool isTrustedPeer(int fd) {
+    ucred peer{};
+    socklen_t length = sizeof peer;
+    if (::getsockopt(fd, SOL_SOCKET, SO_PEERCRED, &peer, &length) != 0) {
+        return false;
+    }
+    return peer.uid == 0 || peer.uid == ::geteuid();
+}
+
+} // namespace
+
+Acceptor::Acceptor(EventLoop& loop, ListeningSocket socket, Handler handler)
+    : socket_(std::move(socket)),
+      handler_(std::move(handler)),
+      source_(loop.watch(socket_.fd(), EPOLLIN, [this](std::uint32_t /*events*/) { accept(); })),
+      retry_(loop.timer(CLOCK_MONOTONIC, [this] { resume(); })) {}
+
+void Acceptor::pause() {
+    source_.disable();
+    retry_.disable();
+}
+
+void Acceptor::resume() {
+    source_.listenFor(EPOLLIN);
+}
+
+void Acceptor::accept() {
+    base::FileDescriptor connection(
+        ::accept4(socket_.fd(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
+    if (!connection.isOpen()) {
+        if (isOutOfRoom(errno)) {
+            pause();
+            retry_.expireIn(kRetryDelay);
+        }
+        return;
+    }
+    if (isTrustedPeer(connection.get())) {
+        handler_(std::move(connection));
     }
 }
 

@@ -1,10 +1,17 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "keystrand/EventLoop.h"
 
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <memory>
 #include <optional>
 #include <string>
 #include <sys/types.h>
+#include <utility>
 
 namespace keystrand {
 
@@ -39,6 +46,88 @@ class ListeningSocket {
 
     base::FileDescriptor fd_;
     std::optional<File> file_;
+};
+
+/// The listening SOCK_SEQPACKET socket that the init system handed over under the name `service`; a
+/// closed descriptor when it handed over none. Any other socket that it handed over is closed.
+/// None, with a reason for people in `error`, when what has that name is something else.
+///
+/// Takes the variables that announce sockets out of the environment, so it finds them once.
+[[nodiscard]] std::optional<base::FileDescriptor> takeActivatedServiceSocket(std::string& error);
+
+/// Takes connections from a listening socket and hands over those of trusted peers; any other is
+/// closed without a word. While it is paused, connections wait in the socket's queue.
+class Acceptor {
+  public:
+    using Handler = std::function<void(base::FileDescriptor connection)>;
+
+    /// The loop outlives it.
+    Acceptor(EventLoop& loop, ListeningSocket socket, Handler handler);
+
+    void pause();
+    void resume();
+
+  private:
+    void accept();
+
+    ListeningSocket socket_;
+    Handler handler_;
+    EventSource source_;
+    /// Runs when the system had no room for one more connection.
+    EventSource retry_;
+};
+
+/// The connections of a listening socket, a bounded number at once; more wait until one has gone.
+template <typename Connection>
+class ConnectionTable {
+  public:
+    using Ended = std::function<void()>;
+    /// Serves an accepted connection and calls `ended`, which destroys it, when that is over. Null:
+    /// it is closed without a word.
+    using Serve = std::function<std::unique_ptr<Connection>(base::FileDescriptor fd, Ended ended)>;
+
+    /// The loop outlives the table, and so does what `serve` refers to.
+    ConnectionTable(EventLoop& loop, ListeningSocket socket, std::size_t most, Serve serve)
+        : most_(most),
+          serve_(std::move(serve)),
+          acceptor_(loop, std::move(socket),
+                    [this](base::FileDescriptor fd) { take(std::move(fd)); }) {}
+
+    [[nodiscard]] std::size_t size() const { return connections_.size(); }
+
+    /// Calls `visit` with each; it may end the one that it is called with.
+    template <typename Visit>
+    void forEach(Visit visit) {
+        for (auto it = connections_.begin(); it != connections_.end();) {
+            Connection& connection = *it->second;
+            ++it;
+            visit(connection);
+        }
+    }
+
+  private:
+    void take(base::FileDescriptor fd) {
+        const std::uint64_t id = ++lastId_;
+        auto connection = serve_(std::move(fd), [this, id] { drop(id); });
+        if (connection == nullptr || !connection->isWatched()) {
+            return;
+        }
+        connections_.emplace(id, std::move(connection));
+        if (connections_.size() == most_) {
+            acceptor_.pause();
+        }
+    }
+
+    void drop(std::uint64_t id) {
+        connections_.erase(id);
+        acceptor_.resume();
+    }
+
+    std::size_t most_;
+    Serve serve_;
+    std::uint64_t lastId_ = 0;
+    std::map<std::uint64_t, std::unique_ptr<Connection>> connections_;
+    Acceptor acceptor_;
 };
 
 } // namespace keystrand

@@ -1,11 +1,11 @@
 #include "KSTLib/Command.h"
 #include "KSTLib/VerifyAclSerialization.h"
 #include "KSTLib/VerifyPolicySerialization.h"
+#include "keystrand/AccessLists.h"
 #include "keystrand/Commands.h"
-#include "keystrand/Constraint.h"
 #include "keystrand/Evaluation.h"
 #include "keystrand/Received.h"
-#include "keystrand/RequirementWire.h"
+#include "keystrand/Requirement.h"
 
 #include <cstring>
 

@@ -2,7 +2,7 @@
 
 #include "KSTLib/Command.h"
 #include "base/ByteWriter.h"
-#include "keystrand/CommandFrame.h"
+#include "keystrand/DispatchTable.h"
 #include "wire/RestrictedMode.h"
 
 #include <algorithm>

@@ -1,6 +1,5 @@
 #pragma once
 
-#include "keystrand/AnalyticsBlob.h"
 #include "keystrand/NotificationRecord.h"
 
 #include <cstdint>

@@ -2,7 +2,7 @@
 
 #include "base/ByteReader.h"
 #include "base/Concat.h"
-#include "keystrand/AnalyticsBlob.h"
+#include "keystrand/NotificationRecord.h"
 #include "kstctl/TimeText.h"
 #include "kstctl/decode/Decoders.h"
 #include "kstd/DeviceRestrictedMode/KSTDRMDeamonNotification.h"

@@ -1,7 +1,5 @@
 #include "keystrand-sim/ControlArguments.h"
 
-#include "keystrand-sim/HexText.h"
-
 #include <gtest/gtest.h>
 
 namespace keystrand::sim::test {

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "keystrand-sim/HexText.h"
+#include "keystrand-sim/ControlArguments.h"
 #include "tests/keystrand/Bytes.h"
 
 #include <gtest/gtest.h>

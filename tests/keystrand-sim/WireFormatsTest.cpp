@@ -7,7 +7,7 @@
 #include "KSTLib/Platform.h"
 #include "base/Concat.h"
 #include "common/ContextObject.h"
-#include "keystrand-sim/HexText.h"
+#include "keystrand-sim/ControlArguments.h"
 #include "tests/keystrand-sim/WireExamples.h"
 #include "tests/keystrand/CommandChannel.h"
 #include "tests/keystrand/KernelFixture.h"

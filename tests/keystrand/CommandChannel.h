@@ -1,7 +1,6 @@
 #pragma once
 
 #include "KSTLib/Command.h"
-#include "keystrand/CommandFrame.h"
 #include "keystrand/DispatchTable.h"
 #include "platform/KernelChannel.h"
 #include "tests/keystrand/Bytes.h"

@@ -1,6 +1,6 @@
 #include "keystrand/Commands.h"
 
-#include "keystrand/CommandFrame.h"
+#include "keystrand/DispatchTable.h"
 #include "keystrand/KernelControls.h"
 #include "tests/keystrand/Bytes.h"
 #include "tests/keystrand/SetClock.h"

@@ -1,6 +1,6 @@
 #include "keystrand/Evaluation.h"
 
-#include "keystrand/Characteristics.h"
+#include "keystrand/AccessLists.h"
 #include "keystrand/RequirementParser.h"
 #include "tests/keystrand/Credentials.h"
 

@@ -1,6 +1,6 @@
 #include "keystrand/PolicyTable.h"
 
-#include "keystrand/Constraint.h"
+#include "keystrand/AccessLists.h"
 #include "tests/support/TemporaryDirectory.h"
 
 #include <gtest/gtest.h>

@@ -1,7 +1,6 @@
-#include "keystrand/RequirementWire.h"
-
 #include "KSTLib/AllocatedBytes.h"
 #include "KSTLib/RequirementSerialization.h"
+#include "keystrand/Evaluation.h"
 #include "keystrand/RequirementParser.h"
 #include "tests/keystrand/Credentials.h"
 

@@ -5,6 +5,7 @@
 #include "keystrand/TextParser.h"
 
 #include <cstddef>
+#include <cstdint>
 #include <optional>
 #include <string>
 #include <variant>
@@ -43,5 +44,17 @@ inline constexpr std::size_t kMaxAccessRules = 64;
 ///
 /// None, with the parser's error set, when something else is there or an operation is there twice.
 [[nodiscard]] std::optional<std::vector<AccessRule>> parseAccessList(TextParser& parser);
+
+/// Which credentials matter to a requirement: bit T stands for credentials of type T.
+struct Characteristics {
+    /// At least one leaf asks for it.
+    std::uint32_t usable = 0;
+    /// The requirement cannot be met without it.
+    std::uint32_t indispensable = 0;
+
+    bool operator==(const Characteristics&) const = default;
+};
+
+[[nodiscard]] Characteristics characteristicsOf(const Requirement& requirement);
 
 } // namespace keystrand

@@ -1,14 +1,115 @@
+#include "keystrand/AccessLists.h"
+
 #include "KSTLib/Command.h"
+#include "KSTLib/Credential.h"
 #include "KSTLib/ProcessAclSerialization.h"
 #include "base/ByteWriter.h"
-#include "keystrand/Characteristics.h"
+#include "base/Concat.h"
 #include "keystrand/Commands.h"
-#include "keystrand/Constraint.h"
 #include "keystrand/Received.h"
+#include "keystrand/RequirementParser.h"
 
+#include <algorithm>
 #include <cassert>
+#include <utility>
 
 namespace keystrand {
+
+namespace {
+
+std::optional<AccessRule> parseRule(TextParser& parser, const std::vector<AccessRule>& before) {
+    if (!parser.keyword("allow")) {
+        return std::nullopt;
+    }
+    const auto operation = parser.word("operation");
+    if (!operation) {
+        return std::nullopt;
+    }
+    if (std::any_of(before.begin(), before.end(),
+                    [&](const AccessRule& rule) { return rule.operation == *operation; })) {
+        parser.fail(base::concat("there is a rule for ", *operation, " already"));
+        return std::nullopt;
+    }
+    if (!parser.mark('=')) {
+        return std::nullopt;
+    }
+    auto constraint = parseConstraint(parser);
+    if (!constraint) {
+        return std::nullopt;
+    }
+    return AccessRule{std::string(*operation), std::move(*constraint)};
+}
+
+} // namespace
+
+std::optional<Constraint> parseConstraint(TextParser& parser) {
+    if (parser.takeWord("policy")) {
+        const auto name = parser.word("name");
+        return name ? std::optional<Constraint>(std::string(*name)) : std::nullopt;
+    }
+    auto requirement = parseRequirement(parser);
+    return requirement ? std::optional<Constraint>(std::move(*requirement)) : std::nullopt;
+}
+
+const Requirement* resolve(const Constraint& constraint, const PolicyTable& policies) {
+    if (const auto* name = std::get_if<std::string>(&constraint)) {
+        return policies.find(*name);
+    }
+    return std::get_if<Requirement>(&constraint);
+}
+
+std::optional<std::vector<AccessRule>> parseAccessList(TextParser& parser) {
+    std::vector<AccessRule> rules;
+    do {
+        if (rules.size() == kMaxAccessRules) {
+            parser.fail("too many rules");
+            return std::nullopt;
+        }
+        auto rule = parseRule(parser, rules);
+        if (!rule) {
+            return std::nullopt;
+        }
+        rules.push_back(std::move(*rule));
+    } while (!parser.atEnd());
+    return rules;
+}
+
+namespace {
+
+bool asksFor(const Requirement& requirement, std::uint32_t type) {
+    if (requirement.kind == Requirement::Kind::leaf) {
+        return requirement.type->credential == type;
+    }
+    return std::any_of(requirement.children.begin(), requirement.children.end(),
+                       [type](const Requirement& child) { return asksFor(child, type); });
+}
+
+/// Whether the requirement could be met if there were every credential but those of that type.
+bool canBeMetWithout(const Requirement& requirement, std::uint32_t type) {
+    if (requirement.kind == Requirement::Kind::leaf) {
+        const std::uint32_t wanted = requirement.type->credential;
+        return wanted != type && wanted != LeafType::kNoCredential;
+    }
+    return std::count_if(requirement.children.begin(), requirement.children.end(),
+                         [type](const Requirement& child) {
+                             return canBeMetWithout(child, type);
+                         }) >= static_cast<std::ptrdiff_t>(requirement.needed);
+}
+
+} // namespace
+
+Characteristics characteristicsOf(const Requirement& requirement) {
+    Characteristics result;
+    for (std::uint32_t type = 1; type <= kKSTCredentialTypeMax; ++type) {
+        if (asksFor(requirement, type)) {
+            result.usable |= 1U << type;
+        }
+        if (!canBeMetWithout(requirement, type)) {
+            result.indispensable |= 1U << type;
+        }
+    }
+    return result;
+}
 
 namespace {
 
