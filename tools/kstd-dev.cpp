@@ -7,6 +7,7 @@
 #include "kstd/MessageIds.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"
+#include "platform/linux/StopRequest.h"
 
 #include <CLI/CLI.hpp>
 
@@ -63,12 +64,13 @@ base::FileDescriptor eventSocket(const platform::Paths& paths) {
                               : platform::makeEventSocket(paths.eventSocket());
 }
 
-int runDaemon(const Options& options) {
+int runDaemon(const Options& options, const platform::StopRequest& stop) {
     const platform::Paths paths(options.root);
     makeDirectories(paths);
     platform::LinuxHostOptions hostOptions{.paths = paths,
                                            .eventSocket = eventSocket(paths),
-                                           .messageClasses = kstd::messageClasses()};
+                                           .messageClasses = kstd::messageClasses(),
+                                           .stop = &stop};
     if (!hostOptions.eventSocket.isOpen()) {
         std::cerr << "kstd-dev: cannot make the event socket " << paths.eventSocket() << '\n';
         return 1;
@@ -87,6 +89,7 @@ int runDaemon(const Options& options) {
 } // namespace
 
 int main(int argc, char** argv) try {
+    const platform::StopRequest stop;
     std::signal(SIGPIPE, SIG_IGN);
     CLI::App app("Runs the daemon with all its paths under a root directory of its own.");
     Options options;
@@ -101,7 +104,7 @@ int main(int argc, char** argv) try {
     app.add_option("--slowest-speed", options.slowestSpeed,
                    "Fewer bytes a second than this are too slow; 0 is the default");
     CLI11_PARSE(app, argc, argv);
-    return runDaemon(options);
+    return runDaemon(options, stop);
 } catch (const std::exception& error) {
     std::fprintf(stderr, "kstd-dev: %s\n", error.what());
     return 1;

@@ -35,15 +35,18 @@ class HTTPConnection::Deadline {
 };
 
 State HTTPConnection::awaitReady(short events, const Deadline& deadline) const {
-    pollfd watched{socket_.get(), events, 0};
+    pollfd watched[2] = {{socket_.get(), events, 0}, {interrupt_, POLLIN, 0}};
     int ready = -1;
     do {
-        ready = ::poll(&watched, 1, deadline.milliseconds());
+        ready = ::poll(watched, 2, deadline.milliseconds());
     } while (ready < 0 && errno == EINTR);
     if (ready < 0) {
         return State::hungUp;
     }
-    return ready > 0 ? State::open : State::timedOut;
+    if (ready == 0) {
+        return State::timedOut;
+    }
+    return watched[0].revents != 0 ? State::open : State::interrupted;
 }
 
 State HTTPConnection::send(std::span<const std::uint8_t> message) {

@@ -20,6 +20,8 @@ enum class HTTPConnectionState {
     hungUp,
     /// The peer was waited for as long as it may be.
     timedOut,
+    /// What ends all waits became readable.
+    interrupted,
     /// What came is no message.
     malformed,
 };
@@ -37,8 +39,10 @@ class HTTPConnection {
     /// How long one message may take in either direction; none is for ever.
     using Patience = std::optional<std::chrono::milliseconds>;
 
-    HTTPConnection(base::FileDescriptor socket, Patience patience)
-        : socket_(std::move(socket)), patience_(patience) {}
+    /// Once the descriptor `interrupt`, which stays the caller's, is readable, nothing is waited
+    /// for any more; -1 for none.
+    HTTPConnection(base::FileDescriptor socket, Patience patience, int interrupt = -1)
+        : socket_(std::move(socket)), patience_(patience), interrupt_(interrupt) {}
 
     [[nodiscard]] HTTPConnectionState send(std::span<const std::uint8_t> message);
 
@@ -63,6 +67,7 @@ class HTTPConnection {
 
     base::FileDescriptor socket_;
     Patience patience_;
+    int interrupt_;
     std::vector<std::uint8_t> fields_;
 };
 

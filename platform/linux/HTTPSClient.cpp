@@ -33,7 +33,8 @@ Result<HTTPSClient> HTTPSClient::start(const RemoteHTTPOptions& options) {
     if (!program) {
         return unreachable(options.program.front(), wordsFor(error));
     }
-    wire::HTTPConnection connection(program->takeConnection(), options.silenceLimit);
+    wire::HTTPConnection connection(program->takeConnection(), options.silenceLimit,
+                                    options.stopDescriptor());
     return HTTPSClient(std::move(program), std::move(connection));
 }
 
@@ -47,7 +48,8 @@ Result<HTTPSClient> HTTPSClient::connect(const RemoteHTTPOptions& options) {
         return unreachable(options.socket, wordsFor(reached.error));
     }
     return HTTPSClient(std::nullopt,
-                       wire::HTTPConnection(std::move(reached.socket), options.silenceLimit));
+                       wire::HTTPConnection(std::move(reached.socket), options.silenceLimit,
+                                            options.stopDescriptor()));
 }
 
 } // namespace platform

@@ -44,6 +44,7 @@ RemoteHTTPOptions httpsOptions(const LinuxHostOptions& options) {
     if (https.socket.empty()) {
         https.socket = options.paths.httpsSocket();
     }
+    https.stop = options.stop;
     return https;
 }
 
@@ -80,6 +81,9 @@ struct LinuxHost::Parts {
             log.write(LogLevel::warning,
                       "kstd: EventSocket: no socket was handed over; no events will arrive.\n", {});
         }
+        if (options.stop != nullptr && options.stop->descriptor() >= 0) {
+            stop = runLoop.addUrgent(options.stop->descriptor(), [this] { closeStreams(); });
+        }
         if (options.idleTime) {
             idleExit = std::make_unique<IdleExit>(
                 runLoop, *options.idleTime, [this] { return events.busy() || transactions.busy(); },
@@ -115,6 +119,10 @@ struct LinuxHost::Parts {
     }
 
     void closeStreams() {
+        if (std::exchange(closed, true)) {
+            return;
+        }
+        stop.reset();
         sd_notify(0, "STOPPING=1");
         eventSocket.reset();
         settingsWatch.reset();
@@ -144,6 +152,8 @@ struct LinuxHost::Parts {
     LinuxAlarm alarm;
     std::optional<SettingsWatch> settingsWatch;
     std::unique_ptr<EventSocket> eventSocket;
+    std::unique_ptr<RunLoopSource> stop;
+    bool closed = false;
     std::unique_ptr<IdleExit> idleExit;
 };
 

@@ -5,6 +5,7 @@
 #include "platform/MessageClass.h"
 #include "platform/linux/Paths.h"
 #include "platform/linux/RemoteHTTPSessions.h"
+#include "platform/linux/StopRequest.h"
 
 #include <chrono>
 #include <memory>
@@ -23,6 +24,9 @@ struct LinuxHostOptions {
     std::optional<std::chrono::milliseconds> idleTime = std::nullopt;
     /// The program's log lines that have an identifier in the journal; they outlive the host.
     std::span<const MessageClass> messageClasses = {};
+    /// What asks the process to end; it outlives the host. The host then closes its streams as soon
+    /// as the event in hand is handled, and ends every HTTPS request at once.
+    const StopRequest* stop = nullptr;
     /// Where the HTTPS client is; with neither socket nor program, behind paths.httpsSocket().
     RemoteHTTPOptions https{};
 };
@@ -42,7 +46,7 @@ class LinuxHost {
 
     /// Takes the run loop's sources away, as the end of an idle process does: no event is received
     /// any more, and the loop cannot be run once what was received is delivered. What waits in the
-    /// event socket stays there and launches the next process.
+    /// event socket stays there and launches the next process. Once is enough.
     void closeStreams();
 
   private:

@@ -17,6 +17,7 @@ namespace platform {
 namespace {
 
 constexpr std::int64_t kPendingPriority = SD_EVENT_PRIORITY_NORMAL - 1;
+constexpr std::int64_t kUrgentPriority = SD_EVENT_PRIORITY_NORMAL - 2;
 constexpr std::uint64_t kOneMicrosecond = 1;
 constexpr std::uint64_t kNoTimeout = UINT64_MAX;
 constexpr std::int64_t kNanosecondsPerMicrosecond = 1000;
@@ -101,8 +102,20 @@ bool LinuxRunLoop::runOnce(Date deadline) {
 
 std::unique_ptr<RunLoopSource> LinuxRunLoop::addReadable(int descriptor,
                                                          RunLoopSource::Handler handler) {
-    std::unique_ptr<RunLoopSource> source(
-        new RunLoopSource(*this, RunLoopSource::Keeps::loopRunning, std::move(handler)));
+    return addDescriptor(descriptor, RunLoopSource::Keeps::loopRunning, std::move(handler));
+}
+
+std::unique_ptr<RunLoopSource> LinuxRunLoop::addUrgent(int descriptor,
+                                                       RunLoopSource::Handler handler) {
+    auto source = addDescriptor(descriptor, RunLoopSource::Keeps::nothing, std::move(handler));
+    requireMade(sd_event_source_set_priority(source->source_, kUrgentPriority));
+    return source;
+}
+
+std::unique_ptr<RunLoopSource> LinuxRunLoop::addDescriptor(int descriptor,
+                                                           RunLoopSource::Keeps keeps,
+                                                           RunLoopSource::Handler handler) {
+    std::unique_ptr<RunLoopSource> source(new RunLoopSource(*this, keeps, std::move(handler)));
     const auto callback = [](sd_event_source*, int, std::uint32_t, void* self) {
         return RunLoopSource::dispatch(self);
     };

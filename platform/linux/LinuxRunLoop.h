@@ -47,7 +47,7 @@ class RunLoopSource {
 };
 
 /// MainRunLoop on sd-event. The sources that it is given count as sources of the loop while they
-/// are enabled, except for timers.
+/// are enabled, except for timers and urgent ones.
 class LinuxRunLoop final : public MainRunLoop {
   public:
     explicit LinuxRunLoop(SystemLog& log);
@@ -60,6 +60,11 @@ class LinuxRunLoop final : public MainRunLoop {
     [[nodiscard]] std::unique_ptr<RunLoopSource> addReadable(int descriptor,
                                                              RunLoopSource::Handler handler);
 
+    /// As addReadable, but ahead of everything else that is ready, and no reason for the loop to
+    /// run.
+    [[nodiscard]] std::unique_ptr<RunLoopSource> addUrgent(int descriptor,
+                                                           RunLoopSource::Handler handler);
+
     /// Calls `handler` in every turn of the loop in which it is enabled, before any descriptor is
     /// looked at. Disabled at first.
     [[nodiscard]] std::unique_ptr<RunLoopSource> addPending(RunLoopSource::Handler handler);
@@ -69,6 +74,9 @@ class LinuxRunLoop final : public MainRunLoop {
 
   private:
     friend class RunLoopSource;
+
+    [[nodiscard]] std::unique_ptr<RunLoopSource>
+    addDescriptor(int descriptor, RunLoopSource::Keeps keeps, RunLoopSource::Handler handler);
 
     SystemLog& log_;
     sd_event* event_ = nullptr;

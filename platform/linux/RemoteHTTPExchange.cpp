@@ -86,6 +86,10 @@ std::optional<wire::HTTPMessageBytes> RemoteHTTPExchange::requestMessage() const
 
 RemoteHTTPExchange::State RemoteHTTPExchange::handle(const wire::HTTPMessage& message) {
     using Type = wire::HTTPMessageType;
+    const bool isAnswer = message.type == Type::failure || message.type == Type::response;
+    if (!isAnswer && settings_.options.mustStop()) {
+        return State::interrupted;
+    }
     switch (message.type) {
     case Type::working:
         return State::open;
@@ -182,6 +186,8 @@ HTTPReply RemoteHTTPExchange::replyFor(State state) const {
     case State::malformed:
         return failedReply(kTransferFailed,
                            "transfer failed: the HTTPS client sent what it must not");
+    case State::interrupted:
+        return failedReply(kTransferFailed, kStoppedDescription);
     case State::hungUp:
     case State::open:
         break;

@@ -24,6 +24,9 @@ struct RemoteHTTPSettings {
 /// A client asks about no more than so many challenges of one request.
 inline constexpr int kMaximumChallenges = 4;
 
+/// Of kTransferFailed, for a request that the end of this process has ended.
+inline constexpr char kStoppedDescription[] = "transfer failed: the daemon is asked to end";
+
 /// One request over a connection to the HTTPS client: gives it the request, and whatever it asks
 /// for, until it has answered. The request must have passed refusalOf. All three must outlast this.
 class RemoteHTTPExchange {

@@ -11,6 +11,9 @@ HTTPReply replyTo(const HTTPRequest& request, const RemoteHTTPSettings& settings
     if (auto refusal = refusalOf(request)) {
         return *std::move(refusal);
     }
+    if (settings.options.mustStop()) {
+        return failedReply(kTransferFailed, kStoppedDescription);
+    }
     Result<HTTPSClient> client = HTTPSClient::reach(settings.options);
     if (!client) {
         return {client.error(), std::nullopt, {}};

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/HTTPSession.h"
+#include "platform/linux/StopRequest.h"
 
 #include <chrono>
 #include <map>
@@ -20,6 +21,13 @@ struct RemoteHTTPOptions {
     /// How long it may say nothing. It says something every second while it works, so this is not
     /// a limit on servers.
     std::chrono::milliseconds silenceLimit = std::chrono::seconds(30);
+    /// Ends requests, with kTransferFailed, that have no answer yet, and each that is started
+    /// later. It outlives the sessions.
+    const StopRequest* stop = nullptr;
+
+    [[nodiscard]] bool mustStop() const { return stop != nullptr && stop->isMade(); }
+    /// For poll.
+    [[nodiscard]] int stopDescriptor() const { return stop != nullptr ? stop->descriptor() : -1; }
 };
 
 /// HTTP and HTTPS through another process, so that this one has no code for either: of what comes

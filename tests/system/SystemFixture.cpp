@@ -84,9 +84,12 @@ std::vector<Request> SystemFixture::requests() {
     return all;
 }
 
+std::unique_ptr<Program> SystemFixture::beginDaemon(const std::vector<std::string>& options) {
+    return std::make_unique<Program>(joined({KSTD_DEV, "--root", root.path().string()}, options));
+}
+
 std::unique_ptr<Program> SystemFixture::startDaemon(const std::vector<std::string>& options) {
-    auto daemon =
-        std::make_unique<Program>(joined({KSTD_DEV, "--root", root.path().string()}, options));
+    auto daemon = beginDaemon(options);
     EXPECT_TRUE(daemon->awaitLine("kstd: main: Entering the main runloop."));
     return daemon;
 }

@@ -47,7 +47,9 @@ class SystemFixture : public testing::Test {
     /// The control requests that the kernel side has received since `requests clear`.
     std::vector<Request> requests();
 
-    /// The daemon with an event socket of its own, in its run loop when this returns.
+    /// The daemon with an event socket of its own, as it begins.
+    std::unique_ptr<Program> beginDaemon(const std::vector<std::string>& options = {});
+    /// The same, in its run loop when this returns.
     std::unique_ptr<Program> startDaemon(const std::vector<std::string>& options = {});
 
     /// The supervisor, which owns the event socket and launches a daemon for each event.

@@ -140,6 +140,22 @@ TEST_F(UploadFaultsTest, ServerThatSendsAByteASecond) {
     expectToBeGivenUp("byte-a-second");
 }
 
+TEST_F(UploadFaultsTest, AnUploadOfADaemonThatIsAskedToEndEndsAtOnce) {
+    launchFor({.uploadURL = uploadLink()});
+    control("fault never-answers");
+    makeUploadDue();
+    kernel("publish timer-restarted-analytics total=60");
+    ASSERT_TRUE(daemon->awaitLine("Splunk upload challenge"));
+    daemon->signal(SIGTERM);
+    EXPECT_EQ(daemon->awaitEnd(), 0);
+    EXPECT_EQ(daemon->count(concat(kFailed, "transfer failed: the daemon is asked to end")), 1U);
+    EXPECT_EQ(kernelStatus("acks"), "2");
+    EXPECT_EQ(storedEvents(), 2);
+    control("reset");
+    launch({"--trust-anchors", collector.authority()});
+    expectNextUploadIsAccepted();
+}
+
 TEST_F(UploadFaultsTest, CertificatesThatAreNotInOrder) {
     const struct {
         const char* name;

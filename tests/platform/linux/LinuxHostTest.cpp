@@ -8,6 +8,7 @@
 #include "platform/linux/RealTime.h"
 #include "tests/platform/linux/RootDirectory.h"
 #include "tests/platform/linux/StandardErrorCapture.h"
+#include "tests/support/TerminationSignal.h"
 #include "wire/EventDatagram.h"
 
 #include <gmock/gmock.h>
@@ -42,11 +43,17 @@ class LinuxHostTest : public testing::Test {
 
     void start(std::optional<std::chrono::milliseconds> idleTime,
                base::FileDescriptor eventSocket) {
-        host = std::make_unique<LinuxHost>(LinuxHostOptions{
-            .paths = root.paths(), .eventSocket = std::move(eventSocket), .idleTime = idleTime});
+        host = std::make_unique<LinuxHost>(LinuxHostOptions{.paths = root.paths(),
+                                                            .eventSocket = std::move(eventSocket),
+                                                            .idleTime = idleTime,
+                                                            .stop = stop});
         for (const char* const stream : {"com.zerva.notifyd.matching", kAlarms}) {
-            interfaces().events.setHandler(
-                stream, [this](const Event& event) { delivered.push_back(event.name); });
+            interfaces().events.setHandler(stream, [this](const Event& event) {
+                delivered.push_back(event.name);
+                if (event.name == "stops the process") {
+                    support::TerminationSignal::send();
+                }
+            });
         }
     }
 
@@ -84,6 +91,7 @@ class LinuxHostTest : public testing::Test {
     support::RootDirectory root;
     std::vector<std::string> delivered;
     std::unique_ptr<LinuxHost> host;
+    const StopRequest* stop = nullptr;
 };
 
 TEST_F(LinuxHostTest, IdleHostSaysThatItStopsAndLeavesTheLoopWithoutSources) {
@@ -120,6 +128,71 @@ TEST_F(LinuxHostTest, EventThatArrivesAfterTheEndStaysInTheSocketForTheNextProce
     start(std::nullopt, std::move(kept));
     handleAll();
     EXPECT_THAT(delivered, ElementsAre("late"));
+}
+
+/// A host that looks for SIGTERM.
+class StoppedHostTest : public LinuxHostTest {
+  protected:
+    StoppedHostTest() { stop = &request_; }
+    ~StoppedHostTest() override { host.reset(); }
+
+    void runToTheEnd() {
+        while (interfaces().runLoop.runOnce(kDistantFuture)) {
+        }
+    }
+
+  private:
+    const support::TerminationSignal signal_;
+    const StopRequest request_;
+};
+
+TEST_F(StoppedHostTest, TheEventInHandIsTheLastAndWhatIsQueuedStaysInTheSocket) {
+    base::FileDescriptor first = makeEventSocket(root.paths().eventSocket());
+    base::FileDescriptor kept(::fcntl(first.get(), F_DUPFD_CLOEXEC, 0));
+    start(std::chrono::hours(1), std::move(first));
+    for (const char* const event : {"before", "stops the process", "queued"}) {
+        send("com.zerva.notifyd.matching", event);
+    }
+    runToTheEnd();
+    EXPECT_THAT(delivered, ElementsAre("before", "stops the process"));
+    stop = nullptr;
+    start(std::nullopt, std::move(kept));
+    handleAll();
+    EXPECT_THAT(delivered, ElementsAre("before", "stops the process", "queued"));
+}
+
+TEST_F(StoppedHostTest, WhatWasReceivedIsDelivered) {
+    start();
+    send("com.zerva.notifyd.matching", "received");
+    EXPECT_TRUE(interfaces().runLoop.runOnce({0}));
+    support::TerminationSignal::send();
+    EXPECT_THAT(delivered, ElementsAre());
+    runToTheEnd();
+    EXPECT_THAT(delivered, ElementsAre("received"));
+}
+
+TEST_F(StoppedHostTest, WaitingForAnAlarmEnds) {
+    start(std::chrono::hours(1));
+    setAlarm(kFarAway);
+    support::TerminationSignal::send();
+    runToTheEnd();
+    EXPECT_THAT(delivered, ElementsAre());
+}
+
+TEST_F(StoppedHostTest, AStopBeforeTheFirstTurnIsSeenAndSaidOnce) {
+    const base::FileDescriptor listener = makeEventSocket(root.real("/run/notify"));
+    ::setenv("NOTIFY_SOCKET", root.real("/run/notify").c_str(), 1);
+    support::TerminationSignal::send();
+    start(std::chrono::milliseconds(0));
+    send("com.zerva.notifyd.matching", "queued");
+    runToTheEnd();
+    host->closeStreams();
+    ::unsetenv("NOTIFY_SOCKET");
+    EXPECT_THAT(delivered, ElementsAre());
+    char message[64] = {};
+    EXPECT_GT(::recv(listener.get(), message, sizeof message - 1, MSG_DONTWAIT), 0);
+    EXPECT_STREQ(message, "STOPPING=1");
+    EXPECT_LT(::recv(listener.get(), message, sizeof message, MSG_DONTWAIT), 0);
 }
 
 TEST_F(LinuxHostTest, AlarmDatagramCountsForThePresentRegistrationOnly) {

@@ -156,5 +156,28 @@ TEST_F(LinuxRunLoopTest, TimerFiresOnce) {
     EXPECT_EQ(fired, 1);
 }
 
+TEST_F(LinuxRunLoopTest, WhatIsUrgentGoesFirstButGivesTheLoopNoReasonToRun) {
+    std::string order;
+    std::unique_ptr<RunLoopSource> urgent;
+    urgent = loop.addUrgent(signal.descriptor(), [&] {
+        order += 'u';
+        urgent.reset();
+    });
+    signal.signal();
+    other.signal();
+    EXPECT_FALSE(loop.runOnce({0}));
+    const auto readable = loop.addReadable(other.descriptor(), [&] { order += 'd'; });
+    std::unique_ptr<RunLoopSource> pending;
+    pending = loop.addPending([&] {
+        order += 'p';
+        pending.reset();
+    });
+    pending->setEnabled(true);
+    for (int turns = 0; turns < 3; ++turns) {
+        EXPECT_TRUE(loop.runOnce({0}));
+    }
+    EXPECT_EQ(order, "upd");
+}
+
 } // namespace
 } // namespace platform

@@ -6,6 +6,7 @@
 #include "tests/platform/linux/ScriptedHTTPSClient.h"
 #include "tests/support/HTTPRequests.h"
 #include "tests/support/TemporaryDirectory.h"
+#include "tests/support/TerminationSignal.h"
 
 #include <gtest/gtest.h>
 
@@ -90,7 +91,8 @@ class RemoteHTTPClientTest : public testing::Test {
                 EXPECT_EQ(message.type, wire::HTTPMessageType::request);
                 script(connection);
             });
-        RemoteHTTPSessions sessions({.socket = socket(), .silenceLimit = silenceLimit_});
+        RemoteHTTPSessions sessions(
+            {.socket = socket(), .silenceLimit = silenceLimit_, .stop = stop_});
         return fetch(sessions, request, delegate);
     }
 
@@ -106,6 +108,7 @@ class RemoteHTTPClientTest : public testing::Test {
 
     support::TemporaryDirectory directory_;
     std::chrono::milliseconds silenceLimit_ = 10s;
+    const platform::StopRequest* stop_ = nullptr;
 };
 
 TEST_F(RemoteHTTPClientTest, RequestAsItArrives) {
@@ -444,6 +447,76 @@ TEST_F(RemoteHTTPClientTest, DelegateThatGoesMeanwhileLeavesItToTheEvaluation) {
     }
     EXPECT_EQ(outcomeOf(keeper.reply()), "200");
     EXPECT_EQ(verdict, HTTPVerdict::leaveToEvaluation);
+}
+
+/// Requests of a process that gets SIGTERM.
+class StoppedHTTPClientTest : public RemoteHTTPClientTest {
+  protected:
+    StoppedHTTPClientTest() { stop_ = &request_; }
+
+    static Error stopped() {
+        return {platform::kTransportErrorDomain, platform::kTransferFailed,
+                "transfer failed: the daemon is asked to end"};
+    }
+
+  private:
+    const support::TerminationSignal signal_;
+    const platform::StopRequest request_;
+};
+
+TEST_F(StoppedHTTPClientTest, ARequestWithoutAnAnswerEndsAtOnce) {
+    silenceLimit_ = 1h;
+    const HTTPReply reply = replyWhen([](HTTPConnection& connection) {
+        support::TerminationSignal::send();
+        awaitHangUp(connection);
+    });
+    EXPECT_EQ(reply.error, stopped());
+}
+
+TEST_F(StoppedHTTPClientTest, NoMoreOfABodyIsGivenAway) {
+    silenceLimit_ = 1h;
+    const std::string body(100, 'b');
+    const HTTPReply reply = replyWhen(
+        [](HTTPConnection& connection) {
+            HTTPMessage message;
+            EXPECT_EQ(connection.send(wire::encodeHTTPBodyWanted(50)), State::open);
+            EXPECT_EQ(connection.receive(message), State::open);
+            support::TerminationSignal::send();
+            static_cast<void>(connection.send(wire::encodeHTTPBodyWanted(50)));
+            EXPECT_EQ(connection.receive(message), State::hungUp);
+        },
+        post(kLink, body));
+    EXPECT_EQ(reply.error, stopped());
+}
+
+TEST_F(StoppedHTTPClientTest, AClientThatNeverPausesIsLeftAlone) {
+    const HTTPReply reply = replyWhen([](HTTPConnection& connection) {
+        EXPECT_EQ(connection.send(wire::encodeHTTPWorking()), State::open);
+        support::TerminationSignal::send();
+        while (connection.send(wire::encodeHTTPWorking()) == State::open) {
+        }
+    });
+    EXPECT_EQ(reply.error, stopped());
+}
+
+TEST_F(StoppedHTTPClientTest, AnAnswerThatHasComeCounts) {
+    const HTTPReply reply = replyWhen([](HTTPConnection& connection) {
+        EXPECT_EQ(connection.send(joined({response(4), piece("body")})), State::open);
+        support::TerminationSignal::send();
+        awaitHangUp(connection);
+    });
+    EXPECT_EQ(outcomeOf(reply), "200");
+    EXPECT_EQ(reply.body, "body");
+}
+
+TEST_F(StoppedHTTPClientTest, NothingIsStartedAfterIt) {
+    support::TerminationSignal::send();
+    bool wasReached = false;
+    const support::ScriptedHTTPSClient client(
+        socket(), [&](HTTPConnection& /*connection*/, int /*socket*/) { wasReached = true; });
+    RemoteHTTPSessions sessions({.socket = socket(), .stop = stop_});
+    EXPECT_EQ(fetch(sessions, get(kLink)).error, stopped());
+    EXPECT_FALSE(wasReached);
 }
 
 } // namespace

@@ -1,0 +1,31 @@
+#pragma once
+
+#include "base/FileDescriptor.h"
+
+namespace platform {
+
+/// SIGTERM as something to look at. From the construction on the signal ends nothing by itself: it
+/// is noted whenever it comes, and acted on by whoever looks. It stays noted for good, also when
+/// this is gone.
+///
+/// Made before the process has other threads, because these take over what is blocked. When no
+/// descriptor can be had, the signal goes on ending the process at once.
+class StopRequest {
+  public:
+    StopRequest();
+    StopRequest(const StopRequest&) = delete;
+    StopRequest& operator=(const StopRequest&) = delete;
+    ~StopRequest() = default;
+
+    /// Any thread.
+    [[nodiscard]] bool isMade() const;
+
+    /// Readable from the request on, for every waiter and for ever: it is polled together with
+    /// what a wait is for, and never read from. -1, which poll passes over, when there is none.
+    [[nodiscard]] int descriptor() const { return signal_.get(); }
+
+  private:
+    base::FileDescriptor signal_;
+};
+
+} // namespace platform
