@@ -2,7 +2,10 @@
 
 #include "kstctl/Report.h"
 
+#include <cstddef>
+#include <optional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 namespace kstctl {
@@ -20,16 +23,54 @@ enum class Colours { no, yes };
 /// real number that is not finite is null.
 [[nodiscard]] std::string JSONForm(const Report& report);
 
-/// Rows of texts under headings.
-struct Table {
-    std::vector<std::string> headings;
-    std::vector<std::vector<std::string>> rows;
+/// The JSON object of a report whose last value is a list, made piece by piece.
+class JSONListForm {
+  public:
+    /// `head` is what stands before the list, `name` is the list's.
+    JSONListForm(const Report& head, std::string_view name);
+
+    /// What comes before the first element.
+    [[nodiscard]] const std::string& start() const { return start_; }
+    /// The next element.
+    [[nodiscard]] std::string element(const Report& report);
+    /// What comes behind the last one.
+    [[nodiscard]] static std::string end() { return "]}\n"; }
+
+  private:
+    std::string start_;
+    bool isFirst_ = true;
 };
 
-/// Columns as wide as their widest text, two blanks between them, none at the end of a line.
-[[nodiscard]] std::string textForm(const Table& table, Colours colours);
+/// A text as it stands inside a string of JSON.
+[[nodiscard]] std::string JSONTextForm(std::string_view text);
 
-/// One line for each row, the headings first, with a tab between two texts.
-[[nodiscard]] std::string tabbedForm(const Table& table);
+using Row = std::vector<std::string>;
+
+/// Rows of texts under headings, in columns as wide as their widest text with two blanks between
+/// them, and none at the end of a line.
+///
+/// Where a line has less room the columns that fit stand side by side, and each of the others has
+/// lines of its own below them, two blanks further right.
+class Table {
+  public:
+    /// `room` is how many characters fit into a line; none is as many as it takes.
+    Table(Row headings, std::optional<std::size_t> room);
+
+    /// Widens the columns for the row. All rows come here before the first line is made.
+    void measure(const Row& row);
+
+    [[nodiscard]] std::string headingLines(Colours colours) const;
+    [[nodiscard]] std::string lines(const Row& row) const;
+
+  private:
+    [[nodiscard]] std::size_t columnsSideBySide() const;
+
+    Row headings_;
+    std::optional<std::size_t> room_;
+    std::vector<std::size_t> widths_;
+};
+
+/// The row in one line, with a tab between two texts.
+[[nodiscard]] std::string tabbedLine(const Row& row);
 
 } // namespace kstctl

@@ -73,14 +73,35 @@ void write(const Report& report, platform::JSONWriter& json) {
     json.endMap();
 }
 
-} // namespace
-
-std::string JSONForm(const Report& report) {
+std::string objectOf(const Report& report) {
     platform::JSONWriter json;
     write(report, json);
     // An object is always something that JSON can express.
     const auto text = json.finish();
-    return base::concat(printableJSON(text.value().view()), '\n');
+    return printableJSON(text.value().view());
+}
+
+} // namespace
+
+std::string JSONForm(const Report& report) {
+    return objectOf(report) + '\n';
+}
+
+JSONListForm::JSONListForm(const Report& head, std::string_view name) : start_(objectOf(head)) {
+    start_.pop_back();
+    start_ += base::concat(head.isEmpty() ? "" : ",", '"', name, "\":[");
+}
+
+std::string JSONListForm::element(const Report& report) {
+    return base::concat(std::exchange(isFirst_, false) ? "" : ",", objectOf(report));
+}
+
+std::string JSONTextForm(std::string_view text) {
+    platform::JSONWriter json;
+    writeText(text, json);
+    const auto quoted = json.finish();
+    const std::string_view whole = quoted.value().view();
+    return printableJSON(whole.substr(1, whole.size() - 2));
 }
 
 } // namespace kstctl

@@ -1,21 +1,48 @@
 #include "kstctl/Options.h"
 
+#include "base/Concat.h"
 #include "kstctl/Output.h"
 #include "kstctl/decode/Kinds.h"
 
 #include <CLI/CLI.hpp>
 
+#include <charconv>
 #include <cstdio>
 #include <limits>
 #include <memory>
+#include <string>
+#include <system_error>
 
 namespace kstctl {
 
 namespace {
 
-constexpr int kLongestPatience = 3'600'000;
+constexpr std::int64_t kLongestPatience = 3'600'000;
 /// The end of the year 9999.
 constexpr double kLatestPostTime = 253'402'300'800'000.0;
+
+constexpr std::int64_t kSmallest = std::numeric_limits<std::int64_t>::min();
+constexpr std::int64_t kLargest = std::numeric_limits<std::int64_t>::max();
+
+/// A word that is wholly a number from `least` to `greatest`, in decimal digits.
+template <typename Number>
+CLI::Validator numberBetween(Number least, Number greatest) {
+    return CLI::Validator(
+        [least, greatest](std::string& word) {
+            Number number{};
+            const char* const end = word.data() + word.size();
+            const auto result = std::from_chars(word.data(), end, number);
+            if (result.ec == std::errc() && result.ptr == end && number >= least &&
+                number <= greatest) {
+                // The parser would take some words for octal numbers.
+                word = std::to_string(number);
+                return std::string();
+            }
+            return base::concat("Value ", word, " not in range ", std::to_string(least), " to ",
+                                std::to_string(greatest));
+        },
+        "");
+}
 
 CLI::App* addCommand(CLI::App& parent, const char* name, const char* description) {
     CLI::App* const command = parent.add_subcommand(name, description);
@@ -38,11 +65,13 @@ void addEvents(CLI::App& app, Options& options) {
     CLI::App* const list = addCommand(*events, "list", "A table of them");
     auto& listing = chosenBy<EventsListCommand>(list, options);
     list->add_option("--limit", listing.limit, "Only the last so many")
-        ->check(CLI::Range(std::int64_t{0}, std::numeric_limits<std::int64_t>::max()));
+        ->transform(numberBetween<std::int64_t>(0, kLargest));
     list->add_option("--type", listing.type, "Only those of this type");
 
     CLI::App* const show = addCommand(*events, "show", "One of them");
-    show->add_option("id", chosenBy<EventsShowCommand>(show, options).id, "Its number")->required();
+    show->add_option("id", chosenBy<EventsShowCommand>(show, options).id, "Its number")
+        ->required()
+        ->transform(numberBetween(kSmallest, kLargest));
 
     CLI::App* const exporting = addCommand(*events, "export", "All of them, for other programs");
     exporting->add_option("--output", chosenBy<EventsExportCommand>(exporting, options).output,
@@ -50,14 +79,24 @@ void addEvents(CLI::App& app, Options& options) {
 }
 
 void addUpload(CLI::App& app, Options& options) {
-    CLI::App* const upload = addCommand(app, "upload", "The document of an upload");
+    CLI::App* const upload =
+        addCommand(app, "upload", "The document of an upload, and the date of the next one");
     auto& command = chosenBy<UploadCommand>(upload, options);
-    upload->add_flag("--dry-run", command.isDryRun, "Print it; nothing is sent or changed")
-        ->required();
-    upload
-        ->add_option("--post-time", command.postTime,
-                     "As if it were sent then, in milliseconds since 1970")
-        ->check(CLI::Range(0.0, kLatestPostTime));
+    CLI::Option* const dryRun =
+        upload->add_flag("--dry-run", command.isDryRun, "Print it; nothing is sent or changed");
+    CLI::Option* const postTime =
+        upload
+            ->add_option("--post-time", command.postTime,
+                         "As if it were sent then, in milliseconds since 1970")
+            ->check(numberBetween(0.0, kLatestPostTime));
+    upload->add_flag("--now", command.isNow, "Make it due: the next event uploads")
+        ->excludes(dryRun)
+        ->excludes(postTime);
+    upload->parse_complete_callback([&command] {
+        if (!command.isDryRun && !command.isNow) {
+            throw CLI::RequiredError("--dry-run or --now");
+        }
+    });
 }
 
 void addSend(CLI::App& app, Options& options) {
@@ -94,13 +133,21 @@ void addSim(CLI::App& app, Options& options) {
     sim->add_option("words", chosenBy<SimCommand>(sim, options).words, "The command")->required();
 }
 
+/// What the parser says, or the word that stands where a command must.
+std::string reasonOf(const CLI::App& app, const CLI::ParseError& problem) {
+    const std::vector<std::string> words = app.remaining(true);
+    const bool isCommand = dynamic_cast<const CLI::RequiredError*>(&problem) != nullptr &&
+                           !words.empty() && !words.front().starts_with('-');
+    return isCommand ? base::concat("there is no command ", words.front()) : problem.what();
+}
+
 /// Help and version go to standard output; everything else is a mistake.
 ExitStatus statusOfParseError(const CLI::App& app, const CLI::ParseError& problem) {
     if (problem.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success)) {
         app.exit(problem);
         return std::fflush(stdout) == 0 ? ExitStatus::success : ExitStatus::failed;
     }
-    Output::complain(problem.what());
+    Output::complain(reasonOf(app, problem));
     return ExitStatus::usage;
 }
 
@@ -116,7 +163,7 @@ std::optional<Options> parseOptions(int argc, const char* const* argv, ExitStatu
     app.add_flag("--json", options.isJSON, "Results as JSON");
     int patience = static_cast<int>(options.patience.count());
     app.add_option("--wait", patience, "Longest wait for a lock or a full socket, in milliseconds")
-        ->check(CLI::Range(0, kLongestPatience))
+        ->transform(numberBetween<std::int64_t>(0, kLongestPatience))
         ->capture_default_str();
     addCommand(app, "status", "The daemon, its files and what it will do next");
     addEvents(app, options);

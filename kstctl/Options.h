@@ -31,6 +31,8 @@ struct EventsExportCommand {
 
 struct UploadCommand {
     bool isDryRun = false;
+    /// Instead of that: the next upload is due.
+    bool isNow = false;
     /// Milliseconds since 1970-01-01 UTC; now without it.
     std::optional<double> postTime;
 };

@@ -4,11 +4,10 @@
 #include "kstctl/TerminalText.h"
 #include "kstctl/WholeWrite.h"
 
-#include <cerrno>
 #include <cstdlib>
 #include <string_view>
+#include <sys/ioctl.h>
 #include <system_error>
-#include <unistd.h>
 
 namespace kstctl {
 
@@ -24,20 +23,25 @@ bool isDumbTerminal() {
     return kind == nullptr || std::string_view(kind) == "dumb";
 }
 
+std::optional<std::size_t> widthOf(int terminal) {
+    winsize size{};
+    return ::ioctl(terminal, TIOCGWINSZ, &size) == 0 && size.ws_col > 0
+               ? std::optional<std::size_t>(size.ws_col)
+               : std::nullopt;
+}
+
 } // namespace
 
-Output::Output(bool isJSON)
+Output::Output(bool isJSON, int descriptor)
     : isJSON_(isJSON),
-      isTerminal_(::isatty(STDOUT_FILENO) == 1),
+      isTerminal_(::isatty(descriptor) == 1),
       colours_(isTerminal_ && !isJSON && !isSet("NO_COLOR") && !isDumbTerminal() ? Colours::yes
-                                                                                 : Colours::no) {}
+                                                                                 : Colours::no),
+      width_(isTerminal_ ? widthOf(descriptor) : std::nullopt),
+      results_(descriptor) {}
 
 void Output::show(const Report& report) {
     put(isJSON_ ? JSONForm(report) : textForm(report, colours_));
-}
-
-void Output::show(const Table& table) {
-    put(textForm(table, colours_));
 }
 
 void Output::complain(std::string_view message) {
@@ -47,10 +51,11 @@ void Output::complain(std::string_view message) {
 }
 
 ExitStatus Output::finish(ExitStatus status) {
-    if (writeWhole(STDOUT_FILENO, results_.view())) {
+    const int error = results_.finish();
+    if (error == 0) {
         return status;
     }
-    complain(base::concat("cannot write: ", std::generic_category().message(errno)));
+    complain(base::concat("cannot write: ", std::generic_category().message(error)));
     return ExitStatus::failed;
 }
 

@@ -6,6 +6,7 @@
 #include <array>
 #include <charconv>
 #include <string_view>
+#include <utility>
 
 namespace kstctl {
 
@@ -109,28 +110,60 @@ class Writer {
     std::string text_;
 };
 
-std::vector<std::vector<std::string>> printableRows(const Table& table) {
-    std::vector<std::vector<std::string>> rows;
-    rows.reserve(table.rows.size() + 1);
-    rows.push_back(table.headings);
-    for (const auto& row : table.rows) {
-        rows.push_back(row);
+/// However narrow a terminal is.
+constexpr std::size_t kLeastRoom = 20;
+constexpr std::size_t kBetweenColumns = 2;
+constexpr std::string_view kIndent = "  ";
+
+/// How many bytes of the text stand in a line of `room` characters: up to its last blank there, or
+/// as many as fit.
+std::size_t lengthOfLine(std::string_view text, std::size_t room) {
+    std::size_t characters = 0;
+    std::size_t lastBlank = std::string_view::npos;
+    for (std::size_t at = 0; at < text.size(); ++at) {
+        const bool beginsCharacter = (static_cast<unsigned char>(text[at]) & 0xc0U) != 0x80U;
+        if (beginsCharacter && characters == room) {
+            return text[at] == ' ' || lastBlank == std::string_view::npos ? at : lastBlank;
+        }
+        characters += beginsCharacter ? 1 : 0;
+        lastBlank = text[at] == ' ' && at > 0 ? at : lastBlank;
     }
-    for (auto& row : rows) {
-        std::transform(row.begin(), row.end(), row.begin(),
-                       [](const std::string& text) { return printable(text); });
-    }
-    return rows;
+    return text.size();
 }
 
-std::vector<std::size_t> widthsOf(const std::vector<std::vector<std::string>>& rows) {
-    std::vector<std::size_t> widths(rows.front().size());
-    for (const auto& row : rows) {
-        for (std::size_t column = 0; column < row.size(); ++column) {
-            widths[column] = std::max(widths[column], characterCount(row[column]));
-        }
+/// The text in lines of at most `room` characters behind the indent.
+std::string folded(std::string_view text, std::size_t room) {
+    std::string lines;
+    while (!text.empty()) {
+        const std::size_t length = lengthOfLine(text, room - kIndent.size());
+        lines += base::concat(kIndent, text.substr(0, length), '\n');
+        text.remove_prefix(length);
+        text.remove_prefix(text.starts_with(' ') ? 1 : 0);
     }
-    return widths;
+    return lines;
+}
+
+/// The first `columns` texts of the row, all of them printable.
+std::string sideBySide(const Row& row, const std::vector<std::size_t>& widths,
+                       std::size_t columns) {
+    std::string line;
+    std::size_t missing = 0;
+    for (std::size_t column = 0; column < columns; ++column) {
+        if (!row[column].empty()) {
+            line += std::string(missing, ' ');
+            line += row[column];
+            missing = 0;
+        }
+        missing += widths[column] - characterCount(row[column]) + kBetweenColumns;
+    }
+    return line;
+}
+
+Row printableRow(const Row& row) {
+    Row texts(row.size());
+    std::transform(row.begin(), row.end(), texts.begin(),
+                   [](const std::string& text) { return printable(text); });
+    return texts;
 }
 
 } // namespace
@@ -141,37 +174,55 @@ std::string textForm(const Report& report, Colours colours) {
     return writer.take();
 }
 
-std::string textForm(const Table& table, Colours colours) {
-    const auto rows = printableRows(table);
-    const std::vector<std::size_t> widths = widthsOf(rows);
-    std::string text;
-    for (const auto& row : rows) {
-        std::string line;
-        std::size_t missing = 0;
-        for (std::size_t column = 0; column < row.size(); ++column) {
-            if (!row[column].empty()) {
-                line += std::string(missing, ' ');
-                line += row[column];
-                missing = 0;
-            }
-            missing += widths[column] - characterCount(row[column]) + 2;
+Table::Table(Row headings, std::optional<std::size_t> room)
+    : headings_(std::move(headings)),
+      room_(room ? std::optional(std::max(*room, kLeastRoom)) : room),
+      widths_(headings_.size()) {
+    measure(headings_);
+}
+
+void Table::measure(const Row& row) {
+    for (std::size_t column = 0; column < widths_.size(); ++column) {
+        widths_[column] = std::max(widths_[column], characterCount(printable(row[column])));
+    }
+}
+
+std::size_t Table::columnsSideBySide() const {
+    std::size_t columns = 0;
+    std::size_t needed = 0;
+    while (columns < widths_.size()) {
+        needed += widths_[columns] + (columns > 0 ? kBetweenColumns : 0);
+        if (room_ && needed > *room_) {
+            break;
         }
-        text += &row == &rows.front() ? coloured(line, kBold, colours) : line;
-        text += '\n';
+        ++columns;
+    }
+    return columns;
+}
+
+std::string Table::headingLines(Colours colours) const {
+    const std::string text = lines(headings_);
+    return base::concat(coloured(text.substr(0, text.size() - 1), kBold, colours), '\n');
+}
+
+std::string Table::lines(const Row& row) const {
+    const Row texts = printableRow(row);
+    const std::size_t columns = columnsSideBySide();
+    std::string text =
+        columns > 0 ? base::concat(sideBySide(texts, widths_, columns), '\n') : std::string();
+    for (std::size_t column = columns; column < texts.size(); ++column) {
+        text += folded(texts[column], *room_);
     }
     return text;
 }
 
-std::string tabbedForm(const Table& table) {
-    std::string text;
-    for (const auto& row : printableRows(table)) {
-        for (std::size_t column = 0; column < row.size(); ++column) {
-            text += column == 0 ? "" : "\t";
-            text += row[column];
-        }
-        text += '\n';
+std::string tabbedLine(const Row& row) {
+    std::string line;
+    for (const std::string& text : row) {
+        line += &text == &row.front() ? "" : "\t";
+        line += printable(text);
     }
-    return text;
+    return line + '\n';
 }
 
 } // namespace kstctl

@@ -2,6 +2,7 @@
 #include "kstctl/FileError.h"
 #include "kstctl/Options.h"
 #include "kstctl/Output.h"
+#include "kstctl/Progress.h"
 #include "kstctl/commands/Commands.h"
 
 #include <exception>
@@ -15,6 +16,7 @@ using kstctl::ExitStatus;
 
 ExitStatus runIn(const kstctl::Options& options) {
     kstctl::Output output(options.isJSON);
+    kstctl::Progress progress;
     std::error_code error;
     const std::string root = std::filesystem::absolute(options.root, error).string();
     const bool isDirectory = std::filesystem::is_directory(root, error);
@@ -25,7 +27,8 @@ ExitStatus runIn(const kstctl::Options& options) {
         return output.finish(
             kstctl::failure(ExitStatus::missing, base::concat("there is no directory ", root)));
     }
-    const kstctl::Environment environment{platform::Paths(root), output, options.patience};
+    const kstctl::Environment environment{platform::Paths(root), output, progress,
+                                          options.patience};
     return std::visit([&environment](const auto& command) { return run(command, environment); },
                       options.command);
 }

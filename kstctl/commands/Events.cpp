@@ -1,5 +1,6 @@
 #include "base/Concat.h"
 #include "kstctl/Output.h"
+#include "kstctl/Progress.h"
 #include "kstctl/commands/Commands.h"
 #include "kstctl/commands/NewFile.h"
 #include "kstctl/database/EventText.h"
@@ -7,6 +8,8 @@
 #include "platform/linux/LinuxPropertyLists.h"
 
 #include <algorithm>
+#include <functional>
+#include <set>
 #include <utility>
 
 namespace kstctl {
@@ -15,40 +18,103 @@ namespace {
 
 constexpr char kNoEvent[] = "(no event in this row)";
 
-struct ReadableEvents {
-    /// How many the database holds, whatever was asked for.
-    std::uint64_t stored = 0;
-    std::optional<std::string> uploadDate;
-    std::vector<ReadableEvent> events;
-};
+using EventVisitor = std::function<void(const ReadableEvent& event)>;
 
-platform::Result<ReadableEvents> readEvents(const Environment& environment,
-                                            std::optional<std::int64_t> id) {
-    auto database = readEventDatabase(environment.paths.under(kstd::kAnalyticsDatabasePath),
-                                      {.withEvents = true, .id = id}, environment.patience);
-    if (!database) {
-        return database.error();
-    }
-    platform::LinuxPropertyLists propertyLists;
-    ReadableEvents readable{
-        .stored = database.value().count, .uploadDate = database.value().uploadDate, .events = {}};
-    for (const StoredEvent& event : database.value().events) {
-        readable.events.push_back(ReadableEvent::of(event, propertyLists));
-    }
-    return readable;
+platform::Result<EventDatabase> readEvents(const Environment& environment,
+                                           std::optional<std::int64_t> id) {
+    auto database = readEventDatabase(
+        environment.paths.under(kstd::kAnalyticsDatabasePath),
+        {.withEvents = true, .id = id, .progress = &environment.progress}, environment.patience);
+    environment.progress.end();
+    return database;
 }
 
-Report reportOf(const ReadableEvents& readable) {
-    Data events;
-    for (const ReadableEvent& event : readable.events) {
-        events.emplace_back(event.report());
+/// What was read, to be gone through as often as a form of it needs. The first fault stays.
+class Listing {
+  public:
+    Listing(const EventDatabase& database, const Environment& environment)
+        : database_(database), environment_(environment) {}
+
+    /// Keeps those of a type, and of these the last so many.
+    void restrict(const EventsListCommand& command) {
+        type_ = command.type;
+        if (!command.limit) {
+            return;
+        }
+        std::uint64_t count = database_.events.size();
+        if (type_) {
+            count = 0;
+            visit("looking for events", [&count](const auto& /*event*/) { ++count; });
+        }
+        toLeaveOut_ = count - std::min(count, *command.limit);
     }
-    Report report;
-    report.add("stored", readable.stored)
-        .add("uploadDate",
-             readable.uploadDate ? Report::Datum(*readable.uploadDate) : Report::None())
-        .add("events", std::move(events));
-    return report;
+
+    void visit(const char* what, const EventVisitor& visitor) {
+        if (fault_) {
+            return;
+        }
+        environment_.progress.begin(what, database_.events.size());
+        std::uint64_t left = toLeaveOut_;
+        fault_ = database_.events.visit([&](const StoredEvent& stored) {
+            environment_.progress.advance();
+            if (left > 0 && !type_) {
+                --left;
+                return;
+            }
+            const ReadableEvent event = ReadableEvent::of(stored, propertyLists_);
+            if (type_ && event.type() != type_) {
+                return;
+            }
+            if (left > 0) {
+                --left;
+                return;
+            }
+            visitor(event);
+        });
+        environment_.progress.end();
+    }
+
+    /// The same, where what the visitor writes may be shown by the terminal itself.
+    void write(const EventVisitor& visitor) {
+        visit("writing events", [this, &visitor](const ReadableEvent& event) {
+            if (environment_.output.isTerminal()) {
+                environment_.progress.end();
+            }
+            visitor(event);
+        });
+    }
+
+    [[nodiscard]] Report head() const {
+        Report report;
+        report.add("stored", database_.count)
+            .add("uploadDate",
+                 database_.uploadDate ? Report::Datum(*database_.uploadDate) : Report::None());
+        return report;
+    }
+
+    [[nodiscard]] ExitStatus finish() const {
+        return fault_ ? environment_.output.finish(*fault_)
+                      : environment_.output.finish(ExitStatus::success);
+    }
+
+    [[nodiscard]] const std::optional<platform::Error>& fault() const { return fault_; }
+
+  private:
+    const EventDatabase& database_;
+    const Environment& environment_;
+    platform::LinuxPropertyLists propertyLists_;
+    std::optional<std::string> type_;
+    std::uint64_t toLeaveOut_ = 0;
+    std::optional<platform::Error> fault_;
+};
+
+using Put = std::function<void(std::string_view text)>;
+
+void writeJSON(Listing& listing, const Put& put) {
+    JSONListForm form(listing.head(), "events");
+    put(form.start());
+    listing.write([&](const ReadableEvent& event) { put(form.element(event.report())); });
+    put(JSONListForm::end());
 }
 
 /// The attributes but for those that have columns of their own.
@@ -65,13 +131,17 @@ std::string otherAttributes(const ReadableEvent& event) {
     return text;
 }
 
-Table tableOf(const std::vector<ReadableEvent>& events) {
-    Table table{.headings = {"ID", "ADDED", "TYPE", "ATTRIBUTES"}, .rows = {}};
-    for (const ReadableEvent& event : events) {
-        table.rows.push_back({base::concat(event.id), event.addedText(), event.type().value_or(""),
-                              otherAttributes(event)});
-    }
-    return table;
+Row rowOf(const ReadableEvent& event) {
+    return {base::concat(event.id), event.addedText(), event.type().value_or(""),
+            otherAttributes(event)};
+}
+
+void writeTable(Listing& listing, Output& output) {
+    Table table({"ID", "ADDED", "TYPE", "ATTRIBUTES"}, output.width());
+    listing.visit("measuring events",
+                  [&table](const ReadableEvent& event) { table.measure(rowOf(event)); });
+    output.put(table.headingLines(output.colours()));
+    listing.write([&](const ReadableEvent& event) { output.put(table.lines(rowOf(event))); });
 }
 
 /// Empty when the event does not have it.
@@ -84,81 +154,87 @@ std::string attributeOf(const ReadableEvent& event, const std::string& key) {
 }
 
 /// A column for every attribute that any of the events has.
-Table wideTableOf(const std::vector<ReadableEvent>& events) {
-    std::vector<std::string> keys;
-    for (const ReadableEvent& event : events) {
+void writeTabbed(Listing& listing, const Put& put) {
+    std::set<std::string> keys;
+    listing.visit("looking for attributes", [&keys](const ReadableEvent& event) {
         for (const auto& [key, value] : event.attributes.value_or(platform::ValueMap())) {
-            if (!std::binary_search(keys.begin(), keys.end(), key)) {
-                keys.insert(std::lower_bound(keys.begin(), keys.end(), key), key);
-            }
+            keys.insert(key);
         }
-    }
-    Table table{.headings = {"id", "added"}, .rows = {}};
-    table.headings.insert(table.headings.end(), keys.begin(), keys.end());
-    for (const ReadableEvent& event : events) {
-        auto& row = table.rows.emplace_back(
-            std::vector<std::string>{base::concat(event.id), event.addedText()});
+    });
+    Row headings{"id", "added"};
+    headings.insert(headings.end(), keys.begin(), keys.end());
+    put(tabbedLine(headings));
+    listing.write([&](const ReadableEvent& event) {
+        Row row{base::concat(event.id), event.addedText()};
         for (const std::string& key : keys) {
             row.push_back(attributeOf(event, key));
         }
-    }
-    return table;
+        put(tabbedLine(row));
+    });
 }
 
-void keepWanted(std::vector<ReadableEvent>& events, const EventsListCommand& command) {
-    if (command.type) {
-        std::erase_if(events,
-                      [&command](const auto& event) { return event.type() != command.type; });
-    }
-    if (command.limit && *command.limit < events.size()) {
-        events.erase(events.begin(), events.end() - static_cast<std::ptrdiff_t>(*command.limit));
+void writeExport(Listing& listing, bool isJSON, const Put& put) {
+    if (isJSON) {
+        writeJSON(listing, put);
+    } else {
+        writeTabbed(listing, put);
     }
 }
 
 } // namespace
 
 ExitStatus run(const EventsListCommand& command, const Environment& environment) {
-    auto result = readEvents(environment, std::nullopt);
-    if (!result) {
-        return environment.output.finish(result.error());
+    Output& output = environment.output;
+    const auto database = readEvents(environment, std::nullopt);
+    if (!database) {
+        return output.finish(database.error());
     }
-    ReadableEvents readable = std::move(result).value();
-    keepWanted(readable.events, command);
-    if (environment.output.isJSON()) {
-        environment.output.show(reportOf(readable));
+    Listing listing(database.value(), environment);
+    listing.restrict(command);
+    if (output.isJSON()) {
+        writeJSON(listing, [&output](std::string_view text) { output.put(text); });
     } else {
-        environment.output.show(tableOf(readable.events));
+        writeTable(listing, output);
     }
-    return environment.output.finish(ExitStatus::success);
+    return listing.finish();
 }
 
 ExitStatus run(const EventsShowCommand& command, const Environment& environment) {
-    const auto result = readEvents(environment, command.id);
-    if (!result) {
-        return environment.output.finish(result.error());
+    const auto database = readEvents(environment, command.id);
+    if (!database) {
+        return environment.output.finish(database.error());
     }
-    if (result.value().events.empty()) {
+    if (database.value().events.size() == 0) {
         return environment.output.finish(
             failure(ExitStatus::missing, base::concat("there is no event ", command.id)));
     }
-    environment.output.show(result.value().events.front().report());
-    return environment.output.finish(ExitStatus::success);
+    Listing listing(database.value(), environment);
+    listing.visit("looking at the event", [&environment](const ReadableEvent& event) {
+        environment.output.show(event.report());
+    });
+    return listing.finish();
 }
 
 ExitStatus run(const EventsExportCommand& command, const Environment& environment) {
-    const auto result = readEvents(environment, std::nullopt);
-    if (!result) {
-        return environment.output.finish(result.error());
+    Output& output = environment.output;
+    const auto database = readEvents(environment, std::nullopt);
+    if (!database) {
+        return output.finish(database.error());
     }
-    const std::string text = environment.output.isJSON()
-                                 ? JSONForm(reportOf(result.value()))
-                                 : tabbedForm(wideTableOf(result.value().events));
+    Listing listing(database.value(), environment);
     if (!command.output) {
-        environment.output.put(text);
-    } else if (const auto error = writeNewFile(*command.output, text)) {
-        return environment.output.finish(*error);
+        writeExport(listing, output.isJSON(),
+                    [&output](std::string_view text) { output.put(text); });
+        return listing.finish();
     }
-    return environment.output.finish(ExitStatus::success);
+    auto made = NewFile::make(*command.output);
+    if (!made) {
+        return output.finish(made.error());
+    }
+    NewFile file = std::move(made).value();
+    writeExport(listing, output.isJSON(), [&file](std::string_view text) { file.put(text); });
+    const auto fault = listing.fault() ? listing.fault() : file.finish();
+    return fault ? output.finish(*fault) : output.finish(ExitStatus::success);
 }
 
 } // namespace kstctl

@@ -1,11 +1,10 @@
 #include "kstctl/commands/NewFile.h"
 
-#include "base/FileDescriptor.h"
 #include "kstctl/FileError.h"
-#include "kstctl/WholeWrite.h"
 
 #include <fcntl.h>
 #include <unistd.h>
+#include <utility>
 
 namespace kstctl {
 
@@ -20,17 +19,29 @@ platform::Error writeError(const std::string& path, int error) {
 
 } // namespace
 
-std::optional<platform::Error> writeNewFile(const std::string& path, std::string_view content) {
-    const base::FileDescriptor file(
+platform::Result<NewFile> NewFile::make(const std::string& path) {
+    base::FileDescriptor file(
         ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kOwnerOnly));
     if (!file.isOpen()) {
         return writeError(path, errno);
     }
-    if (!writeWhole(file.get(), content)) {
-        const int error = errno;
-        ::unlink(path.c_str());
-        return writeError(path, error);
+    return NewFile(path, std::move(file));
+}
+
+NewFile::NewFile(std::string path, base::FileDescriptor file)
+    : path_(std::move(path)), file_(std::move(file)), content_(file_.get()) {}
+
+NewFile::~NewFile() {
+    if (file_.isOpen()) {
+        ::unlink(path_.c_str());
     }
+}
+
+std::optional<platform::Error> NewFile::finish() {
+    if (const int error = content_.finish(); error != 0) {
+        return writeError(path_, error);
+    }
+    file_.reset();
     return std::nullopt;
 }
 

@@ -51,12 +51,15 @@ platform::Result<platform::Bytes> registeredDate(const EventName& name,
 platform::Result<platform::Bytes> payloadOf(const SendCommand& command, const EventName& name,
                                             const platform::Paths& paths) {
     if (command.payload) {
-        return bytesOfHex(*command.payload);
+        auto bytes = bytesOfHex(*command.payload);
+        return bytes ? bytes
+                     : failure(ExitStatus::usage, base::concat("--payload ", *command.payload, ": ",
+                                                               bytes.error().description));
     }
     if (command.date) {
         const auto date = dateOfText(*command.date);
         return date ? platform::Result<platform::Bytes>(payloadOf(*date))
-                    : failure(ExitStatus::malformed, base::concat("no date: ", *command.date));
+                    : failure(ExitStatus::usage, base::concat("no date: ", *command.date));
     }
     return name.stream == wire::kAlarmStream ? registeredDate(name, paths) : platform::Bytes();
 }

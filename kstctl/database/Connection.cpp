@@ -24,21 +24,40 @@ std::string link(std::string_view path, Connection::Log log) {
             text += base::concat('%', kDigits[byte >> 4U], kDigits[byte & 0xfU]);
         }
     }
-    // Without the first the index beside the log would be made and written.
-    text += "?readonly_shm=1";
+    if (log != Connection::Log::written) {
+        // Without it the index beside the log would be made and written.
+        text += "?readonly_shm=1";
+    }
     return text + (log == Connection::Log::ignored ? "&immutable=1" : "");
+}
+
+ExitStatus statusOfCode(int code) {
+    constexpr int kPrimaryCodeMask = 0xff;
+    switch (code & kPrimaryCodeMask) {
+    case SQLITE_NOTADB:
+    case SQLITE_CORRUPT:
+    case SQLITE_FORMAT:
+    case SQLITE_ERROR: // Of texts that are always the same: the tables are others.
+        return ExitStatus::malformed;
+    case SQLITE_PERM:
+    case SQLITE_AUTH:
+        return ExitStatus::unreadable;
+    default:
+        return ExitStatus::failed;
+    }
 }
 
 } // namespace
 
 Connection::Connection(const std::string& path, Log log, std::chrono::milliseconds patience) {
-    const char* const files = registerReadOnlyFiles();
-    if (files == nullptr) {
+    const bool isWritten = log == Log::written;
+    const char* const files = isWritten ? nullptr : registerReadOnlyFiles();
+    if (files == nullptr && !isWritten) {
         return;
     }
     sqlite3* db = nullptr;
-    code_ = sqlite3_open_v2(link(path, log).c_str(), &db, SQLITE_OPEN_READONLY | SQLITE_OPEN_URI,
-                            files);
+    const int access = isWritten ? SQLITE_OPEN_READWRITE : SQLITE_OPEN_READONLY;
+    code_ = sqlite3_open_v2(link(path, log).c_str(), &db, access | SQLITE_OPEN_URI, files);
     db_.reset(db);
     if (code_ == SQLITE_OK) {
         sqlite3_extended_result_codes(db, 1);
@@ -57,6 +76,14 @@ std::string Connection::message() const {
     return sqlite3_errmsg(get());
 }
 
+platform::Error databaseError(const std::string& path, const Connection& connection, int code) {
+    return code == SQLITE_EMPTY
+               ? failure(ExitStatus::malformed,
+                         base::concat(path, ": not a database of kstd's events"))
+               : failure(statusOfCode(code),
+                         base::concat(path, ": ", connection.message(), " (", code, ')'));
+}
+
 Query::Query(Connection& connection, const char* SQL) {
     sqlite3_stmt* statement = nullptr;
     code_ = sqlite3_prepare_v2(connection.get(), SQL, -1, &statement, nullptr);
@@ -66,6 +93,14 @@ Query::Query(Connection& connection, const char* SQL) {
 Query::Query(Connection& connection, const char* SQL, std::int64_t bound) : Query(connection, SQL) {
     if (code_ == SQLITE_OK) {
         code_ = sqlite3_bind_int64(row(), 1, bound);
+    }
+}
+
+Query::Query(Connection& connection, const char* SQL, const std::string& bound)
+    : Query(connection, SQL) {
+    if (code_ == SQLITE_OK) {
+        code_ = sqlite3_bind_text64(row(), 1, bound.data(), bound.size(), SQLITE_TRANSIENT,
+                                    SQLITE_UTF8);
     }
 }
 

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "kstctl/ExitStatus.h"
 #include "platform/Error.h"
 
 #include <chrono>
@@ -10,7 +11,8 @@
 
 namespace kstctl {
 
-/// A connection that only reads. Codes are SQLite's, extended.
+/// A connection that makes no database, and only reads unless it is told. Codes are SQLite's,
+/// extended.
 class Connection {
   public:
     /// How the files beside the database are dealt with.
@@ -19,6 +21,8 @@ class Connection {
         used,
         /// There is none, and nobody may write while the connection is open: nothing is locked.
         ignored,
+        /// As SQLite does, by a connection that writes.
+        written,
     };
 
     Connection(const std::string& path, Log log, std::chrono::milliseconds patience);
@@ -42,12 +46,23 @@ class Connection {
     int code_ = SQLITE_CANTOPEN;
 };
 
+/// Counts, of the tables that a database of events has, those that are there: kTableCount of them.
+inline constexpr char kTablesQuery[] = "select count(*) from sqlite_master where type = 'table' "
+                                       "and name in ('all_events', 'Properties')";
+inline constexpr int kTableCount = 2;
+
+/// The error for a code that is a failure; SQLITE_EMPTY stands for a database of another kind.
+[[nodiscard]] platform::Error databaseError(const std::string& path, const Connection& connection,
+                                            int code);
+
 /// A statement that is run once. `code` is that of the last step, SQLITE_ROW while there is a row.
 class Query {
   public:
     Query(Connection& connection, const char* SQL);
     /// With an integer in the place of its question mark.
     Query(Connection& connection, const char* SQL, std::int64_t bound);
+    /// With a text there.
+    Query(Connection& connection, const char* SQL, const std::string& bound);
 
     /// Whether there is a row.
     [[nodiscard]] bool step();

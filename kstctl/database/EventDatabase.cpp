@@ -2,6 +2,7 @@
 
 #include "base/Concat.h"
 #include "kstctl/ExitStatus.h"
+#include "kstctl/Progress.h"
 #include "kstctl/database/Connection.h"
 #include "kstctl/database/DatabaseFiles.h"
 
@@ -17,21 +18,6 @@ constexpr int kAttempts = 8;
 constexpr int kMillisecondsBetweenLooks = 5;
 
 constexpr int kPrimaryCodeMask = 0xff;
-
-ExitStatus statusOfCode(int code) {
-    switch (code & kPrimaryCodeMask) {
-    case SQLITE_NOTADB:
-    case SQLITE_CORRUPT:
-    case SQLITE_FORMAT:
-    case SQLITE_ERROR: // Of texts that are always the same: the tables are others.
-        return ExitStatus::malformed;
-    case SQLITE_PERM:
-    case SQLITE_AUTH:
-        return ExitStatus::unreadable;
-    default:
-        return ExitStatus::failed;
-    }
-}
 
 StoredEvent eventOf(sqlite3_stmt* row) {
     StoredEvent event{.id = sqlite3_column_int64(row, 0), .added = {}, .data = {}};
@@ -69,12 +55,11 @@ class Reader {
 
   private:
     [[nodiscard]] int checkTables() {
-        Query tables(connection_, "select count(*) from sqlite_master where type = 'table' and "
-                                  "name in ('all_events', 'Properties')");
+        Query tables(connection_, kTablesQuery);
         if (!tables.step()) {
             return tables.code();
         }
-        return sqlite3_column_int(tables.row(), 0) == 2 ? SQLITE_OK : SQLITE_EMPTY;
+        return sqlite3_column_int(tables.row(), 0) == kTableCount ? SQLITE_OK : SQLITE_EMPTY;
     }
 
     [[nodiscard]] int readNumbers(EventDatabase& database) {
@@ -100,8 +85,16 @@ class Reader {
                 ? Query(connection_, "select id, timestamp, data from all_events where id = ?",
                         *query_.id)
                 : Query(connection_, "select id, timestamp, data from all_events order by id");
+        if (query_.progress != nullptr) {
+            query_.progress->begin("reading events", query_.id ? 1 : database.count);
+        }
         while (events.step()) {
-            database.events.push_back(eventOf(events.row()));
+            if (!database.events.add(eventOf(events.row()))) {
+                return SQLITE_OK;
+            }
+            if (query_.progress != nullptr) {
+                query_.progress->advance();
+            }
         }
         return events.isDone() ? SQLITE_OK : events.code();
     }
@@ -118,14 +111,13 @@ platform::Result<EventDatabase> readOnce(const std::string& path, Connection::Lo
     EventDatabase database;
     code = connection.code() == SQLITE_OK ? Reader(connection, query).read(database)
                                           : connection.code();
+    if (database.events.problem()) {
+        return *database.events.problem();
+    }
     if (code == SQLITE_OK) {
         return database;
     }
-    return code == SQLITE_EMPTY
-               ? failure(ExitStatus::malformed,
-                         base::concat(path, ": not a database of kstd's events"))
-               : failure(statusOfCode(code),
-                         base::concat(path, ": ", connection.message(), " (", code, ')'));
+    return databaseError(path, connection, code);
 }
 
 /// Whether the log or its index was there to be seen and was not there to be opened, as when one

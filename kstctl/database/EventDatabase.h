@@ -1,30 +1,24 @@
 #pragma once
 
+#include "kstctl/database/EventRows.h"
 #include "platform/Result.h"
-#include "platform/Value.h"
 
 #include <chrono>
 #include <cstdint>
 #include <optional>
 #include <string>
-#include <vector>
 
 namespace kstctl {
 
-/// A row of the events' table.
-struct StoredEvent {
-    std::int64_t id = 0;
-    /// When it was added, in seconds since 2001-01-01 UTC; none when the row does not say.
-    std::optional<double> added;
-    /// The event as a property list; none when the row holds something else.
-    std::optional<platform::Bytes> data;
-};
+class Progress;
 
 /// What is wanted of the events; their number and the upload date always come with it.
 struct EventQuery {
     bool withEvents = false;
     /// Only this one.
     std::optional<std::int64_t> id;
+    /// Is told of each row that was read.
+    Progress* progress = nullptr;
 };
 
 /// What the database held at one moment.
@@ -33,7 +27,7 @@ struct EventDatabase {
     /// The stored text of the date at which the next upload is due.
     std::optional<std::string> uploadDate;
     /// In the order of their numbers, which is that in which they came.
-    std::vector<StoredEvent> events;
+    EventRows events;
 };
 
 /// Reads the analytics database in one transaction, which ends before this returns.
@@ -43,7 +37,8 @@ struct EventDatabase {
 /// to `patience`.
 ///
 /// Fails with ExitStatus::missing, ::unreadable, ::malformed (not a database, a damaged one, or one
-/// of another kind) or ::failed (locked; or a log beside it that only the daemon can work off).
+/// of another kind) or ::failed (locked; a log beside it that only the daemon can work off; or no
+/// room for what was read).
 [[nodiscard]] platform::Result<EventDatabase> readEventDatabase(const std::string& path,
                                                                 const EventQuery& query,
                                                                 std::chrono::milliseconds patience);

@@ -6,6 +6,8 @@
 #include "platform/shared/BinaryPropertyList.h"
 #include "tests/kstctl/KstctlFixture.h"
 
+#include <chrono>
+#include <cmath>
 #include <filesystem>
 #include <fstream>
 #include <regex>
@@ -68,6 +70,10 @@ TEST_F(KstctlCommandsTest, EventsAsTable) {
     const std::string alone = concat("2   T  policy  ", kPolicyAttributes, "\n");
     EXPECT_EQ(withoutTimes(kstctl({"events", "list", "--limit", "1"}).out), narrow + alone);
     EXPECT_EQ(withoutTimes(kstctl({"events", "list", "--type", "policy"}).out), narrow + alone);
+    // Decimal digits, whatever stands before them.
+    EXPECT_EQ(withoutTimes(kstctl({"events", "list", "--limit", "0001"}).out), narrow + alone);
+    EXPECT_EQ(withoutTimes(kstctl({"events", "list", "--limit", "9223372036854775807"}).out),
+              heading + first + second);
     EXPECT_EQ(kstctl({"events", "list", "--limit", "0"}).out, "ID  ADDED  TYPE  ATTRIBUTES\n");
     EXPECT_EQ(withoutTimes(kstctl({"events", "show", "1"}).out),
               "id: 1\nadded: T (T)\nevent:\n  eventTime: T\n  eventType: timerRestarted\n"
@@ -79,6 +85,29 @@ TEST_F(KstctlCommandsTest, EventsAsTable) {
               "totalRestrictedModeDurationMin\n"
               "1\tT\t\tT\ttimerRestarted\t4\t\t\t\t\t\t\tkst\t1\n"
               "2\tT\t86400\tT\tpolicy\t3\t0\t0\t0\t1\t1\t3600\tkst\t\n");
+}
+
+TEST_F(KstctlCommandsTest, EventsOnTerminals) {
+    keepTwoEvents();
+    const std::string line = "2   T  policy";
+    EXPECT_EQ(withoutTimes(kstctl({"events", "list", "--type", "policy"},
+                                  {.onTerminal = true, .columns = 60, .environment = {"TERM=dumb"}})
+                               .out),
+              concat("ID  ADDED                 TYPE\r\n  ATTRIBUTES\r\n", line, "\r\n",
+                     "  eventPeriodDuration=86400 eventVersion=3\r\n"
+                     "  policyDisabledByBootArg=0 policyDisabledByPasscodeNotSet=0\r\n"
+                     "  policyDisabledByQuorvane=0 policyEnabled=1\r\n"
+                     "  restrictedMode=1 restrictedModeDuration=3600 topic=kst\r\n"));
+    const std::string wide = concat("ID  ADDED                 TYPE    ATTRIBUTES\r\n", line, "  ",
+                                    kPolicyAttributes, "\r\n");
+    // The room of one that does not say has no end.
+    for (const auto columns : {static_cast<unsigned short>(0), static_cast<unsigned short>(300)}) {
+        EXPECT_EQ(withoutTimes(
+                      kstctl({"events", "list", "--type", "policy"},
+                             {.onTerminal = true, .columns = columns, .environment = {"TERM=dumb"}})
+                          .out),
+                  wide);
+    }
 }
 
 TEST_F(KstctlCommandsTest, EventsAsJSON) {
@@ -170,20 +199,49 @@ TEST_F(KstctlCommandsTest, WrongCommandLines) {
     const std::pair<Arguments, std::string> kWrong[] = {
         {{}, "A subcommand is required"},
         {{"status", "mo\x1bre"}, "The following argument was not expected: mo\\x1bre"},
-        {{"bogus"}, "A subcommand is required"},
+        {{"bogus"}, "there is no command bogus"},
+        {{"--json", "bog\x1bus", "more"}, "there is no command bog\\x1bus"},
+        {{"bogus", "status"}, "The following argument was not expected: bogus"},
+        {{"--bogus"}, "A subcommand is required"},
+        {{"--bogus", "status"}, "The following argument was not expected: --bogus"},
         {{"events"}, "A subcommand is required"},
+        {{"events", "bogus"}, "there is no command bogus"},
         {{"events", "show"}, "id is required"},
-        {{"events", "show", "x"}, "Could not convert: id = x"},
+        {{"events", "show", "x"},
+         "id: Value x not in range -9223372036854775808 to 9223372036854775807"},
+        {{"events", "show", "9223372036854775808"},
+         "id: Value 9223372036854775808 not in range -9223372036854775808 to 9223372036854775807"},
         {{"events", "list", "--limit", "-1"},
          "--limit: Value -1 not in range 0 to 9223372036854775807"},
-        {{"upload"}, "--dry-run is required"},
+        {{"events", "list", "--limit", "9223372036854775808"},
+         "--limit: Value 9223372036854775808 not in range 0 to 9223372036854775807"},
+        {{"events", "list", "--limit", "99999999999999999999999"},
+         "--limit: Value 99999999999999999999999 not in range 0 to 9223372036854775807"},
+        {{"events", "list", "--limit", "0x10"},
+         "--limit: Value 0x10 not in range 0 to 9223372036854775807"},
+        {{"events", "list", "--limit", "5 "},
+         "--limit: Value 5  not in range 0 to 9223372036854775807"},
+        {{"events", "list", "--limit", ""},
+         "--limit: Value  not in range 0 to 9223372036854775807"},
+        {{"upload"}, "--dry-run or --now is required"},
+        {{"upload", "--post-time", "1"}, "--dry-run or --now is required"},
+        {{"upload", "--now", "--dry-run"}, "--dry-run excludes --now"},
+        {{"upload", "--now", "--post-time", "1"}, "--post-time excludes --now"},
+        {{"upload", "--dry-run", "--post-time", "nan"},
+         "--post-time: Value nan not in range 0.000000 to 253402300800000.000000"},
+        {{"upload", "--dry-run", "--post-time", "yesterday"},
+         "--post-time: Value yesterday not in range 0.000000 to 253402300800000.000000"},
         {{"upload", "--dry-run", "--post-time", "-1"},
          "--post-time: Value -1 not in range 0.000000 to 253402300800000.000000"},
         {{"send"}, "name is required"},
         {{"send", "setings"}, "there is no event setings; --exact sends it all the same"},
+        {{"send", "alarm", "--date", "yesterday"}, "no date: yesterday"},
+        {{"send", "settings", "--payload", "zz"},
+         "--payload zz: no hexadecimal digits: another character at character 1"},
         {{"send", "settings", "--payload", "00", "--date", "1"}, "--payload excludes --date"},
         {{"decode", "--kind", "state", "--payload-of", "5", "00"}, "--kind excludes --payload-of"},
         {{"decode", "--file", "x", "00"}, "hex excludes --file"},
+        {{"--wait", "3600001", "status"}, "--wait: Value 3600001 not in range 0 to 3600000"},
         {{"--wait", "-1", "status"}, "--wait: Value -1 not in range 0 to 3600000"},
         {{"status", "more"}, "The following argument was not expected: more"},
         {{"sim"}, "words is required"},
@@ -244,9 +302,8 @@ TEST_F(KstctlCommandsTest, AlarmIsSentForItsRegisteredDate) {
 }
 
 TEST_F(KstctlCommandsTest, EventsThatCannotBeSent) {
-    expectFailure({"send", "settings", "--payload", "0"}, 5,
-                  "no hexadecimal digits: half a byte at character 2");
-    expectFailure({"send", "alarm", "--date", "soon"}, 5, "no date: soon");
+    expectFailure({"send", "settings", "--payload", "0"}, 2,
+                  "--payload 0: no hexadecimal digits: half a byte at character 2");
     const std::string unfit = "an event of these names and this payload cannot be expressed";
     expectFailure({"send", std::string(1025, '.')}, 5, unfit);
     expectFailure({"send", "a.b", "--stream", std::string(256, '.')}, 5, unfit);
@@ -266,6 +323,58 @@ TEST_F(KstctlCommandsTest, FullSocketIsNotWaitedForForEver) {
     }
     expectFailure({"send", "settings", "--wait", "20"}, 1,
                   concat("the event socket ", path, " is full and nobody empties it"));
+}
+
+TEST_F(KstctlCommandsTest, UploadIsMadeDue) {
+    expectFailure({"upload", "--now"}, 3, database() + ": No such file or directory");
+    EXPECT_FALSE(fs::exists(database()));
+    keepTwoEvents();
+    EXPECT_EQ(at(json({"status"}), "database.isUploadDue"), Value(false));
+    const auto dump = [this] {
+        return OtherConnection(database())
+            .one("select group_concat(key || value) from Properties "
+                 "where key <> 'upload_date'");
+    };
+    const std::string others = dump();
+    const auto now = [] {
+        return static_cast<double>(std::chrono::system_clock::now().time_since_epoch().count()) /
+               1e9;
+    };
+    const double before = now();
+    const Value due = json({"upload", "--now"});
+    const std::string stored = OtherConnection(database()).property("upload_date");
+    EXPECT_EQ(at(due, "uploadDate"), Value(stored));
+    EXPECT_EQ(at(due, "isConfigured"), Value(false));
+    EXPECT_GE(static_cast<double>(uploadDate()), std::floor(before - 1));
+    EXPECT_LE(static_cast<double>(uploadDate()), now() - 1);
+    EXPECT_EQ(at(json({"status"}), "database.isUploadDue"), Value(true));
+    EXPECT_EQ(storedEvents(), 2);
+    EXPECT_EQ(dump(), others);
+    OtherConnection(database()).run("delete from Properties where key = 'upload_date'");
+    EXPECT_EQ(kstctl({"upload", "--now"}).out.rfind("uploadDate: 2", 0), 0U);
+    EXPECT_EQ(at(json({"status"}), "database.isUploadDue"), Value(true));
+    // The daemon, which has the database open, tries at the next event.
+    const system_tests::Lines lines = publishEvent();
+    ASSERT_FALSE(lines.empty());
+    EXPECT_EQ(lines.back(), "failed to get a splunk upload endpoint - not uploading");
+
+    OtherConnection writer(database());
+    writer.run("begin exclusive");
+    expectFailure({"upload", "--now", "--wait", "1"}, 1, database() + ": database is locked (5)");
+    writer.run("rollback");
+}
+
+TEST_F(KstctlCommandsTest, OnlyADatabaseOfEventsIsWritten) {
+    fs::create_directories(fs::path(database()).parent_path());
+    std::ofstream(database()) << "something else, and quite long. something else, and quite long.";
+    auto before = files();
+    expectFailure({"upload", "--now"}, 5, database() + ": file is not a database (26)");
+    EXPECT_EQ(files(), before);
+    fs::remove(database());
+    OtherConnection(database()).run("create table other (id)");
+    before = files();
+    expectFailure({"upload", "--now"}, 5, database() + ": not a database of kstd's events");
+    EXPECT_EQ(files(), before);
 }
 
 TEST_F(KstctlCommandsTest, SimulatorIsDriven) {

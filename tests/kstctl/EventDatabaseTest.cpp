@@ -70,6 +70,13 @@ class Writer {
     int count_ = 0;
 };
 
+std::vector<StoredEvent> rowsOf(const EventDatabase& database) {
+    std::vector<StoredEvent> rows;
+    EXPECT_FALSE(database.events.visit([&rows](const auto& event) { rows.push_back(event); }));
+    EXPECT_EQ(rows.size(), database.events.size());
+    return rows;
+}
+
 class EventDatabaseTest : public testing::Test {
   protected:
     /// A database as the daemon makes it, with events of that text as their data.
@@ -103,7 +110,7 @@ class EventDatabaseTest : public testing::Test {
         const auto result = read();
         EXPECT_TRUE(result) << result.error().description;
         std::vector<std::string> texts;
-        for (const StoredEvent& event : result.value().events) {
+        for (const StoredEvent& event : rowsOf(result.value())) {
             texts.emplace_back(event.data->begin(), event.data->end());
         }
         EXPECT_EQ(result.value().count, texts.size());
@@ -343,22 +350,23 @@ TEST_F(EventDatabaseTest, RowsOfEveryKind) {
     const EventDatabase& database = result.value();
     EXPECT_EQ(database.count, 4U);
     EXPECT_FALSE(database.uploadDate);
-    ASSERT_EQ(database.events.size(), 4U);
-    EXPECT_EQ(database.events[0].added, 1.5);
-    EXPECT_FALSE(database.events[1].added);
-    EXPECT_FALSE(database.events[1].data);
-    EXPECT_EQ(database.events[2].added, 7.0);
-    EXPECT_FALSE(database.events[2].data);
-    EXPECT_FALSE(database.events[3].added);
-    EXPECT_EQ(database.events[3].data, platform::Bytes());
-    EXPECT_EQ(database.events[3].id, 4);
+    const auto events = rowsOf(database);
+    ASSERT_EQ(events.size(), 4U);
+    EXPECT_EQ(events[0].added, 1.5);
+    EXPECT_FALSE(events[1].added);
+    EXPECT_FALSE(events[1].data);
+    EXPECT_EQ(events[2].added, 7.0);
+    EXPECT_FALSE(events[2].data);
+    EXPECT_FALSE(events[3].added);
+    EXPECT_EQ(events[3].data, platform::Bytes());
+    EXPECT_EQ(events[3].id, 4);
 }
 
 TEST_F(EventDatabaseTest, OneEventOrNoneAtAll) {
     make({"a", "b", "c"});
     const auto second = read({.withEvents = true, .id = 2});
     ASSERT_EQ(second.value().events.size(), 1U);
-    EXPECT_EQ(second.value().events[0].id, 2);
+    EXPECT_EQ(rowsOf(second.value())[0].id, 2);
     EXPECT_EQ(second.value().count, 3U);
     EXPECT_EQ(read({.withEvents = true, .id = 4}).value().events.size(), 0U);
     const auto numbers = read({.withEvents = false, .id = {}});

@@ -81,15 +81,73 @@ TEST(FormsTest, ColoursAreAroundNamesAndUnknowns) {
               "\x1b[1ma:\x1b[0m 1\n\x1b[1mb:\x1b[0m \x1b[33munknown: why\x1b[0m\n");
 }
 
+/// The whole of a table for a terminal of that width.
+std::string tableOf(const Row& headings, const std::vector<Row>& rows,
+                    std::optional<std::size_t> room = {}, Colours colours = Colours::no) {
+    Table table(headings, room);
+    for (const Row& row : rows) {
+        table.measure(row);
+    }
+    std::string text = table.headingLines(colours);
+    for (const Row& row : rows) {
+        text += table.lines(row);
+    }
+    return text;
+}
+
 TEST(FormsTest, TableAsText) {
-    const Table table{.headings = {"ID", "NAME", "REST"},
-                      .rows = {{"1", "äöü", "x"}, {"100", "", "a\tb"}, {"2", "b", ""}}};
-    EXPECT_EQ(textForm(table, Colours::no), "ID   NAME  REST\n"
-                                            "1    äöü   x\n"
-                                            "100        a\\tb\n"
-                                            "2    b\n");
-    EXPECT_EQ(textForm(Table{.headings = {"A"}, .rows = {}}, Colours::yes), "\x1b[1mA\x1b[0m\n");
-    EXPECT_EQ(tabbedForm(table), "ID\tNAME\tREST\n1\täöü\tx\n100\t\ta\\tb\n2\tb\t\n");
+    const Row headings{"ID", "NAME", "REST"};
+    const std::vector<Row> rows{{"1", "äöü", "x"}, {"100", "", "a\tb"}, {"2", "b", ""}};
+    EXPECT_EQ(tableOf(headings, rows), "ID   NAME  REST\n"
+                                       "1    äöü   x\n"
+                                       "100        a\\tb\n"
+                                       "2    b\n");
+    EXPECT_EQ(tableOf({"A"}, {}, {}, Colours::yes), "\x1b[1mA\x1b[0m\n");
+    EXPECT_EQ(tabbedLine(headings), "ID\tNAME\tREST\n");
+    EXPECT_EQ(tabbedLine(rows[1]), "100\t\ta\\tb\n");
+    EXPECT_EQ(tabbedLine(rows[2]), "2\tb\t\n");
+    EXPECT_EQ(tabbedLine({"", "x"}), "\tx\n");
+}
+
+TEST(FormsTest, TableOnANarrowTerminal) {
+    const Row headings{"ID", "NAME", "REST"};
+    const std::vector<Row> rows{{"1", "12345678", "ä b c d e f g h i j k"}, {"22", "x", ""}};
+    const std::string wide = "ID  NAME      REST\n"
+                             "1   12345678  ä b c d e f g h i j k\n"
+                             "22  x\n";
+    EXPECT_EQ(tableOf(headings, rows, 36), wide);
+    EXPECT_EQ(tableOf(headings, rows, 35), wide);
+    EXPECT_EQ(tableOf(headings, rows, 34), "ID  NAME\n"
+                                           "  REST\n"
+                                           "1   12345678\n"
+                                           "  ä b c d e f g h i j k\n"
+                                           "22  x\n");
+    EXPECT_EQ(tableOf(headings, rows, 22), "ID  NAME\n"
+                                           "  REST\n"
+                                           "1   12345678\n"
+                                           "  ä b c d e f g h i j\n"
+                                           "  k\n"
+                                           "22  x\n");
+    // No terminal is narrower than twenty characters; what has no blank is cut anywhere.
+    const std::string digits(40, '7');
+    for (const std::size_t room : {1U, 19U, 20U}) {
+        EXPECT_EQ(tableOf({"A", "B"}, {{digits, "ö"}}, room),
+                  "  A\n  B\n  " + std::string(18, '7') + "\n  " + std::string(18, '7') +
+                      "\n  7777\n  ö\n");
+    }
+    EXPECT_EQ(tableOf({"A", "B"}, {{"1", "äöüäöüäöüäöüäöüäöüä"}}, 20),
+              "A\n  B\n1\n  äöüäöüäöüäöüäöüäöü\n  ä\n");
+}
+
+TEST(FormsTest, ListOfJSONInPieces) {
+    JSONListForm form(Report().add("a", 1).add("b", Report::None(), "x"), "c");
+    EXPECT_EQ(form.start() + form.element(Report().add("d", 1)) + form.element(Report()) +
+                  JSONListForm::end(),
+              R"({"a":1,"b":null,"bText":"x","c":[{"d":1},{}]})"
+              "\n");
+    EXPECT_EQ(JSONListForm(Report(), "c").start() + JSONListForm::end(), "{\"c\":[]}\n");
+    EXPECT_EQ(JSONTextForm("a\"\n\xc2\x9b"), "a\\\"\\n\\u009b");
+    EXPECT_EQ(JSONTextForm(""), "");
 }
 
 } // namespace

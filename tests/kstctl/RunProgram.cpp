@@ -94,7 +94,9 @@ Ran runKstctl(const std::vector<std::string>& arguments, const RunOptions& optio
     if (options.onTerminal) {
         ::close(descriptors.in);
         ::close(descriptors.out);
-        if (::openpty(&terminal, &descriptors.out, nullptr, nullptr, nullptr) != 0) {
+        winsize size{};
+        size.ws_col = options.columns;
+        if (::openpty(&terminal, &descriptors.out, nullptr, nullptr, &size) != 0) {
             return {};
         }
         ::fcntl(terminal, F_SETFD, FD_CLOEXEC);

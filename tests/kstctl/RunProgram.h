@@ -22,6 +22,8 @@ struct RunOptions {
     std::optional<std::string> outputFile = {};
     /// Its standard input and output are a terminal, on which nobody types.
     bool onTerminal = false;
+    /// The terminal's width; it does not say it when this is 0.
+    unsigned short columns = 0;
     /// Set for it alone.
     std::vector<std::string> environment = {};
     /// The user that it runs as, with no groups; needs root.
