@@ -6,7 +6,7 @@
 namespace keystrand {
 
 bool NotificationPublisher::publish(const Notification& notification) {
-    const char* property = propertyNameOf(notification.type);
+    const char* const property = wire::rm::findNotificationKind(notification.type)->property;
     if (!registry_.set(property, notification.record)) {
         return false;
     }

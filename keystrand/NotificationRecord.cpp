@@ -92,20 +92,6 @@ TimerState decodeState(const StateBytes& bytes) {
     return state;
 }
 
-const char* propertyNameOf(NotificationType type) {
-    switch (type) {
-    case kKSTRMNotificationTimerRestarted:
-        return kTimerRestartedProperty;
-    case kKSTRMNotificationAnalyticsCollected:
-        return kAnalyticsCollectedProperty;
-    case kKSTRMNotificationSaveAnalytics:
-        return kSaveAnalyticsProperty;
-    case kKSTRMNotificationTimerRestartedAnalyticsCollected:
-        break;
-    }
-    return kTimerRestartedAnalyticsCollectedProperty;
-}
-
 namespace {
 
 constexpr std::uint32_t kBlobVersion = 1;

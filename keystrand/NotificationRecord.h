@@ -55,9 +55,6 @@ struct AnalyticsCollected {
 [[nodiscard]] StateBytes encodeState(const TimerState& state);
 [[nodiscard]] TimerState decodeState(const StateBytes& bytes);
 
-/// The property that a record of this type is put into.
-[[nodiscard]] const char* propertyNameOf(wire::rm::NotificationType type);
-
 /// The `N` bytes of a record or payload from `offset` on, which must lie inside it.
 template <std::size_t N>
 [[nodiscard]] std::array<std::uint8_t, N> bytesAt(std::span<const std::uint8_t> from,

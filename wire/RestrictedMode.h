@@ -2,6 +2,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <span>
 
 /// The bytes that the kernel service and the restricted-mode service exchange: notification
 /// records, the two blobs kept on disk, and the inputs of the kernel-control requests.
@@ -74,6 +75,71 @@ inline constexpr char kAnalyticsCollectedProperty[] = "KSTRMAnalyticsCollected";
 inline constexpr char kSaveAnalyticsProperty[] = "KSTRMSaveAnalytics";
 inline constexpr char kTimerRestartedAnalyticsCollectedProperty[] =
     "KSTRMTimerRestartedAnalyticsCollected";
+
+/// What a field of a record is, and so how it is shown.
+enum class FieldForm { number, seconds, stateBlob, analyticsBlob };
+
+/// One field of a record's body.
+struct NotificationField {
+    const char* name;
+    std::size_t offset;
+    std::size_t size;
+    FieldForm form = FieldForm::number;
+};
+
+inline constexpr NotificationField kTimerRestartedFields[] = {
+    {"alarmTimestamp", kAlarmTimestampOffset, 8, FieldForm::seconds},
+    {"state", kStateBlobOffset, kStateBlobSize, FieldForm::stateBlob},
+};
+inline constexpr NotificationField kAnalyticsCollectedFields[] = {
+    {"eventPeriodDuration", kEventPeriodDurationOffset, 4},
+    {"restrictedModeDuration", kRestrictedModeDurationOffset, 4},
+    {"restrictedMode", kRestrictedModeOffset, 1},
+    {"policyDisabledByPasscodeNotSet", kPolicyDisabledByPasscodeNotSetOffset, 1},
+    {"policyDisabledByBootArg", kPolicyDisabledByBootArgOffset, 1},
+    {"policyDisabledByQuorvane", kPolicyDisabledByQuorvaneOffset, 1},
+};
+inline constexpr NotificationField kSaveAnalyticsFields[] = {
+    {"figures", kAnalyticsBlobOffset, kAnalyticsBlobSize, FieldForm::analyticsBlob},
+};
+inline constexpr NotificationField kTimerRestartedAnalyticsCollectedFields[] = {
+    {"totalRestrictedModeDuration", kTotalRestrictedModeDurationOffset, 4},
+};
+
+/// A type of notification, in every name that it has.
+struct NotificationKind {
+    NotificationType type;
+    const char* property;
+    /// For commands.
+    const char* shortName;
+    /// For people.
+    const char* description;
+    std::span<const NotificationField> fields;
+};
+
+/// Every type that there is. Who adds one adds its row here and what is done with it in the
+/// service.
+inline constexpr NotificationKind kNotificationKinds[] = {
+    {kKSTRMNotificationTimerRestarted, kTimerRestartedProperty, "timer-restarted",
+     "timer restarted", kTimerRestartedFields},
+    {kKSTRMNotificationAnalyticsCollected, kAnalyticsCollectedProperty, "analytics-collected",
+     "analytics collected", kAnalyticsCollectedFields},
+    {kKSTRMNotificationSaveAnalytics, kSaveAnalyticsProperty, "save-analytics", "save analytics",
+     kSaveAnalyticsFields},
+    {kKSTRMNotificationTimerRestartedAnalyticsCollected, kTimerRestartedAnalyticsCollectedProperty,
+     "timer-restarted-analytics", "timer restarted, analytics collected",
+     kTimerRestartedAnalyticsCollectedFields},
+};
+
+/// Null for a type that there is not.
+[[nodiscard]] constexpr const NotificationKind* findNotificationKind(std::uint32_t type) {
+    for (const NotificationKind& kind : kNotificationKinds) {
+        if (kind.type == type) {
+            return &kind;
+        }
+    }
+    return nullptr;
+}
 
 /// A platform notification is this prefix followed by the name of the property that it announces.
 inline constexpr char kNotificationNamePrefix[] = "com.zerva.Keystrand.";

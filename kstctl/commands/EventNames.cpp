@@ -6,6 +6,10 @@
 #include "wire/EventDatagram.h"
 #include "wire/RestrictedMode.h"
 
+#include <algorithm>
+#include <array>
+#include <iterator>
+#include <span>
 #include <string_view>
 
 namespace kstctl {
@@ -22,24 +26,28 @@ struct ShortName {
     std::string_view stream = wire::kNotifydMatchingStream;
 };
 
-constexpr ShortName kEvents[] = {
+constexpr ShortName kOtherEvents[] = {
     {"settings", "", platform::kSettingsChangedEvent},
-    {"timer-restarted", kNotificationNamePrefix, kTimerRestartedProperty},
-    {"analytics-collected", kNotificationNamePrefix, kAnalyticsCollectedProperty},
-    {"save-analytics", kNotificationNamePrefix, kSaveAnalyticsProperty},
-    {"timer-restarted-analytics", kNotificationNamePrefix,
-     kTimerRestartedAnalyticsCollectedProperty},
     {"alarm", "", wire::kAlarmName, wire::kAlarmStream},
 };
 
-constexpr ShortName kStreams[] = {
-    {"notifyd", "", wire::kNotifydMatchingStream},
-    {"corvid", "", wire::kCorvidMatchingStream},
-    {"alarm", "", wire::kAlarmStream},
+/// The kernel service's notifications and the events of others.
+constexpr auto kEvents = [] {
+    std::array<ShortName, std::size(kNotificationKinds) + std::size(kOtherEvents)> events{};
+    auto* next = std::copy(std::begin(kOtherEvents), std::end(kOtherEvents), events.begin());
+    for (const NotificationKind& kind : kNotificationKinds) {
+        *next++ = {kind.shortName, kNotificationNamePrefix, kind.property};
+    }
+    return events;
+}();
+
+constexpr std::array kStreams = {
+    ShortName{"notifyd", "", wire::kNotifydMatchingStream},
+    ShortName{"corvid", "", wire::kCorvidMatchingStream},
+    ShortName{"alarm", "", wire::kAlarmStream},
 };
 
-template <std::size_t Count>
-const ShortName* find(const ShortName (&names)[Count], std::string_view name) {
+const ShortName* find(std::span<const ShortName> names, std::string_view name) {
     for (const ShortName& candidate : names) {
         if (candidate.name == name) {
             return &candidate;
@@ -48,8 +56,7 @@ const ShortName* find(const ShortName (&names)[Count], std::string_view name) {
     return nullptr;
 }
 
-template <std::size_t Count>
-platform::Result<std::string> wholeName(const ShortName (&names)[Count], const std::string& name,
+platform::Result<std::string> wholeName(std::span<const ShortName> names, const std::string& name,
                                         const char* what, bool isExact) {
     if (isExact) {
         return name;

@@ -5,7 +5,6 @@
 #include "keystrand/NotificationRecord.h"
 #include "kstctl/TimeText.h"
 #include "kstctl/decode/Decoders.h"
-#include "kstd/DeviceRestrictedMode/KSTDRMDeamonNotification.h"
 #include "wire/EventDatagram.h"
 
 #include <algorithm>
@@ -63,58 +62,50 @@ using namespace wire::rm;
 
 namespace {
 
-const char* typeText(std::uint32_t type) {
-    switch (type) {
-    case kKSTRMNotificationTimerRestarted:
-        return "timer restarted";
-    case kKSTRMNotificationAnalyticsCollected:
-        return "analytics collected";
-    case kKSTRMNotificationSaveAnalytics:
-        return "save analytics";
-    case kKSTRMNotificationTimerRestartedAnalyticsCollected:
-        return "timer restarted, analytics collected";
-    default:
-        return nullptr;
+std::uint64_t littleEndian(Bytes bytes) {
+    std::uint64_t number = 0;
+    for (std::size_t i = bytes.size(); i > 0; --i) {
+        number = number << 8U | bytes[i - 1];
     }
+    return number;
 }
 
-void addBody(Report& report, const kstd::KSTDRMDeamonNotification& record) {
-    switch (record.type()) {
-    case kKSTRMNotificationTimerRestarted:
-        report.add("alarmTimestamp", record.alarmTimestamp(), timeText(record.alarmTimestamp()));
-        addStateFields(report, record.stateBlob());
+void addField(Report& report, const NotificationField& field, Bytes bytes) {
+    const Bytes value = bytes.subspan(field.offset, field.size);
+    switch (field.form) {
+    case FieldForm::number:
+        report.add(field.name, littleEndian(value));
         break;
-    case kKSTRMNotificationAnalyticsCollected:
-        report.add("eventPeriodDuration", record.eventPeriodDuration())
-            .add("restrictedModeDuration", record.restrictedModeDuration())
-            .add("restrictedMode", record.restrictedMode())
-            .add("policyDisabledByPasscodeNotSet", record.policyDisabledByPasscodeNotSet())
-            .add("policyDisabledByBootArg", record.policyDisabledByBootArg())
-            .add("policyDisabledByQuorvane", record.policyDisabledByQuorvane());
+    case FieldForm::seconds:
+        report.add(field.name, littleEndian(value), timeText(littleEndian(value)));
         break;
-    case kKSTRMNotificationSaveAnalytics:
-        addAnalyticsFields(report, record.analyticsBlob());
+    case FieldForm::stateBlob:
+        addStateFields(report, value);
         break;
-    default:
-        report.add("totalRestrictedModeDuration", record.totalRestrictedModeDuration());
+    case FieldForm::analyticsBlob:
+        addAnalyticsFields(report, value);
+        break;
     }
 }
 
 } // namespace
 
 Result decodeRecord(Bytes bytes, Secrets /*secrets*/) {
-    const auto record = kstd::KSTDRMDeamonNotification::fromBytes(bytes);
-    if (!record) {
+    if (bytes.size() != kNotificationSize) {
         return malformed(base::concat("a notification record has ", kNotificationSize,
                                       " bytes, not ", bytes.size()));
     }
-    const char* const text = typeText(record->type());
-    if (text == nullptr) {
-        return malformed(base::concat("there is no notification record of type ", record->type()));
+    const auto type =
+        static_cast<std::uint32_t>(littleEndian(bytes.subspan(kNotificationTypeOffset, 4)));
+    const NotificationKind* const kind = findNotificationKind(type);
+    if (kind == nullptr) {
+        return malformed(base::concat("there is no notification record of type ", type));
     }
     Decoded decoded{.fields = {}, .size = kNotificationSize};
-    decoded.fields.add("type", record->type(), text);
-    addBody(decoded.fields, *record);
+    decoded.fields.add("type", type, kind->description);
+    for (const NotificationField& field : kind->fields) {
+        addField(decoded.fields, field, bytes);
+    }
     return decoded;
 }
 

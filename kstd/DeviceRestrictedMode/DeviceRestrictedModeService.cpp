@@ -23,13 +23,6 @@ constexpr char kNotifyDaemonStarted[] = "-[DeviceRestrictedModeService notifyDae
 constexpr char kHandleWispEvent[] = "-[DeviceRestrictedModeService handleWispEventWithName:]";
 constexpr char kOnQuorvaneChanged[] = "-[DeviceRestrictedModeService onQuorvaneChanged]";
 
-constexpr const char* kNotifiedProperties[] = {
-    kTimerRestartedProperty,
-    kAnalyticsCollectedProperty,
-    kSaveAnalyticsProperty,
-    kTimerRestartedAnalyticsCollectedProperty,
-};
-
 const char* yesOrNo(bool value) {
     return value ? "YES" : "NO";
 }
@@ -124,10 +117,13 @@ void DeviceRestrictedModeService::handleWispEventWithName(std::string_view event
         onQuorvaneChanged();
     } else if (eventName.starts_with(kNotificationNamePrefix)) {
         const auto propertyName = eventName.substr(sizeof kNotificationNamePrefix - 1);
-        const auto* const property =
-            std::find(std::begin(kNotifiedProperties), std::end(kNotifiedProperties), propertyName);
-        if (property != std::end(kNotifiedProperties)) {
-            onKextNotificationArrivedWithPropertyName(*property);
+        const auto* const kind =
+            std::find_if(std::begin(kNotificationKinds), std::end(kNotificationKinds),
+                         [propertyName](const NotificationKind& known) {
+                             return known.property == propertyName;
+                         });
+        if (kind != std::end(kNotificationKinds)) {
+            onKextNotificationArrivedWithPropertyName(kind->property);
         }
     }
     logLine(host().log, kHandleWispEvent, "returning, .");

@@ -2,6 +2,9 @@
 
 #include <gtest/gtest.h>
 
+#include <iterator>
+#include <set>
+#include <string>
 #include <string_view>
 
 namespace {
@@ -77,4 +80,30 @@ TEST(RestrictedModeLayout, Names) {
     EXPECT_EQ(std::string_view(kNotificationNamePrefix), "com.zerva.Keystrand.");
     EXPECT_EQ(std::string_view(kKernelServicePath), "IOService:/IOResources/Keystrand");
     EXPECT_EQ(std::string_view(kKernelServiceClass), "Keystrand");
+}
+
+TEST(NotificationKinds, EveryTypeHasARowUnderNamesOfItsOwn) {
+    std::set<std::string> names;
+    std::uint32_t type = 0;
+    for (const NotificationKind& kind : kNotificationKinds) {
+        EXPECT_EQ(kind.type, ++type);
+        EXPECT_EQ(findNotificationKind(type), &kind);
+        names.insert({kind.property, kind.shortName, kind.description});
+        EXPECT_LT(std::string_view(kind.property).size(), kNotificationAckPayloadSize);
+    }
+    EXPECT_EQ(names.size(), 3 * std::size(kNotificationKinds));
+    EXPECT_EQ(findNotificationKind(0), nullptr);
+    EXPECT_EQ(findNotificationKind(type + 1), nullptr);
+}
+
+TEST(NotificationKinds, FieldsLieInTheBodyOneBehindTheOther) {
+    for (const NotificationKind& kind : kNotificationKinds) {
+        std::size_t end = kNotificationBodyOffset;
+        for (const NotificationField& field : kind.fields) {
+            EXPECT_GE(field.offset, end) << field.name;
+            end = field.offset + field.size;
+        }
+        EXPECT_GT(end, kNotificationBodyOffset);
+        EXPECT_LE(end, kNotificationSize);
+    }
 }
