@@ -115,6 +115,13 @@ std::set<std::string> exportedSymbols() {
     return names;
 }
 
+std::vector<std::string> without(const std::set<std::string>& all,
+                                 const std::set<std::string>& some) {
+    std::vector<std::string> left;
+    std::set_difference(all.begin(), all.end(), some.begin(), some.end(), std::back_inserter(left));
+    return left;
+}
+
 /// The word of a line behind another one.
 std::string wordBehind(const std::string& line, const std::string& key) {
     const std::string spaced = " " + line + " ";
@@ -414,7 +421,9 @@ TEST_F(EveryFunctionTest, ExportedListIsWhatIsCalledHereAndWhatIsPure) {
     for (const Function& function : functions()) {
         EXPECT_TRUE(known.insert(function.name).second) << function.name;
     }
-    EXPECT_EQ(known, exportedSymbols());
+    const std::set<std::string> exported = exportedSymbols();
+    EXPECT_THAT(without(exported, known), testing::IsEmpty()) << "are exported and not called here";
+    EXPECT_THAT(without(known, exported), testing::IsEmpty()) << "are here and not exported";
 }
 
 TEST_F(EveryFunctionTest, SendsItsCommands) {

@@ -1,5 +1,7 @@
 #pragma once
 
+#include <gtest/gtest.h>
+
 #include <cstdio>
 #include <stdexcept>
 #include <string>
@@ -10,6 +12,9 @@ namespace support {
 
 /// Takes what the process prints to standard output from here to the end of the scope. `text` shows
 /// only what has really left the process: what is not flushed yet is not in it.
+///
+/// GoogleTest says on standard output why a test fails. So what was taken is given back at the end
+/// when the test has failed.
 class StandardOutputCapture {
   public:
     StandardOutputCapture()
@@ -24,6 +29,11 @@ class StandardOutputCapture {
     ~StandardOutputCapture() {
         std::fflush(stdout);
         ::dup2(saved_, STDOUT_FILENO);
+        if (testing::Test::HasFailure()) {
+            const std::string taken = text();
+            std::fwrite(taken.data(), 1, taken.size(), stdout);
+            std::fflush(stdout);
+        }
         ::close(saved_);
         ::close(file_);
     }
