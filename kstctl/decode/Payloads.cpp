@@ -5,9 +5,11 @@
 #include "base/Concat.h"
 #include "common/HandleWire.h"
 #include "kstctl/decode/Decoders.h"
+#include "wire/CommandTable.h"
 #include "wire/RestrictedMode.h"
 
 #include <algorithm>
+#include <array>
 #include <iterator>
 #include <string>
 #include <string_view>
@@ -250,31 +252,60 @@ Result decodeKernelControl(Bytes bytes, Secrets /*secrets*/) {
 
 namespace {
 
-constexpr CommandPayload kCommands[] = {
-    {kKSTCommandContextCreate, "create-context", decodeNoPayload},
-    {kKSTCommandContextDelete, "delete-context", decodeHandle},
-    {kKSTCommandVerifyPolicy, "verify-policy", decodeVerifyPolicy},
-    {kKSTCommandContainsCredentialType, "contains-credential-type", decodeContainsCredentialType},
-    {kKSTCommandAddCredential, "add-credential", decodeCredentialCommand},
-    {kKSTCommandRemoveCredentialsByValue, "remove-credentials-by-value", decodeCredentialCommand},
-    {kKSTCommandRemoveCredentialsByType, "remove-credentials-by-type",
-     decodeRemoveCredentialsByType},
-    {kKSTCommandVerifyAclConstraint, "verify-acl-constraint", decodeVerifyAclConstraint},
-    {kKSTCommandContainsPassphraseCredential, "contains-passphrase", decodeContainsPassphrase},
-    {kKSTCommandReplacePassphraseCredentials, "replace-passphrases", decodeCredentialCommand},
-    {kKSTCommandRemovePassphraseCredentials, "remove-passphrases", decodeRemovePassphrases},
-    {kKSTCommandContextCreateWithExternalForm, "open-external-form", decodeHandle},
-    {kKSTCommandContextGetExternalForm, "get-external-form", decodeHandle},
-    {kKSTCommandParseAcl, "parse-acl", decodeProcessAcl},
-    {kKSTCommandSetEnvironmentVariable, "set-environment-variable", decodeSetEnvironmentVariable},
-    {kKSTCommandGetEnvironmentVariable, "get-environment-variable", decodeGetEnvironmentVariable},
-    {kKSTCommandKernelControl, "kernel-control", decodeKernelControl},
-};
+/// The decoder of a command that the table has.
+constexpr Decoder decoderOf(std::uint8_t code) {
+    switch (code) {
+    case kKSTCommandContextCreate:
+        return decodeNoPayload;
+    case kKSTCommandContextDelete:
+    case kKSTCommandContextCreateWithExternalForm:
+    case kKSTCommandContextGetExternalForm:
+        return decodeHandle;
+    case kKSTCommandVerifyPolicy:
+        return decodeVerifyPolicy;
+    case kKSTCommandContainsCredentialType:
+        return decodeContainsCredentialType;
+    case kKSTCommandAddCredential:
+    case kKSTCommandRemoveCredentialsByValue:
+    case kKSTCommandReplacePassphraseCredentials:
+        return decodeCredentialCommand;
+    case kKSTCommandRemoveCredentialsByType:
+        return decodeRemoveCredentialsByType;
+    case kKSTCommandVerifyAclConstraint:
+        return decodeVerifyAclConstraint;
+    case kKSTCommandContainsPassphraseCredential:
+        return decodeContainsPassphrase;
+    case kKSTCommandRemovePassphraseCredentials:
+        return decodeRemovePassphrases;
+    case kKSTCommandParseAcl:
+        return decodeProcessAcl;
+    case kKSTCommandSetEnvironmentVariable:
+        return decodeSetEnvironmentVariable;
+    case kKSTCommandGetEnvironmentVariable:
+        return decodeGetEnvironmentVariable;
+    case kKSTCommandKernelControl:
+        return decodeKernelControl;
+    default:
+        return nullptr;
+    }
+}
+
+constexpr auto kCommands = [] {
+    std::array<CommandPayload, std::size(wire::kCommandKinds)> commands{};
+    std::transform(std::begin(wire::kCommandKinds), std::end(wire::kCommandKinds), commands.begin(),
+                   [](const wire::CommandKind& kind) {
+                       return CommandPayload{kind.code, kind.name, decoderOf(kind.code)};
+                   });
+    return commands;
+}();
+static_assert(std::all_of(kCommands.begin(), kCommands.end(),
+                          [](const CommandPayload& command) { return command.decode != nullptr; }),
+              "a command has no decoder");
 
 template <typename Matches>
 const CommandPayload* findWhere(Matches matches) {
-    const auto* const found = std::find_if(std::begin(kCommands), std::end(kCommands), matches);
-    return found != std::end(kCommands) ? found : nullptr;
+    const auto found = std::find_if(kCommands.begin(), kCommands.end(), matches);
+    return found != kCommands.end() ? &*found : nullptr;
 }
 
 } // namespace

@@ -15,9 +15,9 @@ namespace kstctl::decode {
 
 /// A command and what its payload is.
 struct CommandPayload {
-    std::uint8_t code;
-    std::string_view name;
-    Decoder decode;
+    std::uint8_t code = 0;
+    std::string_view name = {};
+    Decoder decode = nullptr;
 };
 
 /// All commands, by their codes.

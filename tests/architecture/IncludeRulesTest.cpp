@@ -43,7 +43,7 @@ const std::vector<std::string> kRooms = {"platform/shared",
 const std::map<std::string, std::set<std::string>> kMayInclude = {
     {kPublicHeaders, {}},
     {"base", {}},
-    {"wire", {"base"}},
+    {"wire", {kPublicHeaders, "base"}},
     {"platform", {"base"}},
     {"platform/shared", {"platform", "base"}},
     {"platform/https", {"platform", "platform/shared", "base"}},

@@ -4,6 +4,7 @@
 #include "keystrand/KernelControls.h"
 #include "tests/keystrand/Bytes.h"
 #include "tests/keystrand/SetClock.h"
+#include "wire/CommandTable.h"
 
 #include <gtest/gtest.h>
 
@@ -74,6 +75,16 @@ TEST(CommandFrameTest, ControlCodeIsOnlyInKernelControl) {
     EXPECT_EQ(controlCodeOf(*decodeCommandFrame(control(7, {}))), 7U);
     EXPECT_FALSE(controlCodeOf(*decodeCommandFrame(frame(26, {7, 0, 0}))));
     EXPECT_FALSE(controlCodeOf(*decodeCommandFrame(frame(24, {7, 0, 0, 0}))));
+}
+
+TEST_F(CommandsTest, EveryCommandOfTheTableIsAnsweredAndNoOtherButTheContextsProperties) {
+    constexpr std::uint32_t kGetProperty = 21;
+    constexpr std::uint32_t kSetProperty = 22;
+    for (std::uint32_t code = 0; code < 256; ++code) {
+        const bool known =
+            wire::findCommandKind(code) != nullptr || code == kGetProperty || code == kSetProperty;
+        EXPECT_EQ(run(code, Payload(5000)) != kKernelUnknownCommand, known) << code;
+    }
 }
 
 TEST_F(CommandsTest, UnknownCommands) {
