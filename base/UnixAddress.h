@@ -27,6 +27,7 @@ class UnixAddress {
         return reinterpret_cast<const sockaddr*>(&storage_);
     }
     [[nodiscard]] socklen_t size() const { return size_; }
+    [[nodiscard]] const char* path() const { return storage_.sun_path; }
 
   private:
     UnixAddress() { storage_.sun_family = AF_UNIX; }

@@ -26,6 +26,8 @@ void KernelConnection::onReady(std::uint32_t events) {
         endUnless(receive());
     } else if ((events & EPOLLOUT) != 0) {
         endUnless(sendReply());
+    } else if (!reply_.empty()) {
+        dropReply();
     } else {
         endUnless(Alive::no);
     }
@@ -35,7 +37,8 @@ KernelConnection::Alive KernelConnection::receive() {
     const ssize_t size =
         ::recv(fd_.get(), packetBuffer_.data(), packetBuffer_.size(), MSG_DONTWAIT);
     if (size < 0) {
-        return errno == EAGAIN || errno == EINTR ? Alive::yes : Alive::no;
+        // The client left a reply unread. What it had sent before can be read all the same.
+        return errno == EAGAIN || errno == EINTR || errno == ECONNRESET ? Alive::yes : Alive::no;
     }
     if (size == 0) {
         return Alive::no;
@@ -73,11 +76,22 @@ KernelConnection::Alive KernelConnection::sendReply() {
         source_.listenFor(EPOLLIN);
         return Alive::yes;
     }
+    if (errno == EPIPE || errno == ECONNRESET) {
+        dropReply();
+        return Alive::yes;
+    }
     if (errno != EAGAIN && errno != EINTR && errno != ENOBUFS) {
         return Alive::no;
     }
     source_.listenFor(EPOLLOUT);
     return Alive::yes;
+}
+
+/// The client is gone, and what it had sent before is still carried out.
+void KernelConnection::dropReply() {
+    delay_.disable();
+    reply_.clear();
+    source_.listenFor(EPOLLIN);
 }
 
 void KernelConnection::endUnless(Alive alive) {

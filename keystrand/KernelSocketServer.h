@@ -37,6 +37,7 @@ class KernelConnection {
     [[nodiscard]] Alive receive();
     [[nodiscard]] Alive carryOut(RequestOutcome outcome);
     [[nodiscard]] Alive sendReply();
+    void dropReply();
     void endUnless(Alive alive);
 
     base::FileDescriptor fd_;

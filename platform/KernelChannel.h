@@ -21,15 +21,11 @@ inline constexpr ConnectionHandle kNoConnection = 0;
 ///
 /// A status of the kernel side is passed on unchanged. On any status but 0 the output and its size
 /// are left as they were.
-class KernelChannel {
+class KernelChannel : public KernelConnections {
   public:
-    KernelChannel() = default;
-    KernelChannel(const KernelChannel&) = delete;
-    KernelChannel& operator=(const KernelChannel&) = delete;
-    virtual ~KernelChannel() = default;
-
     /// Opens a connection of the given type and stores its handle. `service` stays the caller's.
-    /// There is no close: a connection lasts as long as the channel.
+    /// There is no close: a connection lasts as long as the channel, or until it is left to the
+    /// parent.
     [[nodiscard]] virtual Status open(ServiceHandle service, std::uint32_t connectionType,
                                       ConnectionHandle* connection) = 0;
 
@@ -48,6 +44,17 @@ class KernelChannel {
     [[nodiscard]] virtual Status scalarCall(ConnectionHandle connection, std::uint32_t selector,
                                             const std::uint64_t* inputs, std::uint32_t inputCount,
                                             std::uint64_t* outputs, std::uint32_t* outputCount) = 0;
+
+    /// Sends as `structCall` does, but waits for nothing, whatever the deadline is: neither until
+    /// the request can be sent nor for its answer, which nobody sees. 0 when it was sent.
+    [[nodiscard]] virtual Status post(ConnectionHandle connection, std::uint32_t selector,
+                                      const void* input, std::size_t inputSize) {
+        return structCall(connection, selector, input, inputSize, nullptr, nullptr);
+    }
+
+    /// Whether the connection stands as far as is known. One that was lost is made anew by the next
+    /// call on it.
+    [[nodiscard]] virtual bool isConnected(ConnectionHandle /*connection*/) const { return true; }
 };
 
 } // namespace platform

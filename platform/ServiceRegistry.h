@@ -1,5 +1,7 @@
 #pragma once
 
+#include "platform/KernelConnections.h"
+
 #include <cstdint>
 #include <optional>
 #include <string_view>
@@ -13,16 +15,11 @@ inline constexpr ServiceHandle kNoService = 0;
 
 /// The registry in which the kernel service publishes itself and its properties.
 ///
-/// Called on the main thread only. Every handle that a find operation returns is owned by the
+/// Called on one thread at a time. Every handle that a find operation returns is owned by the
 /// caller and given back with `release`; finding the same entry twice gives two references to it.
 /// A registry that cannot be reached has no entries.
-class ServiceRegistry {
+class ServiceRegistry : public KernelConnections {
   public:
-    ServiceRegistry() = default;
-    ServiceRegistry(const ServiceRegistry&) = delete;
-    ServiceRegistry& operator=(const ServiceRegistry&) = delete;
-    virtual ~ServiceRegistry() = default;
-
     /// The entry at `path` (for example "IOService:/IOResources/Keystrand"), looked up anew on
     /// every call, or kNoService.
     [[nodiscard]] virtual ServiceHandle findByPath(std::string_view path) = 0;

@@ -5,7 +5,6 @@
 #include "base/Saturate.h"
 
 #include <cassert>
-#include <utility>
 
 namespace wire {
 
@@ -24,17 +23,16 @@ void writeHead(base::ByteWriter& writer, std::string_view magic, KernelOperation
 }
 
 bool readHead(base::ByteReader& reader, std::string_view expectedMagic, KernelOperation& operation,
-              std::uint64_t& sequence) {
+              std::uint16_t& reserved, std::uint64_t& sequence) {
     std::string_view magic;
     std::uint8_t version = 0;
     std::uint8_t code = 0;
-    std::uint16_t reserved = 0;
     if (!reader.readText(magic, expectedMagic.size()) || !reader.readU8(version) ||
         !reader.readU8(code) || !reader.readU16(reserved) || !reader.readU64(sequence)) {
         return false;
     }
     operation = static_cast<KernelOperation>(code);
-    return magic == expectedMagic && version == kKernelSocketVersion && reserved == 0 &&
+    return magic == expectedMagic && version == kKernelSocketVersion &&
            operation >= KernelOperation::findByPath && operation <= KernelOperation::scalarCall;
 }
 
@@ -70,7 +68,9 @@ std::optional<KernelRequestHeader>
 decodeKernelRequestHeader(std::span<const std::uint8_t> message) {
     base::ByteReader reader(message);
     KernelRequestHeader header;
-    if (!readHead(reader, kRequestMagic, header.operation, header.sequence)) {
+    std::uint16_t reserved = 0;
+    if (!readHead(reader, kRequestMagic, header.operation, reserved, header.sequence) ||
+        reserved != 0) {
         return std::nullopt;
     }
     return header;
@@ -79,8 +79,9 @@ decodeKernelRequestHeader(std::span<const std::uint8_t> message) {
 std::optional<KernelReplyHeader> decodeKernelReplyHeader(std::span<const std::uint8_t> message) {
     base::ByteReader reader(message);
     KernelReplyHeader header;
+    std::uint16_t reserved = 0;
     std::uint32_t status = 0;
-    if (!readHead(reader, kReplyMagic, header.operation, header.sequence) ||
+    if (!readHead(reader, kReplyMagic, header.operation, reserved, header.sequence) ||
         !reader.readU32(status) || !reader.readU32(header.reported)) {
         return std::nullopt;
     }
@@ -88,23 +89,22 @@ std::optional<KernelReplyHeader> decodeKernelReplyHeader(std::span<const std::ui
     return header;
 }
 
-std::vector<std::uint8_t> encodeKernelProperty(const KernelPropertyRequest& request) {
-    std::vector<std::uint8_t> body(2 + request.path.size() + request.name.size());
-    base::ByteWriter writer(body);
-    const bool fits = writer.writeU16(base::saturate<std::uint16_t>(request.path.size())) &&
-                      writer.writeText(request.path) && writer.writeText(request.name);
+KernelPropertyPrefixBytes encodeKernelPropertyPrefix(std::size_t pathLength) {
+    KernelPropertyPrefixBytes bytes{};
+    base::ByteWriter writer(bytes);
+    const bool fits = writer.writeU16(base::saturate<std::uint16_t>(pathLength));
     assert(fits);
     static_cast<void>(fits);
-    return body;
+    return bytes;
 }
 
-std::vector<std::uint8_t> encodeKernelOpen(const KernelOpenRequest& request) {
-    std::vector<std::uint8_t> body(4 + request.path.size());
-    base::ByteWriter writer(body);
-    const bool fits = writer.writeU32(request.connectionType) && writer.writeText(request.path);
+KernelOpenPrefixBytes encodeKernelOpenPrefix(std::uint32_t connectionType) {
+    KernelOpenPrefixBytes bytes{};
+    base::ByteWriter writer(bytes);
+    const bool fits = writer.writeU32(connectionType);
     assert(fits);
     static_cast<void>(fits);
-    return body;
+    return bytes;
 }
 
 KernelStructPrefixBytes encodeKernelStructPrefix(std::uint32_t selector,
@@ -117,17 +117,27 @@ KernelStructPrefixBytes encodeKernelStructPrefix(std::uint32_t selector,
     return bytes;
 }
 
-std::vector<std::uint8_t> encodeKernelScalar(const KernelScalarRequest& request) {
-    std::vector<std::uint8_t> body(4 + 4 + 4 + 8 * request.inputs.size());
-    base::ByteWriter writer(body);
-    bool fits = writer.writeU32(request.selector) && writer.writeU32(request.offeredCount) &&
-                writer.writeU32(static_cast<std::uint32_t>(request.inputs.size()));
-    for (const std::uint64_t input : request.inputs) {
-        fits = fits && writer.writeU64(input);
+KernelScalarPrefixBytes encodeKernelScalarPrefix(std::uint32_t selector, std::uint32_t offeredCount,
+                                                 std::uint32_t inputCount) {
+    KernelScalarPrefixBytes bytes{};
+    base::ByteWriter writer(bytes);
+    const bool fits =
+        writer.writeU32(selector) && writer.writeU32(offeredCount) && writer.writeU32(inputCount);
+    assert(fits);
+    static_cast<void>(fits);
+    return bytes;
+}
+
+KernelScalarBytes encodeKernelScalars(std::span<const std::uint64_t> scalars) {
+    KernelScalarBytes bytes{};
+    base::ByteWriter writer(bytes);
+    bool fits = true;
+    for (const std::uint64_t scalar : scalars) {
+        fits = fits && writer.writeU64(scalar);
     }
     assert(fits);
     static_cast<void>(fits);
-    return body;
+    return bytes;
 }
 
 std::optional<std::string_view> decodeKernelFindByPath(std::span<const std::uint8_t> body) {
@@ -185,27 +195,26 @@ std::optional<KernelScalarRequest> decodeKernelScalar(std::span<const std::uint8
         !reader.readU32(inputCount)) {
         return std::nullopt;
     }
-    auto inputs = decodeKernelScalars(reader.rest(), inputCount);
-    if (!inputs || request.offeredCount > kKernelMaxScalars) {
+    if (inputCount > kKernelMaxScalars || request.offeredCount > kKernelMaxScalars) {
         return std::nullopt;
     }
-    request.inputs = std::move(*inputs);
+    request.inputs.resize(inputCount);
+    if (!decodeKernelScalars(reader.rest(), request.inputs)) {
+        return std::nullopt;
+    }
     return request;
 }
 
-std::optional<std::vector<std::uint64_t>> decodeKernelScalars(std::span<const std::uint8_t> bytes,
-                                                              std::size_t count) {
-    if (count > kKernelMaxScalars || bytes.size() != count * sizeof(std::uint64_t)) {
-        return std::nullopt;
+bool decodeKernelScalars(std::span<const std::uint8_t> bytes, std::span<std::uint64_t> scalars) {
+    if (scalars.size() > kKernelMaxScalars ||
+        bytes.size() != scalars.size() * sizeof(std::uint64_t)) {
+        return false;
     }
     base::ByteReader reader(bytes);
-    std::vector<std::uint64_t> scalars(count);
     for (std::uint64_t& scalar : scalars) {
-        if (!reader.readU64(scalar)) {
-            return std::nullopt;
-        }
+        static_cast<void>(reader.readU64(scalar));
     }
-    return scalars;
+    return true;
 }
 
 } // namespace wire

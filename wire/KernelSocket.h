@@ -54,7 +54,8 @@ using KernelReplyHeaderBytes = std::array<std::uint8_t, kKernelReplyHeaderSize>;
 [[nodiscard]] KernelReplyHeaderBytes encodeKernelReplyHeader(const KernelReplyHeader& header);
 
 /// The header at the start of `message`, or none when it is too short, has another magic, version
-/// or an unknown operation, or its reserved bytes are not zero.
+/// or an unknown operation. The reserved bytes of a request must be zero; those of a reply are not
+/// looked at.
 [[nodiscard]] std::optional<KernelRequestHeader>
 decodeKernelRequestHeader(std::span<const std::uint8_t> message);
 [[nodiscard]] std::optional<KernelReplyHeader>
@@ -81,17 +82,24 @@ struct KernelScalarRequest {
     std::vector<std::uint64_t> inputs;
 };
 
-/// Sizes of what stands in a body before its variable part.
+/// What stands in a body before its variable part, which is sent from where it lies.
+using KernelPropertyPrefixBytes = std::array<std::uint8_t, 2>;
+using KernelOpenPrefixBytes = std::array<std::uint8_t, 4>;
 inline constexpr std::size_t kKernelStructPrefixSize = 4 + 4;
 using KernelStructPrefixBytes = std::array<std::uint8_t, kKernelStructPrefixSize>;
+using KernelScalarPrefixBytes = std::array<std::uint8_t, 4 + 4 + 4>;
+using KernelScalarBytes = std::array<std::uint8_t, 8 * kKernelMaxScalars>;
 
-/// A text or count beyond its limit gives a body that the peer refuses as malformed.
-[[nodiscard]] std::vector<std::uint8_t> encodeKernelProperty(const KernelPropertyRequest& request);
-[[nodiscard]] std::vector<std::uint8_t> encodeKernelOpen(const KernelOpenRequest& request);
-/// Only what stands before the input bytes, so that a large input is sent without a copy.
+[[nodiscard]] KernelPropertyPrefixBytes encodeKernelPropertyPrefix(std::size_t pathLength);
+[[nodiscard]] KernelOpenPrefixBytes encodeKernelOpenPrefix(std::uint32_t connectionType);
 [[nodiscard]] KernelStructPrefixBytes encodeKernelStructPrefix(std::uint32_t selector,
                                                                std::uint32_t offeredSize);
-[[nodiscard]] std::vector<std::uint8_t> encodeKernelScalar(const KernelScalarRequest& request);
+[[nodiscard]] KernelScalarPrefixBytes encodeKernelScalarPrefix(std::uint32_t selector,
+                                                               std::uint32_t offeredCount,
+                                                               std::uint32_t inputCount);
+
+/// The bytes of at most kKernelMaxScalars numbers; of what is not there they are zero.
+[[nodiscard]] KernelScalarBytes encodeKernelScalars(std::span<const std::uint64_t> scalars);
 
 /// The parts of `body` (what follows the header), or none when it is malformed: a length that does
 /// not fit, an empty or overlong text, more than kKernelMaxScalars scalars, bytes left over.
@@ -107,8 +115,9 @@ decodeKernelStruct(std::span<const std::uint8_t> body);
 [[nodiscard]] std::optional<KernelScalarRequest>
 decodeKernelScalar(std::span<const std::uint8_t> body);
 
-/// The scalars of a reply or request: `bytes` must hold exactly `count` of them.
-[[nodiscard]] std::optional<std::vector<std::uint64_t>>
-decodeKernelScalars(std::span<const std::uint8_t> bytes, std::size_t count);
+/// Reads the scalars of a reply or request: `bytes` must hold exactly as many as `scalars` has room
+/// for, kKernelMaxScalars at most. False, with nothing read, when they do not.
+[[nodiscard]] bool decodeKernelScalars(std::span<const std::uint8_t> bytes,
+                                       std::span<std::uint64_t> scalars);
 
 } // namespace wire

@@ -5,9 +5,10 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <cstdint>
 #include <cstdio>
-#include <cstring>
+#include <poll.h>
+#include <string.h>
+#include <sys/mman.h>
 #include <sys/socket.h>
 #include <sys/uio.h>
 #include <utility>
@@ -16,12 +17,12 @@ namespace platform {
 
 namespace {
 
-constexpr std::size_t kMaxParts = 4;
+using std::chrono::duration_cast;
+using std::chrono::microseconds;
+using std::chrono::nanoseconds;
+using Clock = std::chrono::steady_clock;
 
-/// What a timeout of the socket shows as.
-int asTimeout(int error) {
-    return error == EAGAIN ? ETIMEDOUT : error;
-}
+constexpr std::size_t kMaxParts = 4;
 
 bool isPeerGone(Status status) {
     return status == statusFromErrno(EPIPE) || status == statusFromErrno(ECONNRESET) ||
@@ -33,7 +34,41 @@ iovec asVector(std::span<const std::uint8_t> part) {
     return {const_cast<std::uint8_t*>(part.data()), part.size()};
 }
 
+/// How long one blocking receive may last. It saves the system call that waiting exactly costs: an
+/// answer in that time, which leaves room for the system's late timers, needs none.
+microseconds blockingTime(std::chrono::milliseconds timeout) {
+    return duration_cast<microseconds>(timeout) / 2;
+}
+
+void writeRefusal(SystemLog& log, const char* path, uid_t stranger) {
+    std::array<char, 256> line{};
+    const int size =
+        std::snprintf(line.data(), line.size(),
+                      "kstd: KernelSocket: %s is served by user %u, refused.\n", path, stranger);
+    log.write(LogLevel::warning, {line.data(), static_cast<std::size_t>(std::max(size, 0))}, {});
+}
+
 } // namespace
+
+MessagePages::~MessagePages() {
+    if (pages_ != nullptr) {
+        ::munmap(pages_, sizeof(Pages));
+    }
+}
+
+bool MessagePages::obtain() {
+    if (pages_ != nullptr) {
+        return true;
+    }
+    void* const pages =
+        ::mmap(nullptr, sizeof(Pages), PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+    if (pages == MAP_FAILED) {
+        return false;
+    }
+    ::madvise(pages, sizeof(Pages), MADV_WIPEONFORK);
+    pages_ = static_cast<Pages*>(pages);
+    return true;
+}
 
 KernelSocketConnection::Reply::~Reply() {
     if (!received_.empty()) {
@@ -41,28 +76,60 @@ KernelSocketConnection::Reply::~Reply() {
     }
 }
 
-KernelSocketConnection::KernelSocketConnection(std::string path, SystemLog& log,
-                                               std::chrono::milliseconds timeout, Greeting greeting)
-    : path_(std::move(path)),
-      log_(log),
-      timeout_(timeout),
-      greeting_(std::move(greeting)),
-      buffer_(new std::uint8_t[wire::kKernelMessageMaxSize]) {}
+void KernelSocketConnection::disconnect() {
+    socket_.reset();
+    expired_ = false;
+}
+
+void KernelSocketConnection::setDeadline(std::optional<Deadline> deadline) {
+    deadline_ = deadline;
+    if (!deadline_ && expired_) {
+        disconnect();
+    }
+}
+
+void KernelSocketConnection::leaveToParent() {
+    disconnect();
+    sequence_ = 0;
+}
+
+void KernelSocketConnection::begin() {
+    if (isInherited()) {
+        leaveToParent();
+    }
+    until_ = deadline_.value_or(Clock::now() + timeout_);
+}
+
+bool KernelSocketConnection::isTimeUp() const {
+    return Clock::now() >= until_;
+}
 
 Status KernelSocketConnection::fail(int error) {
-    disconnect();
+    if (error == ETIMEDOUT && deadline_ && waits_) {
+        expired_ = true;
+    } else {
+        disconnect();
+    }
     return statusFromErrno(error);
 }
 
 Status KernelSocketConnection::connect() {
+    begin();
+    if (expired_) {
+        disconnect();
+    }
+    return connectAndGreet();
+}
+
+Status KernelSocketConnection::connectAndGreet() {
     if (socket_.isOpen()) {
         return kSuccess;
     }
     const Status opened = openSocket();
-    if (opened != kSuccess || !greeting_) {
+    if (opened != kSuccess) {
         return opened;
     }
-    const Status greeted = greeting_(*this);
+    const Status greeted = greet();
     if (greeted != kSuccess) {
         disconnect();
     }
@@ -70,42 +137,83 @@ Status KernelSocketConnection::connect() {
 }
 
 Status KernelSocketConnection::openSocket() {
-    LocalConnection connection = connectLocally(path_, SOCK_SEQPACKET, timeout_);
+    if (!address_) {
+        return statusFromErrno(ENAMETOOLONG);
+    }
+    if (!pages_.obtain()) {
+        return statusFromErrno(ENOMEM);
+    }
+    const auto left = duration_cast<microseconds>(until_ - Clock::now());
+    if (waits_ && left.count() <= 0) {
+        return statusFromErrno(ETIMEDOUT);
+    }
+    // An eighth is how late the system's timer may be.
+    LocalConnection connection =
+        connectLocally(*address_, SOCK_SEQPACKET | (waits_ ? 0 : SOCK_NONBLOCK), left - left / 8);
     if (connection.error == 0) {
         socket_ = std::move(connection.socket);
+        setTimeLimit(socket_.get(), SO_RCVTIMEO, blockingTime(timeout_));
+        pages_.setMark();
         return kSuccess;
     }
     if (connection.stranger) {
-        // On the stack: a client may have no memory left.
-        std::array<char, 256> line;
-        const int length = std::snprintf(line.data(), line.size(),
-                                         "kstd: KernelSocket: %s is served by user %ju, refused.\n",
-                                         path_.c_str(), std::uintmax_t{*connection.stranger});
-        log_.write(LogLevel::warning, {line.data(), static_cast<std::size_t>(length)}, {});
+        writeRefusal(log_, address_->path(), *connection.stranger);
     }
     return statusFromErrno(connection.error);
 }
 
 Status KernelSocketConnection::exchange(wire::KernelOperation operation, Parts body, Reply& reply) {
+    begin();
+    if (expired_) {
+        disconnect();
+    }
+    if (isTimeUp()) {
+        return statusFromErrno(ETIMEDOUT);
+    }
+    const Status status = handOver(operation, body);
+    return status == kSuccess ? receive(operation, reply) : status;
+}
+
+Status KernelSocketConnection::post(wire::KernelOperation operation, Parts body) {
+    begin();
+    waits_ = false;
+    const Status status = handOver(operation, body);
+    waits_ = true;
+    dropReplies();
+    disconnect();
+    return status;
+}
+
+void KernelSocketConnection::dropReplies() {
+    // A socket that is closed with a reply in it looks to the peer like an error, which it may take
+    // for the end before it has read the request.
+    ::shutdown(socket_.get(), SHUT_RD);
+    std::uint8_t first = 0;
+    while (::recv(socket_.get(), &first, sizeof first, MSG_DONTWAIT) > 0) {
+    }
+    ::explicit_bzero(&first, sizeof first);
+}
+
+Status KernelSocketConnection::handOver(wire::KernelOperation operation, Parts body) {
     const bool wasConnected = socket_.isOpen();
-    Status status = connect();
+    Status status = connectAndGreet();
     if (status == kSuccess) {
         status = send(operation, body);
     }
     if (wasConnected && isPeerGone(status)) {
         // The peer had gone before; nothing of this request reached anybody.
-        status = connect();
+        status = connectAndGreet();
         if (status == kSuccess) {
             status = send(operation, body);
         }
     }
-    return status == kSuccess ? receive(operation, reply) : status;
+    return status;
 }
 
 Status KernelSocketConnection::exchangeOnce(wire::KernelOperation operation, Parts body,
                                             Reply& reply) {
     const Status status = send(operation, body);
-    return status == kSuccess ? receive(operation, reply) : status;
+    return status == kSuccess && waits_ ? receive(operation, reply) : status;
 }
 
 Status KernelSocketConnection::send(wire::KernelOperation operation, Parts body) {
@@ -123,30 +231,67 @@ Status KernelSocketConnection::send(wire::KernelOperation operation, Parts body)
     msghdr message{};
     message.msg_iov = vectors.data();
     message.msg_iovlen = count;
-    ssize_t sent = -1;
-    do {
-        sent = ::sendmsg(socket_.get(), &message, MSG_NOSIGNAL);
-    } while (sent < 0 && errno == EINTR);
-    if (sent >= 0) {
-        return kSuccess;
+    while (::sendmsg(socket_.get(), &message, MSG_NOSIGNAL | MSG_DONTWAIT) < 0) {
+        const int error = errno;
+        if (error == EMSGSIZE) {
+            // Too large for the system's buffers: nothing was sent, the connection is as it was.
+            return statusFromErrno(EMSGSIZE);
+        }
+        if (error == EAGAIN && (!waits_ || !await(POLLOUT))) {
+            return fail(ETIMEDOUT);
+        }
+        if (error != EAGAIN && error != EINTR) {
+            return fail(error);
+        }
     }
-    // Too large for the system's buffers: nothing was sent and the connection is as it was.
-    return errno == EMSGSIZE ? statusFromErrno(EMSGSIZE) : fail(asTimeout(errno));
+    return kSuccess;
+}
+
+bool KernelSocketConnection::await(short events) const {
+    for (;;) {
+        pollfd watched{socket_.get(), events, 0};
+        const auto left =
+            std::max(duration_cast<nanoseconds>(until_ - Clock::now()), nanoseconds(0));
+        const auto seconds = duration_cast<std::chrono::seconds>(left);
+        const timespec time{static_cast<time_t>(seconds.count()),
+                            static_cast<long>((left - seconds).count())};
+        const int ready = ::ppoll(&watched, 1, &time, nullptr);
+        if (ready > 0) {
+            return true;
+        }
+        if (isTimeUp() || (ready < 0 && errno != EINTR)) {
+            return false;
+        }
+    }
+}
+
+ssize_t KernelSocketConnection::receiveMessage() {
+    // The quarter leaves room for a timer that is late.
+    bool blocks = until_ - Clock::now() >= blockingTime(timeout_) * 5 / 4;
+    for (;;) {
+        if (!blocks && !await(POLLIN)) {
+            errno = ETIMEDOUT;
+            return -1;
+        }
+        const ssize_t length = ::recv(socket_.get(), pages_.message(), wire::kKernelMessageMaxSize,
+                                      MSG_TRUNC | (blocks ? 0 : MSG_DONTWAIT));
+        if (length >= 0 || (errno != EAGAIN && errno != EINTR)) {
+            return length;
+        }
+        blocks = false;
+    }
 }
 
 Status KernelSocketConnection::receive(wire::KernelOperation operation, Reply& reply) {
-    ssize_t length = -1;
-    do {
-        length = ::recv(socket_.get(), buffer_.get(), wire::kKernelMessageMaxSize, MSG_TRUNC);
-    } while (length < 0 && errno == EINTR);
+    const ssize_t length = receiveMessage();
     if (length < 0) {
-        return fail(asTimeout(errno));
+        return fail(errno);
     }
     if (length == 0) {
         return fail(ECONNRESET);
     }
     const auto size = static_cast<std::size_t>(length);
-    reply.received_ = {buffer_.get(), std::min(size, wire::kKernelMessageMaxSize)};
+    reply.received_ = {pages_.message(), std::min(size, wire::kKernelMessageMaxSize)};
     if (size > wire::kKernelMessageMaxSize) {
         return fail(EMSGSIZE);
     }

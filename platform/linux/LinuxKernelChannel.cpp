@@ -12,12 +12,7 @@ namespace platform {
 
 namespace {
 
-Status sendOpen(KernelSocketConnection& connection, std::uint32_t type, const std::string& path) {
-    const auto request = wire::encodeKernelOpen({type, path});
-    KernelSocketConnection::Reply reply;
-    const Status status = connection.exchangeOnce(wire::KernelOperation::open, {request}, reply);
-    return status == kSuccess ? reply.status : status;
-}
+constexpr std::size_t kScalarSize = sizeof(std::uint64_t);
 
 /// Tells of a reply that is larger than was offered, and nothing else of it.
 template <typename Size>
@@ -31,31 +26,52 @@ Status handOutSize(std::size_t reported, Size* size) {
 
 } // namespace
 
-LinuxKernelChannel::LinuxKernelChannel(std::string socketPath, const LinuxServiceRegistry& registry,
-                                       SystemLog& log, std::chrono::milliseconds timeout)
-    : socketPath_(std::move(socketPath)), registry_(registry), log_(log), timeout_(timeout) {}
+LinuxKernelChannel::LinuxKernelChannel(std::string_view socketPath,
+                                       const LinuxServiceRegistry& registry, SystemLog& log,
+                                       std::chrono::milliseconds timeout)
+    : address_(base::UnixAddress::of(socketPath)),
+      registry_(registry),
+      log_(log),
+      timeout_(timeout) {}
 
-KernelSocketConnection* LinuxKernelChannel::find(ConnectionHandle connection) {
-    return connection == kNoConnection || connection > connections_.size()
-               ? nullptr
-               : connections_[connection - 1].get();
+Status LinuxKernelChannel::Opened::greet() {
+    const auto prefix = wire::encodeKernelOpenPrefix(type_);
+    Reply reply;
+    const Status status =
+        exchangeOnce(wire::KernelOperation::open, {prefix, asBytes(path_.text())}, reply);
+    return status == kSuccess ? reply.status : status;
+}
+
+const LinuxKernelChannel::Opened* LinuxKernelChannel::find(ConnectionHandle connection) const {
+    if (connection == kNoConnection || connection > connections_.size()) {
+        return nullptr;
+    }
+    const auto& place = connections_[connection - 1];
+    return place && !place->leftToParent ? &*place : nullptr;
+}
+
+LinuxKernelChannel::Opened* LinuxKernelChannel::find(ConnectionHandle connection) {
+    return const_cast<Opened*>(std::as_const(*this).find(connection));
 }
 
 Status LinuxKernelChannel::open(ServiceHandle service, std::uint32_t connectionType,
                                 ConnectionHandle* connection) {
-    const std::string path = registry_.pathOf(service);
-    if (path.empty()) {
+    const auto path = RegistryPath::of(registry_.pathOf(service));
+    if (!path) {
         return statusFromErrno(ENOENT);
     }
-    // Sent again on every fresh connection, so that a kernel side that was restarted is open too.
-    auto opened = std::make_unique<KernelSocketConnection>(
-        socketPath_, log_, timeout_, [connectionType, path](KernelSocketConnection& fresh) {
-            return sendOpen(fresh, connectionType, path);
-        });
-    const Status status = opened->connect();
+    const auto place = std::find_if(connections_.begin(), connections_.end(),
+                                    [](const auto& held) { return !held || held->leftToParent; });
+    if (place == connections_.end()) {
+        return statusFromErrno(EMFILE);
+    }
+    Opened& opened = place->emplace(address_, log_, timeout_, connectionType, *path);
+    opened.setDeadline(deadline_);
+    const Status status = opened.connect();
     if (status == kSuccess) {
-        connections_.push_back(std::move(opened));
-        *connection = static_cast<ConnectionHandle>(connections_.size());
+        *connection = static_cast<ConnectionHandle>(place - connections_.begin()) + 1;
+    } else {
+        place->reset();
     }
     return status;
 }
@@ -79,11 +95,14 @@ Status LinuxKernelChannel::structCall(ConnectionHandle connection, std::uint32_t
     if (status != kSuccess || reply.status != kSuccess) {
         return status != kSuccess ? status : reply.status;
     }
+    const bool saysItsSize = reply.reported == reply.body.size();
+    if (!saysItsSize) {
+        socket->disconnect();
+    }
     if (reply.reported > offered) {
         return handOutSize(reply.reported, outputSize);
     }
-    if (reply.reported != reply.body.size()) {
-        socket->disconnect();
+    if (!saysItsSize) {
         return statusFromErrno(EPROTO);
     }
     if (!reply.body.empty()) {
@@ -106,26 +125,68 @@ Status LinuxKernelChannel::scalarCall(ConnectionHandle connection, std::uint32_t
     if (inputCount > wire::kKernelMaxScalars || offered > wire::kKernelMaxScalars) {
         return statusFromErrno(E2BIG);
     }
-    const auto request =
-        wire::encodeKernelScalar({selector, offered, {inputs, inputs + inputCount}});
+    const auto prefix = wire::encodeKernelScalarPrefix(selector, offered, inputCount);
+    const auto scalars = wire::encodeKernelScalars({inputs, inputCount});
     KernelSocketConnection::Reply reply;
-    const Status status = socket->exchange(wire::KernelOperation::scalarCall, {request}, reply);
+    const Status status =
+        socket->exchange(wire::KernelOperation::scalarCall,
+                         {prefix, std::span(scalars).first(inputCount * kScalarSize)}, reply);
     if (status != kSuccess || reply.status != kSuccess) {
         return status != kSuccess ? status : reply.status;
+    }
+    const bool saysItsCount =
+        reply.body.size() / kScalarSize == reply.reported && reply.body.size() % kScalarSize == 0;
+    if (!saysItsCount) {
+        socket->disconnect();
     }
     if (reply.reported > offered) {
         return handOutSize(reply.reported, outputCount);
     }
-    const auto scalars = wire::decodeKernelScalars(reply.body, reply.reported);
-    if (!scalars) {
-        socket->disconnect();
+    if (!saysItsCount || !wire::decodeKernelScalars(reply.body, {outputs, reply.reported})) {
         return statusFromErrno(EPROTO);
     }
-    std::copy(scalars->begin(), scalars->end(), outputs);
     if (outputCount != nullptr) {
         *outputCount = reply.reported;
     }
     return kSuccess;
+}
+
+Status LinuxKernelChannel::post(ConnectionHandle connection, std::uint32_t selector,
+                                const void* input, std::size_t inputSize) {
+    KernelSocketConnection* const socket = find(connection);
+    if (socket == nullptr) {
+        return statusFromErrno(EBADF);
+    }
+    const auto prefix = wire::encodeKernelStructPrefix(selector, 0);
+    return socket->post(wire::KernelOperation::structCall, {prefix, asBytes(input, inputSize)});
+}
+
+bool LinuxKernelChannel::isConnected(ConnectionHandle connection) const {
+    const KernelSocketConnection* const socket = find(connection);
+    return socket != nullptr && socket->isConnected();
+}
+
+void LinuxKernelChannel::setDeadline(std::optional<Deadline> deadline) noexcept {
+    deadline_ = deadline;
+    for (auto& place : connections_) {
+        if (place) {
+            place->setDeadline(deadline);
+        }
+    }
+}
+
+bool LinuxKernelChannel::isInherited() const noexcept {
+    return std::any_of(connections_.begin(), connections_.end(),
+                       [](const auto& place) { return place && place->isInherited(); });
+}
+
+void LinuxKernelChannel::leaveToParent() noexcept {
+    for (auto& place : connections_) {
+        if (place) {
+            place->leaveToParent();
+            place->leftToParent = true;
+        }
+    }
 }
 
 } // namespace platform

@@ -4,18 +4,22 @@
 #include "platform/linux/KernelSocketConnection.h"
 #include "platform/linux/LinuxServiceRegistry.h"
 
-#include <memory>
-#include <string>
-#include <vector>
+#include <array>
+#include <cstddef>
+#include <optional>
+#include <string_view>
 
 namespace platform {
 
 /// KernelChannel over the kernel service's socket: two system calls a call, no allocation.
 class LinuxKernelChannel final : public KernelChannel {
   public:
+    /// One more gives the status of EMFILE.
+    static constexpr std::size_t kMaxConnections = 16;
+
     /// The registry, which knows what the service handles stand for, outlives the channel.
-    LinuxKernelChannel(std::string socketPath, const LinuxServiceRegistry& registry, SystemLog& log,
-                       std::chrono::milliseconds timeout = kKernelTimeout);
+    LinuxKernelChannel(std::string_view socketPath, const LinuxServiceRegistry& registry,
+                       SystemLog& log, std::chrono::milliseconds timeout = kKernelTimeout);
 
     [[nodiscard]] Status open(ServiceHandle service, std::uint32_t connectionType,
                               ConnectionHandle* connection) override;
@@ -25,15 +29,43 @@ class LinuxKernelChannel final : public KernelChannel {
     [[nodiscard]] Status scalarCall(ConnectionHandle connection, std::uint32_t selector,
                                     const std::uint64_t* inputs, std::uint32_t inputCount,
                                     std::uint64_t* outputs, std::uint32_t* outputCount) override;
+    [[nodiscard]] Status post(ConnectionHandle connection, std::uint32_t selector,
+                              const void* input, std::size_t inputSize) override;
+    [[nodiscard]] bool isConnected(ConnectionHandle connection) const override;
+
+    void setDeadline(std::optional<Deadline> deadline) noexcept override;
+    [[nodiscard]] bool isInherited() const noexcept override;
+    void leaveToParent() noexcept override;
 
   private:
-    [[nodiscard]] KernelSocketConnection* find(ConnectionHandle connection);
+    /// A connection on which every request but the first needs the service to be open.
+    class Opened final : public KernelSocketConnection {
+      public:
+        Opened(const std::optional<base::UnixAddress>& address, SystemLog& log,
+               std::chrono::milliseconds timeout, std::uint32_t type, const RegistryPath& path)
+            : KernelSocketConnection(address, log, timeout), type_(type), path_(path) {}
 
-    std::string socketPath_;
+        /// Its handle means nothing any more.
+        bool leftToParent = false;
+
+      private:
+        /// Sent again on every fresh connection, so that a kernel side that was restarted is open
+        /// too.
+        [[nodiscard]] Status greet() override;
+
+        std::uint32_t type_;
+        RegistryPath path_;
+    };
+
+    [[nodiscard]] const Opened* find(ConnectionHandle connection) const;
+    [[nodiscard]] Opened* find(ConnectionHandle connection);
+
+    std::optional<base::UnixAddress> address_;
     const LinuxServiceRegistry& registry_;
     SystemLog& log_;
     std::chrono::milliseconds timeout_;
-    std::vector<std::unique_ptr<KernelSocketConnection>> connections_;
+    std::optional<Deadline> deadline_;
+    std::array<std::optional<Opened>, kMaxConnections> connections_;
 };
 
 } // namespace platform

@@ -2,11 +2,18 @@
 
 #include "platform/linux/AsBytes.h"
 
-#include <utility>
-
 namespace platform {
 
-LinuxServiceRegistry::LinuxServiceRegistry(const std::string& socketPath, SystemLog& log,
+std::optional<RegistryPath> RegistryPath::of(std::string_view text) {
+    RegistryPath path;
+    if (text.empty() || text.size() > path.text_.size()) {
+        return std::nullopt;
+    }
+    path.size_ = text.copy(path.text_.data(), path.text_.size());
+    return path;
+}
+
+LinuxServiceRegistry::LinuxServiceRegistry(std::string_view socketPath, SystemLog& log,
                                            std::chrono::milliseconds timeout)
     : connection_(socketPath, log, timeout) {}
 
@@ -27,31 +34,42 @@ ServiceHandle LinuxServiceRegistry::find(wire::KernelOperation operation, std::s
         reply.status != kSuccess || reply.reported == 0) {
         return kNoService;
     }
-    const std::string path(reply.body.begin(), reply.body.end());
-    const bool isPath = !path.empty() && path.size() <= wire::kKernelMaxPathLength;
-    return isPath ? hold(path) : kNoService;
+    const auto path =
+        RegistryPath::of({reinterpret_cast<const char*>(reply.body.data()), reply.body.size()});
+    if (!path) {
+        connection_.disconnect();
+        return kNoService;
+    }
+    return hold(*path);
 }
 
-ServiceHandle LinuxServiceRegistry::hold(std::string path) {
-    for (auto& [handle, entry] : entries_) {
-        if (entry.path == path) {
-            ++entry.references;
-            return handle;
+ServiceHandle LinuxServiceRegistry::hold(const RegistryPath& path) {
+    std::optional<Entry>* room = nullptr;
+    for (auto& entry : entries_) {
+        if (!entry) {
+            room = &entry;
+        } else if (entry->path.text() == path.text()) {
+            ++entry->references;
+            return entry->handle;
         }
     }
-    entries_.emplace(++lastHandle_, Entry{std::move(path), 1});
+    if (room == nullptr) {
+        return kNoService;
+    }
+    room->emplace(Entry{++lastHandle_, 1, path});
     return lastHandle_;
 }
 
 std::optional<std::vector<std::uint8_t>> LinuxServiceRegistry::copyProperty(ServiceHandle entry,
                                                                             std::string_view name) {
-    const std::string path = pathOf(entry);
+    const std::string_view path = pathOf(entry);
     if (path.empty() || name.empty() || name.size() > wire::kKernelMaxNameLength) {
         return std::nullopt;
     }
-    const auto request = wire::encodeKernelProperty({path, name});
+    const auto prefix = wire::encodeKernelPropertyPrefix(path.size());
     KernelSocketConnection::Reply reply;
-    if (connection_.exchange(wire::KernelOperation::copyProperty, {request}, reply) != kSuccess ||
+    if (connection_.exchange(wire::KernelOperation::copyProperty,
+                             {prefix, asBytes(path), asBytes(name)}, reply) != kSuccess ||
         reply.status != kSuccess || reply.reported == 0) {
         return std::nullopt;
     }
@@ -59,15 +77,24 @@ std::optional<std::vector<std::uint8_t>> LinuxServiceRegistry::copyProperty(Serv
 }
 
 void LinuxServiceRegistry::release(ServiceHandle entry) {
-    const auto found = entries_.find(entry);
-    if (found != entries_.end() && --found->second.references == 0) {
-        entries_.erase(found);
+    for (auto& held : entries_) {
+        if (held && held->handle == entry && --held->references == 0) {
+            held.reset();
+        }
     }
 }
 
-std::string LinuxServiceRegistry::pathOf(ServiceHandle entry) const {
-    const auto found = entries_.find(entry);
-    return found == entries_.end() ? std::string() : found->second.path;
+void LinuxServiceRegistry::setDeadline(std::optional<Deadline> deadline) noexcept {
+    connection_.setDeadline(deadline);
+}
+
+std::string_view LinuxServiceRegistry::pathOf(ServiceHandle entry) const {
+    for (const auto& held : entries_) {
+        if (held && held->handle == entry) {
+            return held->path.text();
+        }
+    }
+    return {};
 }
 
 } // namespace platform

@@ -3,16 +3,37 @@
 #include "platform/ServiceRegistry.h"
 #include "platform/linux/KernelSocketConnection.h"
 
+#include <array>
+#include <cstddef>
 #include <cstdint>
-#include <map>
-#include <string>
+#include <optional>
+#include <string_view>
 
 namespace platform {
 
-/// ServiceRegistry over the kernel service's socket.
+/// The path of an entry, in no memory but its own.
+class RegistryPath {
+  public:
+    /// None when it is empty or longer than a path can be.
+    [[nodiscard]] static std::optional<RegistryPath> of(std::string_view text);
+
+    [[nodiscard]] std::string_view text() const { return {text_.data(), size_}; }
+
+  private:
+    RegistryPath() = default;
+
+    // As long as its size says; the rest is not looked at.
+    std::array<char, wire::kKernelMaxPathLength> text_;
+    std::size_t size_ = 0;
+};
+
+/// ServiceRegistry over the kernel service's socket. Only a property is allocated.
 class LinuxServiceRegistry final : public ServiceRegistry {
   public:
-    LinuxServiceRegistry(const std::string& socketPath, SystemLog& log,
+    /// How many entries are held at the same time. One more is not found.
+    static constexpr std::size_t kMaxEntries = 16;
+
+    LinuxServiceRegistry(std::string_view socketPath, SystemLog& log,
                          std::chrono::milliseconds timeout = kKernelTimeout);
 
     [[nodiscard]] ServiceHandle findByPath(std::string_view path) override;
@@ -21,20 +42,25 @@ class LinuxServiceRegistry final : public ServiceRegistry {
     copyProperty(ServiceHandle entry, std::string_view name) override;
     void release(ServiceHandle entry) override;
 
-    /// The registry path of an entry that is held, or an empty text.
-    [[nodiscard]] std::string pathOf(ServiceHandle entry) const;
+    void setDeadline(std::optional<Deadline> deadline) noexcept override;
+    [[nodiscard]] bool isInherited() const noexcept override { return connection_.isInherited(); }
+    void leaveToParent() noexcept override { connection_.leaveToParent(); }
+
+    /// The registry path of an entry that is held, or an empty text. Stands until it is released.
+    [[nodiscard]] std::string_view pathOf(ServiceHandle entry) const;
 
   private:
     struct Entry {
-        std::string path;
-        std::uint64_t references = 0;
+        ServiceHandle handle;
+        std::uint64_t references;
+        RegistryPath path;
     };
 
     [[nodiscard]] ServiceHandle find(wire::KernelOperation operation, std::string_view key);
-    [[nodiscard]] ServiceHandle hold(std::string path);
+    [[nodiscard]] ServiceHandle hold(const RegistryPath& path);
 
     KernelSocketConnection connection_;
-    std::map<ServiceHandle, Entry> entries_;
+    std::array<std::optional<Entry>, kMaxEntries> entries_;
     ServiceHandle lastHandle_ = kNoService;
 };
 

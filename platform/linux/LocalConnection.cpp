@@ -1,7 +1,6 @@
 #include "platform/linux/LocalConnection.h"
 
-#include "base/UnixAddress.h"
-
+#include <algorithm>
 #include <cerrno>
 #include <sys/socket.h>
 #include <sys/time.h>
@@ -12,10 +11,25 @@ namespace platform {
 
 namespace {
 
-timeval toTimeval(std::chrono::milliseconds time) {
-    const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(time);
-    const auto rest = std::chrono::duration_cast<std::chrono::microseconds>(time - seconds);
-    return {static_cast<time_t>(seconds.count()), static_cast<suseconds_t>(rest.count())};
+using Clock = std::chrono::steady_clock;
+
+/// 0, or why not. Signals do not lengthen the time.
+int connectWithin(int socket, const base::UnixAddress& address, std::chrono::microseconds timeout) {
+    const Clock::time_point until = Clock::now() + timeout;
+    while (::connect(socket, address.get(), address.size()) != 0) {
+        if (errno != EINTR) {
+            // What a timeout shows as.
+            return errno == EAGAIN ? ETIMEDOUT : errno;
+        }
+        const auto left =
+            std::chrono::duration_cast<std::chrono::microseconds>(until - Clock::now());
+        if (left.count() <= 0) {
+            return ETIMEDOUT;
+        }
+        setTimeLimit(socket, SO_SNDTIMEO, left);
+    }
+    setTimeLimit(socket, SO_SNDTIMEO, timeout);
+    return 0;
 }
 
 LocalConnection checked(base::FileDescriptor socket) {
@@ -32,28 +46,33 @@ LocalConnection checked(base::FileDescriptor socket) {
 
 } // namespace
 
-LocalConnection connectLocally(const std::string& path, int type,
-                               std::chrono::milliseconds timeout) {
-    const auto address = base::UnixAddress::of(path);
-    if (!address) {
-        return {.error = ENAMETOOLONG};
-    }
+void setTimeLimit(int socket, int option, std::chrono::microseconds time) {
+    // No time at all would mean no limit.
+    const auto some = std::max(time, std::chrono::microseconds(1));
+    const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(some);
+    const timeval value{static_cast<time_t>(seconds.count()),
+                        static_cast<suseconds_t>((some - seconds).count())};
+    ::setsockopt(socket, SOL_SOCKET, option, &value, sizeof value);
+}
+
+LocalConnection connectLocally(const base::UnixAddress& address, int type,
+                               std::chrono::microseconds timeout) {
     base::FileDescriptor socket(::socket(AF_UNIX, type | SOCK_CLOEXEC, 0));
     if (!socket.isOpen()) {
         return {.error = errno};
     }
-    const timeval limit = toTimeval(timeout);
-    ::setsockopt(socket.get(), SOL_SOCKET, SO_SNDTIMEO, &limit, sizeof limit);
-    ::setsockopt(socket.get(), SOL_SOCKET, SO_RCVTIMEO, &limit, sizeof limit);
-    int result = -1;
-    do {
-        result = ::connect(socket.get(), address->get(), address->size());
-    } while (result != 0 && errno == EINTR);
-    if (result != 0) {
-        // What a timeout shows as.
-        return {.error = errno == EAGAIN ? ETIMEDOUT : errno};
+    setTimeLimit(socket.get(), SO_SNDTIMEO, timeout);
+    setTimeLimit(socket.get(), SO_RCVTIMEO, timeout);
+    if (const int error = connectWithin(socket.get(), address, timeout); error != 0) {
+        return {.error = error};
     }
     return checked(std::move(socket));
+}
+
+LocalConnection connectLocally(std::string_view path, int type, std::chrono::microseconds timeout) {
+    const auto address = base::UnixAddress::of(path);
+    return address ? connectLocally(*address, type, timeout)
+                   : LocalConnection{.error = ENAMETOOLONG};
 }
 
 } // namespace platform

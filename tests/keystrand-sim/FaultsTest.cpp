@@ -79,6 +79,22 @@ TEST_F(FaultsTest, WrongSequence) {
     EXPECT_EQ(call(client, kAllow), kDone);
 }
 
+TEST_F(FaultsTest, WhatAClientSentBeforeItHungUpIsCarriedOut) {
+    for (const char* fault : {"fault command=25 delay=600000", "fault command=25 silence"}) {
+        tell(fault);
+        tell("env set 1 01");
+        const std::string already = ask("status", "requests");
+        {
+            const PacketSocket client = openClient();
+            ASSERT_TRUE(client.send(structCall(2, 64, frame(25, Bytes().u32(1)))));
+            ASSERT_TRUE(client.send(structCall(3, 64, frame(25, Bytes().u32(1)))));
+            ASSERT_TRUE(client.send(structCall(4, 0, frame(24, Bytes().u32(1).u8(7)))));
+        }
+        tell("wait requests=" + std::to_string(std::stoi(already) + 3));
+        EXPECT_EQ(ask("env get 1", "value"), "07") << fault;
+    }
+}
+
 TEST_F(FaultsTest, SilenceSwallowsOneRequest) {
     const PacketSocket client = openClient();
     tell("fault command=26 silence");

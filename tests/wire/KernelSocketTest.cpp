@@ -41,6 +41,17 @@ Bytes join(std::initializer_list<Bytes> parts) {
     return whole;
 }
 
+Bytes textBytes(std::string_view text) {
+    return bytesOf(text);
+}
+
+Bytes scalarBody(std::uint32_t selector, std::uint32_t offered,
+                 const std::vector<std::uint64_t>& inputs) {
+    const auto count = static_cast<std::uint32_t>(inputs.size());
+    return join({bytesOf(wire::encodeKernelScalarPrefix(selector, offered, count)),
+                 firstOf(bytesOf(wire::encodeKernelScalars(inputs)), 8 * inputs.size())});
+}
+
 /// What both kinds of header refuse in their common 16 bytes.
 template <typename Decode>
 void expectHeadChecked(const Bytes& valid, Decode decode) {
@@ -59,9 +70,15 @@ void expectHeadChecked(const Bytes& valid, Decode decode) {
         EXPECT_EQ(decode(with(valid, 5, static_cast<std::uint8_t>(operation))).has_value(), known)
             << "operation " << operation;
     }
+}
+
+/// `valid` with each of its reserved bytes set to something else than 0.
+template <typename Decode>
+void expectReserved(const Bytes& valid, Decode decode, bool taken) {
     for (const std::size_t offset : {6U, 7U}) {
         for (const int reserved : {1, 0x80, 0xff}) {
-            EXPECT_FALSE(decode(with(valid, offset, static_cast<std::uint8_t>(reserved))))
+            EXPECT_EQ(decode(with(valid, offset, static_cast<std::uint8_t>(reserved))).has_value(),
+                      taken)
                 << "reserved " << offset;
         }
     }
@@ -85,6 +102,7 @@ TEST(KernelRequestHeader, Fields) {
 
 TEST(KernelRequestHeader, RefusesWhatIsNone) {
     expectHeadChecked(kRequest, wire::decodeKernelRequestHeader);
+    expectReserved(kRequest, wire::decodeKernelRequestHeader, false);
     EXPECT_FALSE(wire::decodeKernelRequestHeader(kReply));
 }
 
@@ -114,6 +132,10 @@ TEST(KernelReplyHeader, RefusesWhatIsNone) {
     expectHeadChecked(kReply, wire::decodeKernelReplyHeader);
     EXPECT_FALSE(wire::decodeKernelReplyHeader(kRequest));
     EXPECT_FALSE(wire::decodeKernelReplyHeader(with(kReply, 3, 'Q')));
+}
+
+TEST(KernelReplyHeader, ReservedBytesAreNotLookedAt) {
+    expectReserved(kReply, wire::decodeKernelReplyHeader, true);
 }
 
 TEST(KernelReplyHeader, StatusesAtTheirEnds) {
@@ -150,7 +172,7 @@ TEST(KernelFind, TextsAtTheirLimits) {
 
 TEST(KernelProperty, ExactBytes) {
     const Bytes body{2, 0, 'p', 'a', 'n', 'a', 'm'};
-    EXPECT_EQ(wire::encodeKernelProperty({"pa", "nam"}), body);
+    EXPECT_EQ(join({bytesOf(wire::encodeKernelPropertyPrefix(2)), textBytes("panam")}), body);
     const auto request = wire::decodeKernelProperty(body);
     ASSERT_TRUE(request);
     EXPECT_EQ(request->path, "pa");
@@ -188,14 +210,15 @@ TEST(KernelProperty, PathLengthAtItsLimits) {
 // The path's length once wrapped at 65536, and the rest of the path became the name.
 TEST(KernelProperty, PathBeyondItsLengthFieldIsRefusedNotSplit) {
     for (const std::size_t length : {1025U, 65535U, 65536U, 65537U, 66000U}) {
-        const std::string path(length, 'p');
-        EXPECT_FALSE(wire::decodeKernelProperty(wire::encodeKernelProperty({path, "n"}))) << length;
+        const Bytes body = join({bytesOf(wire::encodeKernelPropertyPrefix(length)),
+                                 Bytes(length, 'p'), textBytes("n")});
+        EXPECT_FALSE(wire::decodeKernelProperty(body)) << length;
     }
 }
 
 TEST(KernelOpen, ExactBytes) {
     const Bytes body{4, 3, 2, 1, 'p', 'a'};
-    EXPECT_EQ(wire::encodeKernelOpen({0x01020304, "pa"}), body);
+    EXPECT_EQ(join({bytesOf(wire::encodeKernelOpenPrefix(0x01020304)), textBytes("pa")}), body);
     const auto request = wire::decodeKernelOpen(body);
     ASSERT_TRUE(request);
     EXPECT_EQ(request->connectionType, 0x01020304U);
@@ -241,7 +264,7 @@ TEST(KernelStruct, OfferedSizeAtItsMaximum) {
 TEST(KernelScalar, ExactBytes) {
     const Bytes body{2, 0, 0, 0, 1, 0, 0, 0, 2, 0, 0, 0, 8, 7,
                      6, 5, 4, 3, 2, 1, 0, 0, 0, 0, 0, 0, 0, 0x80};
-    EXPECT_EQ(wire::encodeKernelScalar({2, 1, {0x0102030405060708, 0x8000000000000000}}), body);
+    EXPECT_EQ(scalarBody(2, 1, {0x0102030405060708, 0x8000000000000000}), body);
     const auto request = wire::decodeKernelScalar(body);
     ASSERT_TRUE(request);
     EXPECT_EQ(request->selector, 2U);
@@ -252,13 +275,13 @@ TEST(KernelScalar, ExactBytes) {
 
 TEST(KernelScalar, WithoutInputs) {
     const Bytes body{2, 0, 0, 0, 1, 0, 0, 0, 0, 0, 0, 0};
-    EXPECT_EQ(wire::encodeKernelScalar({2, 1, {}}), body);
+    EXPECT_EQ(scalarBody(2, 1, {}), body);
     ASSERT_TRUE(wire::decodeKernelScalar(body));
     EXPECT_TRUE(wire::decodeKernelScalar(body)->inputs.empty());
 }
 
 TEST(KernelScalar, EveryTruncationAndATrailingByte) {
-    Bytes body = wire::encodeKernelScalar({2, 1, {1, 2}});
+    Bytes body = scalarBody(2, 1, {1, 2});
     for (std::size_t length = 0; length < body.size(); ++length) {
         EXPECT_FALSE(wire::decodeKernelScalar(firstOf(body, length))) << length;
     }
@@ -281,23 +304,26 @@ TEST(KernelScalar, CountsAtTheirLimits) {
     EXPECT_FALSE(wire::decodeKernelScalar(join({le32(2), le32(0), le32(0x20000000)})));
 }
 
-TEST(KernelScalar, TooManyInputsGiveARefusedBody) {
-    const wire::KernelScalarRequest request{2, 1, std::vector<std::uint64_t>(17)};
-    EXPECT_FALSE(wire::decodeKernelScalar(wire::encodeKernelScalar(request)));
+TEST(KernelScalars, AsManyAsThereCanBe) {
+    const std::vector<std::uint64_t> all(16, UINT64_MAX);
+    EXPECT_EQ(bytesOf(wire::encodeKernelScalars(all)), Bytes(8 * 16, 0xff));
+    EXPECT_EQ(bytesOf(wire::encodeKernelScalars({})), Bytes(8 * 16, 0));
 }
 
 TEST(KernelScalars, MustMatchTheirCount) {
-    EXPECT_TRUE(wire::decodeKernelScalars({}, 0));
-    EXPECT_FALSE(wire::decodeKernelScalars({}, 1));
-    EXPECT_FALSE(wire::decodeKernelScalars(Bytes(8), 0));
-    EXPECT_FALSE(wire::decodeKernelScalars(Bytes(7), 1));
-    EXPECT_FALSE(wire::decodeKernelScalars(Bytes(9), 1));
-    EXPECT_EQ(wire::decodeKernelScalars(Bytes{40, 0, 0, 0, 0, 0, 0, 0}, 1),
-              std::vector<std::uint64_t>{40});
-    EXPECT_EQ(wire::decodeKernelScalars(Bytes(8 * 16, 0xff), 16),
-              std::vector<std::uint64_t>(16, UINT64_MAX));
-    EXPECT_FALSE(wire::decodeKernelScalars(Bytes(8 * 17), 17));
-    // Eight times this wraps to 0.
-    EXPECT_FALSE(wire::decodeKernelScalars({}, std::size_t{1} << 61U));
-    EXPECT_FALSE(wire::decodeKernelScalars({}, SIZE_MAX));
+    std::vector<std::uint64_t> scalars;
+    EXPECT_TRUE(wire::decodeKernelScalars({}, scalars));
+    EXPECT_FALSE(wire::decodeKernelScalars(Bytes(8), scalars));
+    scalars.assign(1, 9);
+    for (const std::size_t size : {0U, 7U, 9U, 16U}) {
+        EXPECT_FALSE(wire::decodeKernelScalars(Bytes(size), scalars)) << size;
+        EXPECT_EQ(scalars.front(), 9U);
+    }
+    EXPECT_TRUE(wire::decodeKernelScalars(Bytes{40, 0, 0, 0, 0, 0, 0, 0}, scalars));
+    EXPECT_EQ(scalars.front(), 40U);
+    scalars.assign(16, 9);
+    EXPECT_TRUE(wire::decodeKernelScalars(Bytes(8 * 16, 0xff), scalars));
+    EXPECT_EQ(scalars, std::vector<std::uint64_t>(16, UINT64_MAX));
+    scalars.assign(17, 9);
+    EXPECT_FALSE(wire::decodeKernelScalars(Bytes(8 * 17), scalars));
 }

@@ -12,6 +12,7 @@
 #include <atomic>
 #include <csignal>
 #include <cstring>
+#include <future>
 #include <limits>
 #include <optional>
 #include <string>
@@ -255,8 +256,6 @@ INSTANTIATE_TEST_SUITE_P(
                  EPROTO},
         BadReply{"OtherOperation",
                  [](const Packet& r) { return changed(reply(r, 0, 2, "no"), 5, 3); }, EPROTO},
-        BadReply{"Reserved", [](const Packet& r) { return changed(reply(r, 0, 2, "no"), 7, 1); },
-                 EPROTO},
         BadReply{"WrongSequence",
                  [](const Packet& r) { return changed(reply(r, 0, 2, "no"), 8, 1); }, EPROTO},
         BadReply{"WrongSequenceInItsLastByte",
@@ -271,6 +270,203 @@ INSTANTIATE_TEST_SUITE_P(
         BadReply{"LargerThanAnyMessage",
                  [](const Packet& r) { return cutTo(reply(r, 0, 2, "no"), 131073); }, EMSGSIZE}),
     [](const auto& test) { return std::string(test.param.name); });
+
+TEST_F(LinuxKernelChannelTest, ReservedBytesOfAReplyAreNotLookedAt) {
+    serveAnswers([](const Packet& request) {
+        return changed(changed(reply(request, 0, 2, "ok"), 6, 0x80), 7, 0xff);
+    });
+    ASSERT_EQ(open(), kSuccess);
+    expectNextCallWorks();
+    expectNextCallWorks();
+    EXPECT_EQ(opens, 1);
+}
+
+TEST_F(LinuxKernelChannelTest, ReplyThatSaysMoreThanItBringsEndsTheConnection) {
+    serveOneFault([](const SeqpacketServer::Peer& peer, const Packet& request) {
+        peer.send(reply(request, 0, UINT32_MAX, "0123456789"));
+        return true;
+    });
+    ASSERT_EQ(open(), kSuccess);
+    EXPECT_EQ(call(), kSuccess);
+    EXPECT_FALSE(channel.isConnected(connection));
+    expectOutputUntouched(UINT32_MAX);
+    expectNextCallWorks();
+    EXPECT_EQ(opens, 2);
+    EXPECT_TRUE(channel.isConnected(connection));
+}
+
+TEST_F(LinuxKernelChannelTest, ScalarReplyThatSaysMoreThanItBringsEndsTheConnection) {
+    serveOneFault([](const SeqpacketServer::Peer& peer, const Packet& request) {
+        peer.send(reply(request, 0, UINT32_MAX, "0123456789"));
+        return true;
+    });
+    ASSERT_EQ(open(), kSuccess);
+    std::uint64_t scalar = 9;
+    std::uint32_t count = 1;
+    EXPECT_EQ(channel.scalarCall(connection, 2, nullptr, 0, &scalar, &count), kSuccess);
+    EXPECT_EQ(count, UINT32_MAX);
+    EXPECT_EQ(scalar, 9U);
+    EXPECT_FALSE(channel.isConnected(connection));
+    expectNextCallWorks();
+}
+
+TEST_F(LinuxKernelChannelTest, SixteenConnectionsAreTheLimit) {
+    serveAnswers([](const Packet& request) { return reply(request, 0, 2, "ok"); });
+    for (std::size_t i = 0; i < LinuxKernelChannel::kMaxConnections; ++i) {
+        ASSERT_EQ(open(), kSuccess);
+        EXPECT_EQ(connection, i + 1);
+    }
+    EXPECT_EQ(open(), statusFromErrno(EMFILE));
+    expectNextCallWorks();
+}
+
+TEST_F(LinuxKernelChannelTest, PassedDeadlineSendsNothing) {
+    serveAnswers([](const Packet& request) { return reply(request, 0, 2, "ok"); });
+    ASSERT_EQ(open(), kSuccess);
+    channel.setDeadline(std::chrono::steady_clock::now());
+    EXPECT_EQ(call(), statusFromErrno(ETIMEDOUT));
+    expectOutputUntouched();
+    EXPECT_EQ(calls, 0);
+    EXPECT_TRUE(channel.isConnected(connection));
+    channel.setDeadline(std::nullopt);
+    expectNextCallWorks();
+    EXPECT_EQ(opens, 1);
+}
+
+TEST_F(LinuxKernelChannelTest, ConnectionIsNotMadeAfterTheDeadline) {
+    serveAnswers([](const Packet& request) { return reply(request, 0, 2, "ok"); });
+    const ServiceHandle service = registry.findByClassName("Keystrand");
+    channel.setDeadline(std::chrono::steady_clock::now());
+    EXPECT_EQ(channel.open(service, 0, &connection), statusFromErrno(ETIMEDOUT));
+    registry.setDeadline(std::chrono::steady_clock::now());
+    EXPECT_EQ(registry.findByClassName("Keystrand"), kNoService);
+    EXPECT_EQ(opens, 0);
+    registry.setDeadline(std::nullopt);
+    channel.setDeadline(std::nullopt);
+    EXPECT_EQ(channel.open(service, 0, &connection), kSuccess);
+}
+
+TEST_F(LinuxKernelChannelTest, SignalsDoNotEndACall) {
+    struct sigaction noted {};
+    noted.sa_handler = [](int) {
+    };
+    struct sigaction former {};
+    ASSERT_EQ(::sigaction(SIGUSR1, &noted, &former), 0);
+    const pthread_t client = ::pthread_self();
+    serveAnswers([&](const Packet& request) {
+        for (int i = 0; i < 100; ++i) {
+            ::pthread_kill(client, SIGUSR1);
+        }
+        return reply(request, 0, 2, "ok");
+    });
+    ASSERT_EQ(open(), kSuccess);
+    for (int i = 0; i < 20; ++i) {
+        expectNextCallWorks();
+    }
+    server.reset();
+    ::sigaction(SIGUSR1, &former, nullptr);
+}
+
+TEST_F(LinuxKernelChannelTest, PostedRequestIsSentBehindTheOneThatWasNotAnswered) {
+    std::vector<std::uint8_t> inputs;
+    std::atomic<bool> hungUp = false;
+    serve([&](const SeqpacketServer::Peer& peer, const Packet& request) {
+        if (calls > 2) {
+            peer.send(reply(request, 0, 2, "ok"));
+            return true;
+        }
+        inputs.push_back(request.back());
+        if (calls == 2) {
+            hungUp = peer.receive().empty();
+            peer.send(reply(request, 0, 2, "no"));
+            return false;
+        }
+        return true;
+    });
+    ASSERT_EQ(open(), kSuccess);
+    channel.setDeadline(std::chrono::steady_clock::now() + std::chrono::milliseconds(20));
+    output.fill(0xAA);
+    outputSize = 16;
+    EXPECT_EQ(channel.structCall(connection, 0, "A", 1, output.data(), &outputSize),
+              statusFromErrno(ETIMEDOUT));
+    EXPECT_FALSE(channel.isConnected(connection));
+    EXPECT_EQ(channel.post(connection, 0, "B", 1), kSuccess);
+    channel.setDeadline(std::nullopt);
+    expectNextCallWorks();
+    server.reset();
+    EXPECT_EQ(inputs, (Packet{'A', 'B'}));
+    EXPECT_TRUE(hungUp);
+    EXPECT_EQ(opens, 2);
+}
+
+TEST_F(LinuxKernelChannelTest, PostedRequestIsSentOverAFreshConnectionAfterAHangUp) {
+    std::promise<void> first;
+    std::promise<void> second;
+    serve([&](const SeqpacketServer::Peer&, const Packet& request) {
+        (request.back() == 'A' ? first : second).set_value();
+        return true;
+    });
+    ASSERT_EQ(open(), kSuccess);
+    EXPECT_EQ(channel.post(connection, 0, "A", 1), kSuccess);
+    EXPECT_FALSE(channel.isConnected(connection));
+    EXPECT_EQ(channel.post(connection, 0, "B", 1), kSuccess);
+    EXPECT_FALSE(channel.isConnected(connection));
+    EXPECT_EQ(channel.post(99, 0, "C", 1), statusFromErrno(EBADF));
+    for (std::promise<void>* arrival : {&first, &second}) {
+        EXPECT_EQ(arrival->get_future().wait_for(std::chrono::seconds(30)),
+                  std::future_status::ready);
+    }
+    server.reset();
+    EXPECT_EQ(opens, 2);
+    EXPECT_EQ(channel.post(connection, 0, "D", 1), statusFromErrno(ECONNREFUSED));
+}
+
+TEST_F(LinuxKernelChannelTest, ConnectionWhoseAnswerIsLateEndsWithTheDeadline) {
+    std::atomic<bool> hungUp = false;
+    serveOneFault([&](const SeqpacketServer::Peer& peer, const Packet&) {
+        hungUp = peer.receive().empty();
+        return false;
+    });
+    ASSERT_EQ(open(), kSuccess);
+    channel.setDeadline(std::chrono::steady_clock::now() + std::chrono::milliseconds(20));
+    EXPECT_EQ(call(), statusFromErrno(ETIMEDOUT));
+    channel.setDeadline(std::nullopt);
+    server.reset();
+    EXPECT_TRUE(hungUp);
+}
+
+TEST_F(LinuxKernelChannelTest, ChildMakesAConnectionOfItsOwnAndTheParentGoesOn) {
+    serveAnswers([](const Packet& request) { return reply(request, 0, 2, "ok"); });
+    ASSERT_EQ(open(), kSuccess);
+    expectNextCallWorks();
+    EXPECT_FALSE(channel.isInherited());
+    const int inChild = support::exitStatusOfChild([&] {
+        const bool inherited = channel.isInherited() && registry.isInherited();
+        const bool works = call() == kSuccess && outputSize == 2;
+        return inherited && works && !channel.isInherited() ? 0 : 1;
+    });
+    EXPECT_EQ(inChild, 0);
+    EXPECT_EQ(opens, 2);
+    EXPECT_FALSE(channel.isInherited());
+    expectNextCallWorks();
+    EXPECT_EQ(opens, 2);
+    EXPECT_EQ(calls, 3);
+}
+
+TEST_F(LinuxKernelChannelTest, ConnectionsThatAreLeftToTheParentMeanNothingAnyMore) {
+    serveAnswers([](const Packet& request) { return reply(request, 0, 2, "ok"); });
+    ASSERT_EQ(open(), kSuccess);
+    const int inChild = support::exitStatusOfChild([&] {
+        channel.leaveToParent();
+        registry.leaveToParent();
+        const bool meansNothing =
+            call() == statusFromErrno(EBADF) && !channel.isInherited() && !registry.isInherited();
+        return meansNothing && open() == kSuccess && connection == 1 && call() == kSuccess ? 0 : 1;
+    });
+    EXPECT_EQ(inChild, 0);
+    expectNextCallWorks();
+    EXPECT_EQ(opens, 2);
+}
 
 TEST_F(LinuxKernelChannelTest, HangUpInsteadOfAnAnswerIsReportedAndTheRequestNotSentAgain) {
     serveOneFault([](const SeqpacketServer::Peer&, const Packet&) { return false; });

@@ -7,6 +7,7 @@
 
 #include <gtest/gtest.h>
 
+#include <atomic>
 #include <optional>
 #include <string>
 
@@ -63,6 +64,49 @@ TEST_F(LinuxServiceRegistryTest, SameEntryHasOneHandleAndCountedReferences) {
     EXPECT_EQ(registry.pathOf(second), "");
     registry.release(second);
     registry.release(kNoService);
+}
+
+TEST_F(LinuxServiceRegistryTest, PathsInRepliesAtTheirLimits) {
+    std::atomic<std::size_t> length = 0;
+    std::atomic<int> connections = 0;
+    server.emplace(path, [&](const SeqpacketServer::Peer& peer) {
+        ++connections;
+        for (Packet request = peer.receive(); !request.empty(); request = peer.receive()) {
+            peer.send(support::reply(request, 0, 1, std::string(length, 'p')));
+        }
+    });
+    for (const std::size_t known : {1U, 1023U, 1024U}) {
+        length = known;
+        const ServiceHandle entry = registry.findByPath("/a");
+        EXPECT_EQ(registry.pathOf(entry), std::string(known, 'p'));
+    }
+    EXPECT_EQ(connections, 1);
+    for (const std::size_t unknown : {0U, 1025U, 100000U}) {
+        length = unknown;
+        EXPECT_EQ(registry.findByPath("/a"), kNoService) << unknown;
+    }
+    length = 1;
+    EXPECT_NE(registry.findByPath("/a"), kNoService);
+    EXPECT_EQ(connections, 4);
+}
+
+TEST_F(LinuxServiceRegistryTest, SixteenEntriesAreTheLimit) {
+    std::atomic<int> number = 0;
+    serve([&](const Packet& request) {
+        return support::reply(request, 0, 1, "/" + std::to_string(number));
+    });
+    std::vector<ServiceHandle> entries;
+    for (number = 0; number < 16; ++number) {
+        entries.push_back(registry.findByPath("/a"));
+        EXPECT_EQ(registry.pathOf(entries.back()), "/" + std::to_string(number));
+    }
+    EXPECT_EQ(registry.findByPath("/a"), kNoService);
+    number = 7;
+    EXPECT_EQ(registry.findByPath("/a"), entries[7]);
+    registry.release(entries[3]);
+    EXPECT_EQ(registry.pathOf(entries[3]), "");
+    number = 16;
+    EXPECT_NE(registry.findByPath("/a"), kNoService);
 }
 
 TEST_F(LinuxServiceRegistryTest, PropertyOfAnEntryThatIsNotHeldIsNone) {
