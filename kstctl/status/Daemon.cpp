@@ -10,19 +10,11 @@ namespace kstctl {
 
 namespace {
 
-Report::Datum octal(unsigned mode) {
-    std::string digits;
-    for (int shift = 9; shift >= 0; shift -= 3) {
-        digits += static_cast<char>('0' + ((mode >> static_cast<unsigned>(shift)) & 7U));
-    }
-    return digits;
-}
-
 void addSocket(Section& section, const EventSocketFile& socket) {
     Report report;
     report.add("path", socket.path).add("isPresent", socket.isPresent);
     if (socket.isPresent) {
-        report.add("owner", socket.owner).add("mode", octal(socket.mode));
+        report.add("owner", socket.owner).add("mode", octalMode(socket.mode));
     }
     if (!socket.problem) {
         report.add("isOpen", true);

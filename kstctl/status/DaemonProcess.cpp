@@ -2,6 +2,7 @@
 
 #include "base/Concat.h"
 #include "kstctl/FileError.h"
+#include "kstctl/status/BoundSockets.h"
 #include "platform/linux/LinuxClock.h"
 
 #include <algorithm>
@@ -13,7 +14,6 @@
 #include <set>
 #include <sstream>
 #include <string_view>
-#include <sys/stat.h>
 #include <unistd.h>
 
 namespace kstctl {
@@ -24,37 +24,13 @@ namespace fs = std::filesystem;
 
 constexpr std::string_view kDaemonNames[] = {"kstd", "kstd-dev"};
 
-/// Whether two paths lead to the same file.
-bool isSameFile(const std::string& one, const struct stat& other) {
-    struct stat status {};
-    return ::stat(one.c_str(), &status) == 0 && status.st_dev == other.st_dev &&
-           status.st_ino == other.st_ino;
-}
-
 /// What links in /proc call the sockets that are bound to the path.
-std::set<std::string> socketsBoundTo(const std::string& path) {
-    std::set<std::string> sockets;
-    struct stat status {};
-    if (::stat(path.c_str(), &status) != 0) {
-        return sockets;
+std::set<std::string> linksToSockets(const std::string& path) {
+    std::set<std::string> links;
+    for (const BoundSocket& socket : socketsBoundTo(path)) {
+        links.insert(base::concat("socket:[", socket.number, ']'));
     }
-    std::ifstream table("/proc/net/unix");
-    std::string line;
-    std::getline(table, line);
-    while (std::getline(table, line)) {
-        std::istringstream words(line);
-        std::string number;
-        std::string bound;
-        for (int column = 0; column < 7; ++column) {
-            words >> number;
-        }
-        words >> std::ws;
-        std::getline(words, bound);
-        if (bound.starts_with('/') && isSameFile(bound, status)) {
-            sockets.insert(base::concat("socket:[", number, ']'));
-        }
-    }
-    return sockets;
+    return links;
 }
 
 std::string firstLine(const std::string& path) {
@@ -123,7 +99,7 @@ bool isProcess(const std::string& name) {
 
 DaemonState findDaemonProcess(const std::string& path) {
     DaemonState state{.source = "process"};
-    const std::set<std::string> sockets = socketsBoundTo(path);
+    const std::set<std::string> sockets = linksToSockets(path);
     bool isDoubtful = false;
     std::error_code error;
     for (fs::directory_iterator entry("/proc", error), end; !error && entry != end;

@@ -29,4 +29,12 @@ void Section::note(const platform::Error& fault) {
     }
 }
 
+std::string octalMode(unsigned mode) {
+    std::string digits;
+    for (int shift = 9; shift >= 0; shift -= 3) {
+        digits += static_cast<char>('0' + ((mode >> static_cast<unsigned>(shift)) & 7U));
+    }
+    return digits;
+}
+
 } // namespace kstctl

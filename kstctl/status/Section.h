@@ -33,6 +33,9 @@ struct Section {
     }
 };
 
+/// The permission bits of a file's mode, as four digits.
+[[nodiscard]] std::string octalMode(unsigned mode);
+
 /// The event socket, and the process behind it.
 [[nodiscard]] Section daemonSection(const Environment& environment);
 [[nodiscard]] Section stateFileSection(const Environment& environment);

@@ -1,5 +1,8 @@
+#include "base/Concat.h"
 #include "kstctl/Environment.h"
 #include "kstctl/RecordingLog.h"
+#include "kstctl/status/BoundSockets.h"
+#include "kstctl/status/LastUpload.h"
 #include "kstctl/status/Section.h"
 #include "kstctl/status/UploadConfiguration.h"
 #include "platform/linux/LinuxConfigurationResource.h"
@@ -8,6 +11,8 @@
 
 #include <algorithm>
 #include <optional>
+#include <sys/stat.h>
+#include <utility>
 
 namespace kstctl {
 
@@ -19,6 +24,28 @@ Report::Datum datumOf(const std::optional<std::string>& text) {
 
 Report::Datum datumOf(const std::optional<platform::Link>& link) {
     return link ? Report::Datum(link->text) : Report::None();
+}
+
+/// Its own look: a connection would launch a client.
+void addHTTPSSocket(Section& section, const Environment& environment, bool isNeeded) {
+    const std::string path = environment.paths.httpsSocket();
+    struct stat status {};
+    const bool isPresent = ::stat(path.c_str(), &status) == 0;
+    const auto sockets = socketsBoundTo(path);
+    const bool isOpen = std::any_of(sockets.begin(), sockets.end(),
+                                    [](const auto& socket) { return socket.isListening; });
+    Report report;
+    report.add("path", path).add("isPresent", isPresent);
+    if (isPresent) {
+        report.add("owner", status.st_uid).add("mode", octalMode(status.st_mode));
+    }
+    report.add("isOpen", isOpen, isOpen ? "" : "nobody starts the HTTPS client");
+    section.report.add("httpsSocket", std::move(report));
+    if (isNeeded && !isOpen) {
+        section.note(
+            failure(ExitStatus::missing,
+                    base::concat("nobody listens at ", path, "; uploads need kstd-https.socket")));
+    }
 }
 
 } // namespace
@@ -51,6 +78,9 @@ Section uploadSection(const Environment& environment) {
         .add("bagURL", datumOf(analytics.splunkBagURL))
         .add("topic", datumOf(analytics.splunkTopicName))
         .add("allowInsecureCertificate", analytics.allowInsecureSplunkCert);
+    // Under another root the daemon starts the client itself.
+    addHTTPSSocket(section, environment, isConfigured && environment.paths.isSystemRoot());
+    addLastUpload(section, environment);
     if (!remarks.empty()) {
         section.report.add("problems", Data(remarks.begin(), remarks.end()));
         section.note(failure(ExitStatus::malformed, remarks.front()));

@@ -2,13 +2,17 @@
 // wrong.
 
 #include "base/Concat.h"
+#include "base/FileDescriptor.h"
+#include "base/UnixAddress.h"
 #include "platform/shared/BinaryPropertyList.h"
 #include "tests/kstctl/KstctlFixture.h"
 
+#include <cerrno>
 #include <chrono>
 #include <filesystem>
 #include <fstream>
 #include <functional>
+#include <sys/socket.h>
 
 namespace kstctl {
 namespace {
@@ -105,13 +109,19 @@ TEST_F(StatusTest, BeforeDuringAndAfterARun) {
         {"upload.bagURL", "https://x.example/bag"},
         {"upload.topic", "kst"},
         {"upload.allowInsecureCertificate", false},
+        {"upload.httpsSocket.path", real("/run/kstd/https.sock")},
+        {"upload.httpsSocket.isPresent", false},
+        {"upload.httpsSocket.isOpen", false},
+        {"upload.httpsSocket.isOpenText", "nobody starts the HTTPS client"},
+        {"upload.last", Null()},
+        {"upload.lastUnknown", "only the journal keeps it, and this daemon does not write to one"},
     };
     std::vector<std::string> paths = {
         "daemon",          "daemon.eventSocket", "daemon.lastStart",
         "stateFile",       "analyticsFile",      "analyticsFile.periodStartText",
         "alarms",          "alarms.registered",  "alarms.registered.0",
         "managedSettings", "database",           "database.uploadDate",
-        "upload"};
+        "upload",          "upload.httpsSocket"};
     for (const auto& [path, value] : kExpected) {
         EXPECT_EQ(at(status, path), value) << path;
         paths.push_back(path);
@@ -156,6 +166,33 @@ TEST_F(StatusTest, DaemonThatIsLaunchedOnDemand) {
     EXPECT_EQ(at(idle, "daemon.lastStart"), Value(Null()));
     // Looking does not launch it.
     EXPECT_EQ(supervisor->count("started"), 0U);
+}
+
+TEST_F(StatusTest, SocketOfTheHTTPSClient) {
+    const std::string path = real("/run/kstd/https.sock");
+    const auto shown = [this] {
+        return at(json({"status"}, 3), "upload.httpsSocket");
+    };
+    std::ofstream(path).close();
+    EXPECT_EQ(at(shown(), "isPresent"), Value(true));
+    EXPECT_EQ(at(shown(), "isOpen"), Value(false));
+    fs::remove(path);
+    base::FileDescriptor socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+    const auto address = base::UnixAddress::of(path).value();
+    ASSERT_EQ(::bind(socket.get(), address.get(), address.size()), 0);
+    fs::permissions(path, fs::perms::owner_read | fs::perms::owner_write);
+    EXPECT_EQ(at(shown(), "isOpen"), Value(false));
+    ASSERT_EQ(::listen(socket.get(), 1), 0);
+    const Value open = shown();
+    EXPECT_EQ(at(open, "isOpen"), Value(true));
+    EXPECT_EQ(at(open, "owner"), Value(std::int64_t{::geteuid()}));
+    EXPECT_EQ(at(open, "mode"), Value("0600"));
+    // Nobody has come.
+    EXPECT_EQ(::accept4(socket.get(), nullptr, nullptr, SOCK_CLOEXEC), -1);
+    EXPECT_EQ(errno, EAGAIN);
+    socket.reset();
+    EXPECT_EQ(at(shown(), "isPresent"), Value(true));
+    EXPECT_EQ(at(shown(), "isOpen"), Value(false));
 }
 
 TEST_F(StatusTest, AlarmThatIsDue) {
