@@ -1,5 +1,7 @@
 #include "kstctl/database/ReadOnlyFiles.h"
 
+#include "kstd/Analytics/SQLite/DatabaseFile.h"
+
 #include <sqlite3.h>
 
 namespace kstctl {
@@ -26,7 +28,7 @@ int refuseToDelete(sqlite3_vfs* /*files*/, const char* /*path*/, int /*syncDirec
 
 const char* registerReadOnlyFiles() {
     static sqlite3_vfs files = [] {
-        systemFiles = sqlite3_vfs_find(nullptr);
+        systemFiles = sqlite3_vfs_find(kstd::registerDatabaseFiles());
         sqlite3_vfs copy = systemFiles != nullptr ? *systemFiles : sqlite3_vfs{};
         copy.pNext = nullptr;
         copy.zName = kName;

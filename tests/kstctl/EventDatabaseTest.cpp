@@ -1,11 +1,13 @@
 #include "kstctl/database/EventDatabase.h"
 
 #include "base/Concat.h"
+#include "base/FileDescriptor.h"
 #include "kstctl/ExitStatus.h"
 #include "kstctl/Forms.h"
 #include "kstctl/database/EventText.h"
 #include "platform/linux/LinuxPropertyLists.h"
 #include "tests/kstd/Analytics/SQLite/OtherConnection.h"
+#include "tests/kstd/Analytics/SQLite/SmallDisk.h"
 #include "tests/support/ChildProcess.h"
 #include "tests/support/Program.h"
 #include "tests/support/TemporaryDirectory.h"
@@ -13,6 +15,7 @@
 #include <gtest/gtest.h>
 
 #include <csignal>
+#include <fcntl.h>
 #include <filesystem>
 #include <fstream>
 #include <functional>
@@ -209,6 +212,31 @@ TEST_F(EventDatabaseTest, WriterThatWasKilled) {
     fs::remove(path + "-shm");
     expectFailure(ExitStatus::failed, kNoIndex);
     EXPECT_EQ(files().size(), 2U);
+}
+
+/// Reading a hole in memory that is a file's takes a block in some file systems, this one included.
+TEST_F(EventDatabaseTest, IndexWithHolesOnAFullDisk) {
+    const kstd::SmallDisk disk(directory.file("disk"));
+    if (!disk.isMounted()) {
+        GTEST_SKIP() << "mounting a small file system needs root";
+    }
+    path = disk.file("events.db");
+    make({"a"});
+    Writer writer(path);
+    writer.add("b");
+    {
+        const base::FileDescriptor index(::open((path + "-shm").c_str(), O_WRONLY | O_CLOEXEC));
+        ASSERT_EQ(::fallocate(index.get(), FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0,
+                              static_cast<off_t>(fs::file_size(path + "-shm"))),
+                  0);
+    }
+    disk.fill();
+    EXPECT_EQ(support::exitStatusOfChild([this] {
+                  expectFailure(ExitStatus::failed, ": database or disk is full (13)");
+                  return HasFailure() ? 1 : 0;
+              }),
+              0);
+    writer.kill();
 }
 
 TEST_F(EventDatabaseTest, WritersThatComeAndGo) {

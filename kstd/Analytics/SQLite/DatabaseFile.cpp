@@ -5,6 +5,9 @@
 
 #include <cerrno>
 #include <fcntl.h>
+#include <new>
+#include <sqlite3.h>
+#include <sys/mman.h>
 #include <sys/stat.h>
 #include <system_error>
 #include <unistd.h>
@@ -29,7 +32,88 @@ platform::Error directoryError(const std::string& directory, int code) {
                          std::generic_category().message(code))};
 }
 
+constexpr char kDatabaseFilesName[] = "kstd";
+
+/// SQLite's own, as they were before others were put in front of them.
+sqlite3_vfs ownFiles{};
+
+/// What lies behind SQLite's own data of an open file: the rest of SQLite goes on using its own
+/// functions on them.
+struct ReservingTail {
+    decltype(sqlite3_io_methods::xShmMap) ownMap;
+    sqlite3_io_methods methods;
+
+    static constexpr std::size_t kAlignment = 16;
+
+    static std::size_t offset() {
+        const auto size = static_cast<std::size_t>(ownFiles.szOsFile);
+        return (size + kAlignment - 1) / kAlignment * kAlignment;
+    }
+    static void* placeIn(sqlite3_file* file) { return reinterpret_cast<char*>(file) + offset(); }
+};
+static_assert(alignof(ReservingTail) <= 8, "SQLite aligns open files to eight bytes");
+
+/// Faults in what was mapped as a use would. This takes the place of posix_fallocate, for which
+/// the file would have to be opened once more: closing that descriptor would drop the locks that
+/// SQLite has on the file. It also works where a file system cannot reserve.
+int reserveMapped(volatile void* mapped, int size, bool isWritable) {
+    const int advice = isWritable ? MADV_POPULATE_WRITE : MADV_POPULATE_READ;
+    // SQLite's pointers are to volatile, the kernel's are not.
+    if (::madvise(const_cast<void*>(mapped), static_cast<std::size_t>(size), advice) == 0 ||
+        errno == EINVAL) {
+        return SQLITE_OK;
+    }
+    return errno == EFAULT ? SQLITE_FULL : SQLITE_IOERR_SHMMAP;
+}
+
+int mapReserved(sqlite3_file* file, int region, int size, int extend, volatile void** mapped) {
+    const auto* const tail = static_cast<const ReservingTail*>(ReservingTail::placeIn(file));
+    const int code = tail->ownMap(file, region, size, extend, mapped);
+    if (code == SQLITE_IOERR_SHMSIZE && errno == ENOSPC) {
+        return SQLITE_FULL;
+    }
+    // SQLITE_READONLY comes with a mapping that can only be read.
+    if ((code == SQLITE_OK || code == SQLITE_READONLY) && *mapped != nullptr) {
+        if (const int reserved = reserveMapped(*mapped, size, code == SQLITE_OK);
+            reserved != SQLITE_OK) {
+            *mapped = nullptr;
+            return reserved;
+        }
+    }
+    return code;
+}
+
+int openReserving(sqlite3_vfs* /*files*/, const char* path, sqlite3_file* file, int flags,
+                  int* outFlags) {
+    const int code = ownFiles.xOpen(&ownFiles, path, file, flags, outFlags);
+    const sqlite3_io_methods* const own = file->pMethods;
+    if (code == SQLITE_OK && own != nullptr && own->iVersion >= 2 && own->xShmMap != nullptr) {
+        auto* const tail = new (ReservingTail::placeIn(file)) ReservingTail{own->xShmMap, *own};
+        tail->methods.xShmMap = mapReserved;
+        file->pMethods = &tail->methods;
+    }
+    return code;
+}
+
 } // namespace
+
+const char* registerDatabaseFiles() {
+    static const int code = [] {
+        const sqlite3_vfs* const found = sqlite3_vfs_find(nullptr);
+        if (found == nullptr) {
+            return SQLITE_ERROR;
+        }
+        ownFiles = *found;
+        static sqlite3_vfs reserving = ownFiles;
+        reserving.pNext = nullptr;
+        reserving.zName = kDatabaseFilesName;
+        reserving.szOsFile = static_cast<int>(ReservingTail::offset() + sizeof(ReservingTail));
+        reserving.xOpen = openReserving;
+        return sqlite3_vfs_register(&reserving, 0);
+    }();
+    static_cast<void>(code);
+    return kDatabaseFilesName;
+}
 
 std::optional<platform::Error> makeParentDirectories(const std::string& path) {
     for (std::size_t slash = path.find('/', 1); slash != std::string::npos;

@@ -77,8 +77,8 @@ bool KSTDSQLite::openConnection(platform::Error& reason) {
         return false;
     }
     createDatabaseFile(path_);
-    const int code =
-        sqlite3_open_v2(path_.c_str(), &db_, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, nullptr);
+    const int code = sqlite3_open_v2(
+        path_.c_str(), &db_, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, registerDatabaseFiles());
     if (code != SQLITE_OK) {
         reason.description = base::concat("Error opening db at ", path_, ", rc=", code, "(0x",
                                           base::Hex{static_cast<std::uint32_t>(code)}, ")");
