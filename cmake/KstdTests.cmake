@@ -53,3 +53,12 @@ function(kstd_test name)
         NO_PRETTY_VALUES
         PROPERTIES TIMEOUT ${ARG_TIMEOUT} LABELS "${ARG_LABELS}")
 endfunction()
+
+# kstd_test_in_two_lengths(NAME DEFINITION SHORT LONG SOURCES... LINK...): a test in a short form with
+# every run, and the whole of it under the label "long"; the definition says which it is.
+function(kstd_test_in_two_lengths name definition short long)
+    kstd_test(${name}_test ${ARGN})
+    target_compile_definitions(${name}_test PRIVATE ${definition}=${short})
+    kstd_test(${name}_long_test ${ARGN} LABELS long TIMEOUT 1800)
+    target_compile_definitions(${name}_long_test PRIVATE ${definition}=${long})
+endfunction()

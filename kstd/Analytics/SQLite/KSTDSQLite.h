@@ -106,7 +106,12 @@ class KSTDSQLite {
     void setTraced(bool traced) { traced_ = traced; }
 
     /// Opens the database, or counts one more opening. False leaves it closed and says why in
-    /// `error`, which may be null. Failures to build the tables do not make it fail.
+    /// `error`, which may be null.
+    ///
+    /// Of building the tables nothing makes it fail but this: the file has none yet, and a
+    /// statement failed for the storage (full, not writable, an I/O error, no memory). Nothing is
+    /// left of the attempt then. What a schema text that is wrong in itself has made by its first
+    /// mistake stays, and counts as built.
     [[nodiscard]] bool openWithError(platform::Error* error);
     /// openWithError that writes a failure to the log.
     void open();
@@ -200,10 +205,15 @@ class KSTDSQLite {
     void logError(std::string_view text) const;
 
   private:
+    /// What an opening has done about the tables.
+    enum class Tables { kept, made, rebuilt, failed };
+
     [[nodiscard]] bool openConnection(platform::Error& reason);
     [[nodiscard]] bool configureConnection();
-    [[nodiscard]] bool makeTablesCurrent();
-    void buildTables();
+    [[nodiscard]] Tables makeTablesCurrent();
+    [[nodiscard]] Tables makeTables();
+    [[nodiscard]] bool hasStorageFailed() const;
+    [[nodiscard]] bool failToOpen(platform::Error& reason, platform::Error* error);
     void createPropertiesTable();
     void storeVersions();
     void periodicVacuum();

@@ -44,23 +44,40 @@ bool KSTDSQLite::openWithError(platform::Error* error) {
     platform::Error reason{platform::kGenericErrorDomain, 0,
                            base::concat("Error opening db at ", path_, ", ")};
     if (!openConnection(reason) || !configureConnection()) {
-        sqlite3_close_v2(std::exchange(db_, nullptr));
-        if (error != nullptr) {
-            *error = std::move(reason);
-        }
-        return false;
+        return failToOpen(reason, error);
     }
     begin();
-    const bool built = makeTablesCurrent();
-    end();
+    Tables tables = makeTablesCurrent();
+    if (tables != Tables::failed) {
+        end();
+        if (tables == Tables::made && hasStorageFailed()) {
+            tables = Tables::failed;
+        }
+    }
+    if (tables == Tables::failed) {
+        return failToOpen(reason, error);
+    }
     if (shouldVacuum_) {
         periodicVacuum();
     }
-    if (built || hasMigrated_) {
+    if (tables != Tables::kept || hasMigrated_) {
         storeVersions();
     }
     ++openCount_;
     return true;
+}
+
+bool KSTDSQLite::failToOpen(platform::Error& reason, platform::Error* error) {
+    if (db_ != nullptr && sqlite3_get_autocommit(db_) == 0) {
+        rollback();
+    }
+    // They belong to this connection; the next one has its own.
+    removeAllStatements();
+    sqlite3_close_v2(std::exchange(db_, nullptr));
+    if (error != nullptr) {
+        *error = std::move(reason);
+    }
+    return false;
 }
 
 void KSTDSQLite::open() {
@@ -96,38 +113,66 @@ bool KSTDSQLite::configureConnection() {
            executeSQL("pragma auto_vacuum = FULL");
 }
 
-/// Whether the tables were built.
-bool KSTDSQLite::makeTablesCurrent() {
+KSTDSQLite::Tables KSTDSQLite::makeTablesCurrent() {
     if (select({"name"}, "sqlite_master", "type = ? AND name = ?", {"table", "Properties"})
             .empty()) {
         createPropertiesTable();
+        if (hasStorageFailed()) {
+            return Tables::failed;
+        }
     }
     const std::optional<std::string> storedVersion = propertyForKey(kSchemaVersionKey);
     const std::int32_t fileVersion = dbUserVersion();
-    if (storedVersion) {
-        const std::int32_t wantedVersion = userVersion();
-        if (*storedVersion == schemaVersion_ &&
-            (wantedVersion == 0 || wantedVersion == fileVersion)) {
-            return false;
-        }
-        if (delegate_ != nullptr && delegate_->migrateDatabase(*this, fileVersion)) {
-            hasMigrated_ = true;
-        }
-        if (hasMigrated_) {
-            return false;
-        }
-        removeAllStatements();
-        dropAllTables();
+    if (!storedVersion) {
+        return makeTables();
+    }
+    const std::int32_t wantedVersion = userVersion();
+    if (*storedVersion == schemaVersion_ && (wantedVersion == 0 || wantedVersion == fileVersion)) {
+        return Tables::kept;
+    }
+    if (delegate_ != nullptr && delegate_->migrateDatabase(*this, fileVersion)) {
         hasMigrated_ = true;
     }
-    buildTables();
-    return true;
-}
-
-void KSTDSQLite::buildTables() {
+    if (hasMigrated_) {
+        return Tables::kept;
+    }
+    removeAllStatements();
+    dropAllTables();
+    hasMigrated_ = true;
     createPropertiesTable();
     executeSQL("%@", schema_);
     storeCurrentTime(kCreatedKey);
+    return Tables::rebuilt;
+}
+
+/// A file without a version has nothing to lose: when the storage is at fault nothing is left of
+/// the attempt, and the next opening makes another.
+KSTDSQLite::Tables KSTDSQLite::makeTables() {
+    createPropertiesTable();
+    if (hasStorageFailed()) {
+        return Tables::failed;
+    }
+    executeSQL("%@", schema_);
+    if (hasStorageFailed()) {
+        return Tables::failed;
+    }
+    storeCurrentTime(kCreatedKey);
+    return hasStorageFailed() ? Tables::failed : Tables::made;
+}
+
+/// Of what was done last on the connection.
+bool KSTDSQLite::hasStorageFailed() const {
+    constexpr int kPrimaryCodeMask = 0xff;
+    switch (sqlite3_errcode(db_) & kPrimaryCodeMask) {
+    case SQLITE_FULL:
+    case SQLITE_IOERR:
+    case SQLITE_NOMEM:
+    case SQLITE_READONLY:
+    case SQLITE_CANTOPEN:
+        return true;
+    default:
+        return false;
+    }
 }
 
 void KSTDSQLite::createPropertiesTable() {
