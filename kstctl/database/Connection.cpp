@@ -3,6 +3,7 @@
 #include "base/Concat.h"
 #include "base/Saturate.h"
 #include "kstctl/database/ReadOnlyFiles.h"
+#include "kstd/Analytics/SQLite/DatabaseFile.h"
 
 #include <string_view>
 
@@ -51,8 +52,8 @@ ExitStatus statusOfCode(int code) {
 
 Connection::Connection(const std::string& path, Log log, std::chrono::milliseconds patience) {
     const bool isWritten = log == Log::written;
-    const char* const files = isWritten ? nullptr : registerReadOnlyFiles();
-    if (files == nullptr && !isWritten) {
+    const char* const files = isWritten ? kstd::registerDatabaseFiles() : registerReadOnlyFiles();
+    if (files == nullptr) {
         return;
     }
     sqlite3* db = nullptr;
@@ -72,8 +73,9 @@ int Connection::execute(const char* SQL) const {
     return sqlite3_exec(get(), SQL, nullptr, nullptr, nullptr);
 }
 
-std::string Connection::message() const {
-    return sqlite3_errmsg(get());
+std::string Connection::message(int code) const {
+    // What was finalized since may have succeeded.
+    return sqlite3_extended_errcode(get()) == code ? sqlite3_errmsg(get()) : sqlite3_errstr(code);
 }
 
 platform::Error databaseError(const std::string& path, const Connection& connection, int code) {
@@ -81,7 +83,7 @@ platform::Error databaseError(const std::string& path, const Connection& connect
                ? failure(ExitStatus::malformed,
                          base::concat(path, ": not a database of kstd's events"))
                : failure(statusOfCode(code),
-                         base::concat(path, ": ", connection.message(), " (", code, ')'));
+                         base::concat(path, ": ", connection.message(code), " (", code, ')'));
 }
 
 Query::Query(Connection& connection, const char* SQL) {

@@ -32,8 +32,8 @@ class Connection {
 
     [[nodiscard]] int execute(const char* SQL) const;
 
-    /// SQLite's own words for the last failure.
-    [[nodiscard]] std::string message() const;
+    /// SQLite's own words for a failure, as exact as they still are to be had.
+    [[nodiscard]] std::string message(int code) const;
 
     [[nodiscard]] sqlite3* get() const { return db_.get(); }
 

@@ -5,6 +5,7 @@
 #include "kstctl/ExitStatus.h"
 #include "kstctl/Forms.h"
 #include "kstctl/database/EventText.h"
+#include "kstctl/database/UploadDate.h"
 #include "platform/linux/LinuxPropertyLists.h"
 #include "tests/kstd/Analytics/SQLite/OtherConnection.h"
 #include "tests/kstd/Analytics/SQLite/SmallDisk.h"
@@ -237,6 +238,35 @@ TEST_F(EventDatabaseTest, IndexWithHolesOnAFullDisk) {
               }),
               0);
     writer.kill();
+}
+
+TEST_F(EventDatabaseTest, DateStoredOnADiskThatIsShort) {
+    const kstd::SmallDisk disk(directory.file("disk"), kstd::SmallDisk::Blocks::ofOneKiB);
+    if (!disk.isMounted()) {
+        GTEST_SKIP() << "mounting a file system from a file needs root, mkfs.ext4 and a loop "
+                        "device";
+    }
+    path = disk.file("events.db");
+    make({"a"});
+    int refused = 0;
+    for (std::uint64_t free = 0; free <= 64; free += 4) {
+        SCOPED_TRACE(std::to_string(free) + " KiB free");
+        disk.leaveFree(free * 1024);
+        const int status = support::exitStatusOfChild([this] {
+            const auto stored = storeUploadDate(path, platform::Timestamp{0}, kNoPatience);
+            if (stored) {
+                return 0;
+            }
+            EXPECT_EQ(stored.error().description, path + ": database or disk is full (13)");
+            EXPECT_EQ(statusOf(stored.error()), ExitStatus::failed);
+            return HasFailure() ? 1 : 2;
+        });
+        ASSERT_TRUE(status == 0 || status == 2) << status;
+        refused += status == 2 ? 1 : 0;
+        disk.makeRoom();
+    }
+    EXPECT_GT(refused, 1);
+    EXPECT_LT(refused, 17);
 }
 
 TEST_F(EventDatabaseTest, WritersThatComeAndGo) {

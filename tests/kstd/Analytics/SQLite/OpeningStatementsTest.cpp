@@ -21,7 +21,7 @@ class NewConnections {
     NewConnections(const NewConnections&) = delete;
     NewConnections& operator=(const NewConnections&) = delete;
     ~NewConnections() {
-        sqlite3_cancel_auto_extension(reinterpret_cast<void (*)()>(hand));
+        sqlite3_reset_auto_extension();
         prepare_ = nullptr;
     }
 
