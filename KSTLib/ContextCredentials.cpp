@@ -4,8 +4,8 @@
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
 #include "KSTLib/TemporaryContext.h"
+#include "common/AssertLine.h"
 #include "common/CredentialCommands.h"
-#include "common/RequiredArguments.h"
 #include "common/WipedBytes.h"
 
 #include <algorithm>
@@ -40,7 +40,7 @@ KSTStatus removeByNumber(std::uint32_t code, KSTContextRef context, std::uint32_
 /// The kernel service's no is a status too. The size of the reply is not looked at.
 KSTStatus isContained(std::uint32_t code, KSTContextRef context, std::uint32_t number,
                       std::uint32_t argument) {
-    KSTStatus err = kst::requireArguments(kst::libraryContext(), {{context, "context"}});
+    KSTStatus err = kst::libraryContext().requireArguments({kst::Argument(context, "context")});
     if (err == kKSTErrorSuccess) {
         err = kst::openChannel();
     }
@@ -59,7 +59,8 @@ KSTStatus isContained(std::uint32_t code, KSTContextRef context, std::uint32_t n
 }
 
 KSTStatus addGlobally(const KSTCredential* credential) {
-    KSTStatus err = kst::requireArguments(kst::libraryContext(), {{credential, "credential"}});
+    KSTStatus err =
+        kst::libraryContext().requireArguments({kst::Argument(credential, "credential")});
     kst::TemporaryContext context;
     if (err == kKSTErrorSuccess) {
         err = context.create();

@@ -4,11 +4,12 @@
 #include "KSTLib/Command.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
-#include "base/ByteReader.h"
 #include "common/Allocation.h"
+#include "common/AssertLine.h"
 #include "common/ContextObject.h"
-#include "common/RequiredArguments.h"
 #include "common/RequiredFunction.h"
+
+#include <algorithm>
 
 namespace {
 
@@ -36,7 +37,7 @@ KSTStatus requestContext(std::uint8_t* reply) {
 }
 
 KSTStatus create(const char* function, KSTContextRef* context) {
-    KSTStatus err = kst::requireArguments(kst::libraryContext(), {{context, "context"}});
+    KSTStatus err = kst::libraryContext().requireArguments({kst::Argument(context, "context")});
     if (err == kKSTErrorSuccess) {
         err = kst::openChannel();
     }
@@ -58,25 +59,25 @@ KSTStatus create(const char* function, KSTContextRef* context) {
     return kKSTErrorSuccess;
 }
 
-/// Reads the reply to the external form: whether there is such a context, and the log level.
+/// Reads the reply to the external form: whether there is such a context, and the log level. It is
+/// looked at where it is, byte by byte, so that no copy of it stays on the stack.
 KSTStatus readOpenReply(const kst::AllocatedMemory& reply, const void* externalForm,
                         KSTContextRef& context) {
-    base::ByteReader reader(reply.bytes(), reply.size());
-    std::uint32_t exists = 0;
-    std::uint8_t level = 0;
-    static_cast<void>(reader.readU32(exists) && reader.readU8(level));
-    if (exists != 0) {
+    const std::uint8_t* const exists = reply.bytes();
+    const std::uint8_t* const level = exists + sizeof(std::uint32_t);
+    if (std::any_of(exists, level, [](std::uint8_t byte) { return byte != 0; })) {
         context = kst::makeContext(externalForm);
         if (context == nullptr) {
             return kst::fail(kst::libraryContext(), "ref", 0, kKSTErrorOutOfMemory);
         }
     }
-    kst::gLogLevel = level;
+    kst::gLogLevel = *level;
     return kKSTErrorSuccess;
 }
 
 KSTStatus open(const void* externalForm, std::size_t dataLength, KSTContextRef& context) {
-    KSTStatus err = kst::requireArguments(kst::libraryContext(), {{externalForm, "externalForm"}});
+    KSTStatus err =
+        kst::libraryContext().requireArguments({kst::Argument(externalForm, "externalForm")});
     if (err == kKSTErrorSuccess && dataLength != kKSTHandleSize) {
         err = kst::fail(kst::libraryContext(), "dataLength == sizeof(KSTHandle)", 0,
                         kKSTErrorBadParameter);
@@ -114,7 +115,7 @@ KSTStatus sendHandle(std::uint32_t code, KSTContextRef context) {
 }
 
 KSTStatus deleteContext(KSTContextRef context, bool destroy) {
-    KSTStatus err = kst::requireArguments(kst::libraryContext(), {{context, "context"}});
+    KSTStatus err = kst::libraryContext().requireArguments({kst::Argument(context, "context")});
     if (err == kKSTErrorSuccess && destroy) {
         err = sendHandle(kKSTCommandContextDelete, context);
     }
@@ -125,7 +126,7 @@ KSTStatus deleteContext(KSTContextRef context, bool destroy) {
 }
 
 KSTStatus getExternalForm(KSTContextRef context, const KSTDataBlock& processExternalForm) {
-    KSTStatus err = kst::requireArguments(kst::libraryContext(), {{context, "context"}});
+    KSTStatus err = kst::libraryContext().requireArguments({kst::Argument(context, "context")});
     if (err == kKSTErrorSuccess) {
         err = kst::requireBlock(kst::libraryContext(), processExternalForm, "processExternalForm");
     }

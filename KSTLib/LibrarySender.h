@@ -12,9 +12,9 @@ namespace kst {
 }
 
 /// `init`, with a failure reported by the caller's line too.
-[[nodiscard]] inline KSTStatus openChannel(int line = __builtin_LINE()) noexcept {
+[[nodiscard]] inline KSTStatus openChannel(CheckPlace place = CheckPlace::here()) noexcept {
     const KSTStatus err = init();
-    return err == kKSTErrorSuccess ? err : failCall(libraryContext(), err, line);
+    return err == kKSTErrorSuccess ? err : failCall(libraryContext(), err, place);
 }
 
 /// `updateLogLevel`, unless there is no connection to ask over.

@@ -4,8 +4,8 @@
 #include "KSTLib/LibrarySender.h"
 #include "KSTLib/RequirementSerialization.h"
 #include "KSTLib/TemporaryContext.h"
+#include "common/AssertLine.h"
 #include "common/PolicyCommands.h"
-#include "common/RequiredArguments.h"
 #include "common/RequiredFunction.h"
 
 #include <limits>
@@ -15,8 +15,8 @@ namespace {
 constexpr std::uint32_t kAnyAge = std::numeric_limits<std::uint32_t>::max();
 
 template <typename Block>
-KSTStatus requireBlock(const Block& block, int line = __builtin_LINE()) {
-    return kst::requireBlock(kst::libraryContext(), block, "processRequirement", line);
+KSTStatus requireBlock(const Block& block, kst::CheckPlace place = kst::CheckPlace::here()) {
+    return kst::requireBlock(kst::libraryContext(), block, "processRequirement", place);
 }
 
 /// Context and policy are there.
@@ -42,8 +42,10 @@ KSTStatus verifyAclConstraintInternal(const kst::PolicyQuestion& question,
 template <typename Block>
 KSTStatus verifyPolicy(const kst::PolicyQuestion& question, const char* policyId,
                        const Block& block, kst::PolicyAnswer& answer) {
-    KSTStatus err = kst::requireArguments(kst::libraryContext(),
-                                          {{question.context, "context"}, {policyId, "policyId"}});
+    KSTStatus err = kst::libraryContext().requireArguments({
+        kst::Argument(question.context, "context"),
+        kst::Argument(policyId, "policyId"),
+    });
     if (err == kKSTErrorSuccess) {
         err = requireBlock(block);
     }
@@ -53,7 +55,8 @@ KSTStatus verifyPolicy(const kst::PolicyQuestion& question, const char* policyId
 KSTStatus verifyAclConstraint(const kst::PolicyQuestion& question, const void* aclConstraint,
                               std::size_t length, const KSTPolicyStatusBlock& block,
                               kst::PolicyAnswer& answer) {
-    KSTStatus err = kst::requireArguments(kst::libraryContext(), {{question.context, "context"}});
+    KSTStatus err =
+        kst::libraryContext().requireArguments({kst::Argument(question.context, "context")});
     if (err == kKSTErrorSuccess && (aclConstraint == nullptr || length == 0)) {
         err = kst::fail(kst::libraryContext(), "aclConstraint && aclConstraintLength", 0,
                         kKSTErrorBadParameter);

@@ -10,8 +10,8 @@ namespace {
 
 KSTStatus getProperties(const KSTRequirement* requirement,
                         const KSTPropertyBlock& processProperty) {
-    const KSTStatus err = kst::requireObjectAndBlock({requirement, "requirement"}, processProperty,
-                                                     "processProperty");
+    const KSTStatus err = kst::requireObjectAndBlock(kst::Argument(requirement, "requirement"),
+                                                     processProperty, "processProperty");
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -26,7 +26,7 @@ KSTStatus getProperties(const KSTRequirement* requirement,
 
 void getSubrequirements(const KSTRequirement* requirement,
                         const KSTRequirementBlock& processSubrequirement) {
-    if (kst::requireObjectAndBlock({requirement, "requirement"}, processSubrequirement,
+    if (kst::requireObjectAndBlock(kst::Argument(requirement, "requirement"), processSubrequirement,
                                    "processSubrequirement") != kKSTErrorSuccess) {
         return;
     }

@@ -11,9 +11,9 @@ TemporaryContext::~TemporaryContext() {
     }
 }
 
-KSTStatus TemporaryContext::create(int line) noexcept {
+KSTStatus TemporaryContext::create(CheckPlace place) noexcept {
     const KSTStatus err = KSTContextCreate(&context_);
-    return err == kKSTErrorSuccess ? err : failCall(libraryContext(), err, line);
+    return err == kKSTErrorSuccess ? err : failCall(libraryContext(), err, place);
 }
 
 } // namespace kst

@@ -2,6 +2,7 @@
 
 #include "KSTLib/Context.h"
 #include "KSTLib/Status.h"
+#include "common/AssertLine.h"
 
 namespace kst {
 
@@ -15,7 +16,7 @@ class TemporaryContext {
     ~TemporaryContext();
 
     /// What KSTContextCreate fails with, reported by the caller's line too. To be called once.
-    [[nodiscard]] KSTStatus create(int line = __builtin_LINE()) noexcept;
+    [[nodiscard]] KSTStatus create(CheckPlace place = CheckPlace::here()) noexcept;
 
     [[nodiscard]] KSTContextRef get() const { return context_; }
 

@@ -8,6 +8,8 @@ target_include_directories(kstd_options INTERFACE "${CMAKE_SOURCE_DIR}")
 target_compile_options(kstd_options INTERFACE
     -Wall -Wextra -Wpedantic -Werror
     -Wshadow -Wconversion -Wsign-conversion -Wformat=2 -Wcast-align -Wundef
+    # Sources call themselves by their names in the tree, in log lines too.
+    "-fmacro-prefix-map=${CMAKE_SOURCE_DIR}/="
     $<$<COMPILE_LANGUAGE:CXX>:-Wold-style-cast -Woverloaded-virtual -Wnon-virtual-dtor>
     # What is unique to the process cannot be hidden in the static library.
     $<$<COMPILE_LANG_AND_ID:CXX,GNU>:-fno-gnu-unique>)

@@ -18,20 +18,20 @@ class BuiltPayload {
     /// that to what it wrote, which may be less. What they fail with is reported through `context`
     /// and returned; kKSTErrorOutOfMemory.
     template <typename Size, typename Measure, typename Write>
-    [[nodiscard]] KSTStatus build(const AssertionContext& context, Measure measure, Write write,
-                                  int line = __builtin_LINE()) noexcept {
+    [[nodiscard]] KSTStatus build(const AssertionContext& context, Measure measure,
+                                  Write write) noexcept {
         Size size = 0;
         KSTStatus err = measure(&size);
         if (err != kKSTErrorSuccess) {
-            return failCall(context, err, line);
+            return failCall(context, err);
         }
         memory_.emplace(size);
         if (memory_->bytes() == nullptr) {
-            return fail(context, "inputBuffer", 0, kKSTErrorOutOfMemory, line);
+            return fail(context, "inputBuffer", 0, kKSTErrorOutOfMemory);
         }
         err = write(memory_->bytes(), &size);
         if (err != kKSTErrorSuccess) {
-            return failCall(context, err, line);
+            return failCall(context, err);
         }
         size_ = size;
         return kKSTErrorSuccess;

@@ -19,9 +19,9 @@ struct CommandSender {
     /// returned.
     [[nodiscard]] KSTStatus send(std::uint32_t code, const void* inData, std::size_t inSize,
                                  void* outData, std::size_t* outSize,
-                                 int line = __builtin_LINE()) const {
+                                 CheckPlace place = CheckPlace::here()) const {
         const KSTStatus err = transport(nullptr, code, 0, inData, inSize, outData, outSize);
-        return err == kKSTErrorSuccess ? err : failCall(context, err, line);
+        return err == kKSTErrorSuccess ? err : failCall(context, err, place);
     }
 };
 

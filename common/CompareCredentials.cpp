@@ -1,6 +1,6 @@
 #include "KSTLib/CredentialSerialization.h"
+#include "common/AssertLine.h"
 #include "common/CredentialTypes.h"
-#include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
 
 #include <algorithm>
@@ -81,8 +81,11 @@ std::uint8_t CompareDataBlobs(const void* data1, std::size_t length1, const void
 KSTStatus CompareCredentials(const KSTCredential* credential1, const KSTCredential* credential2,
                              std::uint8_t* outEqual) noexcept {
     const kst::AssertionContext context = kst::serializationContext();
-    const KSTStatus err = kst::requireArguments(
-        context, {{credential1, "credential1"}, {credential2, "credential2"}, {outEqual, "equal"}});
+    const KSTStatus err = context.requireArguments({
+        kst::Argument(credential1, "credential1"),
+        kst::Argument(credential2, "credential2"),
+        kst::Argument(outEqual, "equal"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }

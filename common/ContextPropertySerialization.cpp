@@ -1,7 +1,7 @@
 #include "KSTLib/ContextPropertySerialization.h"
 
+#include "common/AssertLine.h"
 #include "common/HandleWire.h"
-#include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
 #include "common/WriterRoom.h"
 
@@ -16,7 +16,8 @@ constexpr std::size_t kSize = kKSTHandleSize + sizeof(KSTContextProperty);
 KSTStatus GetSerializedGetContextPropertySize(const KSTHandle* /*handle*/,
                                               KSTContextProperty /*property*/,
                                               std::size_t* outSize) noexcept {
-    const KSTStatus err = kst::requireArguments(serializationContext(), {{outSize, "outSize"}});
+    const KSTStatus err =
+        serializationContext().requireArguments({kst::Argument(outSize, "outSize")});
     if (err == kKSTErrorSuccess) {
         *outSize = kSize;
     }
@@ -25,9 +26,11 @@ KSTStatus GetSerializedGetContextPropertySize(const KSTHandle* /*handle*/,
 
 KSTStatus SerializeGetContextProperty(const KSTHandle* handle, KSTContextProperty property,
                                       void* outBuffer, std::size_t* outSize) noexcept {
-    const KSTStatus err =
-        kst::requireArguments(serializationContext(),
-                              {{handle, "handle"}, {outBuffer, "outBuffer"}, {outSize, "outSize"}});
+    const KSTStatus err = serializationContext().requireArguments({
+        kst::Argument(handle, "handle"),
+        kst::Argument(outBuffer, "outBuffer"),
+        kst::Argument(outSize, "outSize"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -41,9 +44,11 @@ KSTStatus SerializeGetContextProperty(const KSTHandle* handle, KSTContextPropert
 
 KSTStatus DeserializeGetContextProperty(const void* buffer, std::size_t size, KSTHandle* outHandle,
                                         KSTContextProperty* outProperty) noexcept {
-    const KSTStatus err = kst::requireArguments(
-        serializationContext(),
-        {{buffer, "buffer"}, {outHandle, "handle"}, {outProperty, "property"}});
+    const KSTStatus err = serializationContext().requireArguments({
+        kst::Argument(buffer, "buffer"),
+        kst::Argument(outHandle, "handle"),
+        kst::Argument(outProperty, "property"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }

@@ -1,8 +1,8 @@
 #include "KSTLib/CredentialCommandSerialization.h"
 
 #include "KSTLib/CredentialSerialization.h"
+#include "common/AssertLine.h"
 #include "common/HandleWire.h"
-#include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
 #include "common/WriterRoom.h"
 
@@ -21,8 +21,8 @@ KSTStatus checkScope(const KSTHandle* handle, KSTScope scope) {
 }
 
 /// What the functions that are the Add functions under another name return.
-KSTStatus passUp(KSTStatus err, int line = __builtin_LINE()) {
-    return err == kKSTErrorSuccess ? err : kst::failCall(serializationContext(), err, line);
+KSTStatus passUp(KSTStatus err, kst::CheckPlace place = kst::CheckPlace::here()) {
+    return err == kKSTErrorSuccess ? err : kst::failCall(serializationContext(), err, place);
 }
 
 } // namespace
@@ -31,8 +31,10 @@ KSTStatus GetSerializedAddCredentialSize(const KSTHandle* handle, const KSTCrede
                                          KSTScope scope, std::size_t* outSize) noexcept {
     KSTStatus err = checkScope(handle, scope);
     if (err == kKSTErrorSuccess) {
-        err = kst::requireArguments(serializationContext(),
-                                    {{credential, "credential"}, {outSize, "outSize"}});
+        err = serializationContext().requireArguments({
+            kst::Argument(credential, "credential"),
+            kst::Argument(outSize, "outSize"),
+        });
     }
     if (err != kKSTErrorSuccess) {
         return err;
@@ -51,8 +53,11 @@ KSTStatus SerializeAddCredential(const KSTHandle* handle, const KSTCredential* c
     const kst::AssertionContext context = serializationContext();
     KSTStatus err = checkScope(handle, scope);
     if (err == kKSTErrorSuccess) {
-        err = kst::requireArguments(
-            context, {{credential, "credential"}, {outBuffer, "outBuffer"}, {outSize, "outSize"}});
+        err = context.requireArguments({
+            kst::Argument(credential, "credential"),
+            kst::Argument(outBuffer, "outBuffer"),
+            kst::Argument(outSize, "outSize"),
+        });
     }
     if (err != kKSTErrorSuccess) {
         return err;
@@ -83,15 +88,18 @@ KSTStatus SerializeAddCredential(const KSTHandle* handle, const KSTCredential* c
 KSTStatus DeserializeAddCredential(const void* buffer, std::size_t size, KSTHandle* outHandle,
                                    KSTCredential** outCredential, KSTScope* outScope) noexcept {
     const kst::AssertionContext context = serializationContext();
-    KSTStatus err = kst::requireArguments(context, {{buffer, "buffer"}});
+    KSTStatus err = context.requireArguments({kst::Argument(buffer, "buffer")});
     if (err == kKSTErrorSuccess && size < kSmallestSize) {
         err = kst::fail(context,
                         "size >= sizeof(KSTHandle) + sizeof(KSTCredential) + sizeof(KSTScope)", 0,
                         kKSTErrorBadParameter);
     }
     if (err == kKSTErrorSuccess) {
-        err = kst::requireArguments(
-            context, {{outHandle, "handle"}, {outCredential, "credential"}, {outScope, "scope"}});
+        err = context.requireArguments({
+            kst::Argument(outHandle, "handle"),
+            kst::Argument(outCredential, "credential"),
+            kst::Argument(outScope, "scope"),
+        });
     }
     if (err != kKSTErrorSuccess) {
         return err;

@@ -1,7 +1,7 @@
 #include "KSTLib/CredentialSerialization.h"
 #include "base/ByteReader.h"
 #include "common/Allocation.h"
-#include "common/RequiredArguments.h"
+#include "common/AssertLine.h"
 #include "common/SerializationContext.h"
 
 #include <cstring>
@@ -53,8 +53,10 @@ KSTStatus SerializeCredentialList(KSTCredential* const* credentialList, std::uin
     if (credentialList == nullptr && count != 0) {
         return kst::fail(context, "credentialList || (count == 0)", 0, kKSTErrorBadParameter);
     }
-    KSTStatus err =
-        kst::requireArguments(context, {{outBuffer, "outBuffer"}, {outSize, "outSize"}});
+    KSTStatus err = context.requireArguments({
+        kst::Argument(outBuffer, "outBuffer"),
+        kst::Argument(outSize, "outSize"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -72,8 +74,11 @@ KSTStatus DeserializeCredentialList(const void* buffer, std::size_t size,
                                     KSTCredential*** outCredentialList,
                                     std::uint32_t* outCount) noexcept {
     const kst::AssertionContext context = kst::serializationContext();
-    KSTStatus err = kst::requireArguments(
-        context, {{buffer, "buffer"}, {outCredentialList, "credentialList"}, {outCount, "count"}});
+    KSTStatus err = context.requireArguments({
+        kst::Argument(buffer, "buffer"),
+        kst::Argument(outCredentialList, "credentialList"),
+        kst::Argument(outCount, "count"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }

@@ -2,8 +2,8 @@
 
 #include "base/ByteReader.h"
 #include "common/Allocation.h"
+#include "common/AssertLine.h"
 #include "common/CredentialTypes.h"
-#include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
 
 #include <cstring>
@@ -55,16 +55,21 @@ KSTStatus checkHeader(const void* buffer, std::size_t size, std::uint32_t& dataL
 
 KSTStatus GetSerializedCredentialSize(const KSTCredential* credential,
                                       std::size_t* outSize) noexcept {
-    const KSTStatus err = kst::requireArguments(kst::serializationContext(),
-                                                {{credential, "credential"}, {outSize, "outSize"}});
+    const KSTStatus err = kst::serializationContext().requireArguments({
+        kst::Argument(credential, "credential"),
+        kst::Argument(outSize, "outSize"),
+    });
     return err == kKSTErrorSuccess ? measure(credential, *outSize) : err;
 }
 
 KSTStatus SerializeCredential(const KSTCredential* credential, void* outBuffer,
                               std::size_t* outSize) noexcept {
     const kst::AssertionContext context = kst::serializationContext();
-    KSTStatus err = kst::requireArguments(
-        context, {{credential, "credential"}, {outBuffer, "outBuffer"}, {outSize, "outSize"}});
+    KSTStatus err = context.requireArguments({
+        kst::Argument(credential, "credential"),
+        kst::Argument(outBuffer, "outBuffer"),
+        kst::Argument(outSize, "outSize"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -84,9 +89,11 @@ KSTStatus SerializeCredential(const KSTCredential* credential, void* outBuffer,
 KSTStatus DeserializeCredential(const void* buffer, std::size_t size, KSTCredential** outCredential,
                                 std::size_t* consumedBytes) noexcept {
     const kst::AssertionContext context = kst::serializationContext();
-    KSTStatus err = kst::requireArguments(
-        context,
-        {{buffer, "buffer"}, {outCredential, "credential"}, {consumedBytes, "consumedBytes"}});
+    KSTStatus err = context.requireArguments({
+        kst::Argument(buffer, "buffer"),
+        kst::Argument(outCredential, "credential"),
+        kst::Argument(consumedBytes, "consumedBytes"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -112,8 +119,10 @@ KSTStatus DeserializeCredential(const void* buffer, std::size_t size, KSTCredent
 
 KSTStatus CopyCredential(const KSTCredential* credential, KSTCredential** outCopy) noexcept {
     const kst::AssertionContext context = kst::serializationContext();
-    const KSTStatus err =
-        kst::requireArguments(context, {{credential, "credential"}, {outCopy, "copy"}});
+    const KSTStatus err = context.requireArguments({
+        kst::Argument(credential, "credential"),
+        kst::Argument(outCopy, "copy"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }

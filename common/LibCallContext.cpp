@@ -1,11 +1,11 @@
 #include "KSTLib/LibCallContext.h"
 
 #include "KSTLib/Command.h"
+#include "common/AssertLine.h"
 #include "common/ContextObject.h"
 #include "common/CredentialCommands.h"
 #include "common/LibCallReport.h"
 #include "common/PolicyCommands.h"
-#include "common/RequiredArguments.h"
 #include "common/RequiredFunction.h"
 #include "common/WipedBytes.h"
 
@@ -22,7 +22,7 @@ KSTStatus checkTransport(const kst::CommandSender& sender) {
 KSTStatus create(const kst::CommandSender& sender, KSTContextRef* context, std::uint8_t* logLevel) {
     KSTStatus err = checkTransport(sender);
     if (err == kKSTErrorSuccess) {
-        err = kst::requireArguments(sender.context, {{context, "context"}});
+        err = sender.context.requireArguments({kst::Argument(context, "context")});
     }
     if (err != kKSTErrorSuccess) {
         return err;
@@ -50,7 +50,7 @@ KSTStatus create(const kst::CommandSender& sender, KSTContextRef* context, std::
 KSTStatus deleteContext(const kst::CommandSender& sender, KSTContextRef context, bool destroy) {
     KSTStatus err = checkTransport(sender);
     if (err == kKSTErrorSuccess) {
-        err = kst::requireArguments(sender.context, {{context, "context"}});
+        err = sender.context.requireArguments({kst::Argument(context, "context")});
     }
     if (err == kKSTErrorSuccess && destroy) {
         err = sender.send(kKSTCommandContextDelete, context->handle.bytes, kKSTHandleSize, nullptr,
@@ -92,7 +92,7 @@ KSTStatus checkPolicyArguments(const kst::CommandSender& sender,
                                const bool* policySatisfied) {
     KSTStatus err = checkTransport(sender);
     if (err == kKSTErrorSuccess) {
-        err = kst::requireArguments(sender.context, {{question.context, "context"}});
+        err = sender.context.requireArguments({kst::Argument(question.context, "context")});
     }
     if (err == kKSTErrorSuccess &&
         (question.parametersCount > 0) != (question.parameters != nullptr)) {
@@ -102,8 +102,10 @@ KSTStatus checkPolicyArguments(const kst::CommandSender& sender,
                         0, kKSTErrorBadParameter);
     }
     if (err == kKSTErrorSuccess) {
-        err = kst::requireArguments(sender.context,
-                                    {{policyId, "policyId"}, {policySatisfied, "policySatisfied"}});
+        err = sender.context.requireArguments({
+            kst::Argument(policyId, "policyId"),
+            kst::Argument(policySatisfied, "policySatisfied"),
+        });
     }
     return err;
 }

@@ -2,10 +2,10 @@
 
 #include "KSTLib/CredentialSerialization.h"
 #include "common/Allocation.h"
+#include "common/AssertLine.h"
 #include "common/CredentialProperties.h"
 #include "common/CredentialTypes.h"
 #include "common/LibCallReport.h"
-#include "common/RequiredArguments.h"
 
 #include <cstring>
 #include <string.h>
@@ -118,9 +118,11 @@ bool isZero(const std::uint8_t* bytes, std::size_t length) {
 
 KSTStatus getPropertyData(const KSTCredential* credential, std::uint32_t propertyId,
                           const void** data, std::size_t* dataLength) {
-    KSTStatus err = kst::requireArguments(
-        assertionContext(),
-        {{credential, "credential"}, {data, "data"}, {dataLength, "dataLength"}});
+    KSTStatus err = assertionContext().requireArguments({
+        kst::Argument(credential, "credential"),
+        kst::Argument(data, "data"),
+        kst::Argument(dataLength, "dataLength"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }

@@ -1,8 +1,8 @@
 #include "KSTLib/LibCallRequirement.h"
 
 #include "KSTLib/RequirementSerialization.h"
+#include "common/AssertLine.h"
 #include "common/LibCallReport.h"
-#include "common/RequiredArguments.h"
 #include "common/RequiredFunction.h"
 #include "common/RequirementProperties.h"
 
@@ -15,7 +15,8 @@ kst::AssertionContext assertionContext() {
 /// A member of the header; 0 when there is none.
 std::uint32_t headerWord(const KSTRequirement* requirement,
                          const std::uint32_t KSTRequirement::*word) {
-    const KSTStatus err = kst::requireArguments(assertionContext(), {{requirement, "requirement"}});
+    const KSTStatus err =
+        assertionContext().requireArguments({kst::Argument(requirement, "requirement")});
     return err == kKSTErrorSuccess ? requirement->*word : 0;
 }
 
@@ -40,8 +41,11 @@ KSTStatus getPropertyData(const KSTRequirement* requirement, std::uint32_t prope
                           const void** data, std::size_t* dataLength) {
     const kst::AssertionContext context = assertionContext();
     // The pointer and the length are one output to the check.
-    KSTStatus err = kst::requireArguments(
-        context, {{requirement, "requirement"}, {data, "data"}, {dataLength, "data"}});
+    KSTStatus err = context.requireArguments({
+        kst::Argument(requirement, "requirement"),
+        kst::Argument(data, "data"),
+        kst::Argument(dataLength, "data"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -63,7 +67,7 @@ KSTStatus getPropertyData(const KSTRequirement* requirement, std::uint32_t prope
 KSTStatus deleteRequirement(KSTTransport transport, KSTRequirement* requirement) {
     KSTStatus err = kst::requireFunction(assertionContext(), transport, "transport");
     if (err == kKSTErrorSuccess) {
-        err = kst::requireArguments(assertionContext(), {{requirement, "requirement"}});
+        err = assertionContext().requireArguments({kst::Argument(requirement, "requirement")});
     }
     if (err == kKSTErrorSuccess) {
         DeallocRequirement(requirement);

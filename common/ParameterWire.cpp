@@ -2,7 +2,7 @@
 
 #include "KSTLib/ParameterSerialization.h"
 #include "common/Allocation.h"
-#include "common/RequiredArguments.h"
+#include "common/AssertLine.h"
 #include "common/SerializationContext.h"
 
 #include <utility>
@@ -40,10 +40,11 @@ KSTStatus measureParameters(const KSTParameter* parameters, std::uint32_t parame
 KSTStatus checkWriter(const KSTParameter* parameters, std::uint32_t parametersCount,
                       const void* outBuffer, const void* outSize) noexcept {
     const KSTStatus err = checkParameterList(parameters, parametersCount);
-    return err != kKSTErrorSuccess
-               ? err
-               : requireArguments(serializationContext(),
-                                  {{outBuffer, "outBuffer"}, {outSize, "outSize"}});
+    return err != kKSTErrorSuccess ? err
+                                   : serializationContext().requireArguments({
+                                         Argument(outBuffer, "outBuffer"),
+                                         Argument(outSize, "outSize"),
+                                     });
 }
 
 KSTStatus checkParameters(const KSTParameter* parameters, std::uint32_t parametersCount) noexcept {

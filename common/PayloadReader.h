@@ -4,8 +4,8 @@
 #include "KSTLib/Parameter.h"
 #include "KSTLib/Status.h"
 #include "base/ByteReader.h"
+#include "common/AssertLine.h"
 #include "common/ParameterWire.h"
-#include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
 
 #include <cstddef>
@@ -35,18 +35,21 @@ class PayloadReader {
     /// other places. Then stores the handle, which stays whatever comes. kKSTErrorBadParameter: one
     /// is null, or the handle is not there.
     template <std::size_t Count>
-    [[nodiscard]] KSTStatus begin(const RequiredArgument (&own)[Count]) noexcept {
+    [[nodiscard]] KSTStatus begin(const Argument (&own)[Count]) noexcept {
         const AssertionContext context = serializationContext();
-        KSTStatus err =
-            requireArguments(context, {{buffer_, "buffer"}, {outputs_.handle, "handle"}});
+        KSTStatus err = context.requireArguments({
+            Argument(buffer_, "buffer"),
+            Argument(outputs_.handle, "handle"),
+        });
         if (err == kKSTErrorSuccess) {
-            err = requireArguments(context, own);
+            err = context.requireArguments(own);
         }
         if (err == kKSTErrorSuccess) {
-            err = requireArguments(context,
-                                   {{outputs_.maxGlobalCredentialAge, "maxGlobalCredentialAge"},
-                                    {outputs_.parameters, "parameters"},
-                                    {outputs_.parametersCount, "parametersCount"}});
+            err = context.requireArguments({
+                Argument(outputs_.maxGlobalCredentialAge, "maxGlobalCredentialAge"),
+                Argument(outputs_.parameters, "parameters"),
+                Argument(outputs_.parametersCount, "parametersCount"),
+            });
         }
         return err == kKSTErrorSuccess ? readHandle() : err;
     }

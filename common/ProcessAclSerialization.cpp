@@ -1,10 +1,10 @@
 #include "KSTLib/ProcessAclSerialization.h"
 
+#include "common/AssertLine.h"
 #include "common/HandleWire.h"
 #include "common/ParameterWire.h"
 #include "common/PayloadReader.h"
 #include "common/ReceivedBlob.h"
-#include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
 #include "common/WriterRoom.h"
 
@@ -59,7 +59,7 @@ KSTStatus GetSerializedProcessAclSize(const KSTHandle* /*handle*/, const void* a
                                       std::uint32_t* outSize) noexcept {
     KSTStatus err = checkAcl(acl, aclLength);
     if (err == kKSTErrorSuccess) {
-        err = kst::requireArguments(serializationContext(), {{outSize, "outSize"}});
+        err = serializationContext().requireArguments({kst::Argument(outSize, "outSize")});
     }
     if (err == kKSTErrorSuccess) {
         err = kst::checkParameterList(parameters, parametersCount);
@@ -121,10 +121,12 @@ KSTStatus DeserializeProcessAcl(const void* buffer, std::uint32_t size, KSTHandl
     kst::ReceivedBlob operation;
     kst::PayloadReader payload(
         buffer, size, {outHandle, outMaxGlobalCredentialAge, outParameters, outParametersCount});
-    KSTStatus err = payload.begin({{outAcl, "acl"},
-                                   {outAclLength, "aclLength"},
-                                   {outOperation, "operation"},
-                                   {outOperationLength, "operationLength"}});
+    KSTStatus err = payload.begin({
+        kst::Argument(outAcl, "acl"),
+        kst::Argument(outAclLength, "aclLength"),
+        kst::Argument(outOperation, "operation"),
+        kst::Argument(outOperationLength, "operationLength"),
+    });
     if (err == kKSTErrorSuccess) {
         err = acl.readWithLength(payload.rest(), "tmpAcl", "(size - offset) >= tmpAclLength");
     }

@@ -12,30 +12,30 @@ ReceivedBlob::~ReceivedBlob() {
 }
 
 KSTStatus ReceivedBlob::read(base::ByteReader& reader, std::size_t length, const char* memoryCheck,
-                             const char* sizeCheck, int line) noexcept {
+                             const char* sizeCheck) noexcept {
     if (length == 0) {
         return kKSTErrorSuccess;
     }
     bytes_ = static_cast<std::uint8_t*>(allocate(length));
     if (bytes_ == nullptr) {
-        return fail(serializationContext(), memoryCheck, 0, kKSTErrorOutOfMemory, line);
+        return fail(serializationContext(), memoryCheck, 0, kKSTErrorOutOfMemory);
     }
     length_ = length;
     if (!reader.readBytes(bytes_, length)) {
-        return fail(serializationContext(), sizeCheck, 0, kKSTErrorBadParameter, line);
+        return fail(serializationContext(), sizeCheck, 0, kKSTErrorBadParameter);
     }
     written_ = length;
     return kKSTErrorSuccess;
 }
 
 KSTStatus ReceivedBlob::readWithLength(base::ByteReader& reader, const char* memoryCheck,
-                                       const char* sizeCheck, int line) noexcept {
+                                       const char* sizeCheck) noexcept {
     std::uint32_t length = 0;
     if (!reader.readU32(length)) {
         return fail(serializationContext(), "(size - offset) >= sizeof(uint32_t)", 0,
-                    kKSTErrorBadParameter, line);
+                    kKSTErrorBadParameter);
     }
-    return read(reader, length, memoryCheck, sizeCheck, line);
+    return read(reader, length, memoryCheck, sizeCheck);
 }
 
 std::uint8_t* ReceivedBlob::handOut() noexcept {

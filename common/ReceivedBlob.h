@@ -23,13 +23,11 @@ class ReceivedBlob {
     /// payload does not have costs address space only, because nothing is written then. To be
     /// called once.
     [[nodiscard]] KSTStatus read(base::ByteReader& reader, std::size_t length,
-                                 const char* memoryCheck, const char* sizeCheck,
-                                 int line = __builtin_LINE()) noexcept;
+                                 const char* memoryCheck, const char* sizeCheck) noexcept;
 
     /// Reads a 32-bit length, kKSTErrorBadParameter when it is not there, and then as `read`.
     [[nodiscard]] KSTStatus readWithLength(base::ByteReader& reader, const char* memoryCheck,
-                                           const char* sizeCheck,
-                                           int line = __builtin_LINE()) noexcept;
+                                           const char* sizeCheck) noexcept;
 
     [[nodiscard]] std::size_t length() const { return length_; }
 

@@ -1,8 +1,8 @@
 #include "KSTLib/RequirementSerialization.h"
 #include "base/ByteReader.h"
 #include "common/Allocation.h"
+#include "common/AssertLine.h"
 #include "common/LevelStack.h"
-#include "common/RequiredArguments.h"
 #include "common/RequirementLayout.h"
 #include "common/SerializationContext.h"
 
@@ -185,8 +185,10 @@ KSTStatus DeserializeRequirement(const void* buffer, std::size_t size,
     if (size < sizeof(KSTRequirement)) {
         return kst::fail(context, "size >= sizeof(KSTRequirement)", 0, kKSTErrorBadParameter);
     }
-    KSTStatus err = kst::requireArguments(
-        context, {{outRequirement, "requirement"}, {consumedBytes, "consumedBytes"}});
+    KSTStatus err = context.requireArguments({
+        kst::Argument(outRequirement, "requirement"),
+        kst::Argument(consumedBytes, "consumedBytes"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }

@@ -1,8 +1,8 @@
 #include "KSTLib/RequirementSerialization.h"
 
 #include "base/ByteWriter.h"
+#include "common/AssertLine.h"
 #include "common/LevelStack.h"
-#include "common/RequiredArguments.h"
 #include "common/RequirementLayout.h"
 #include "common/SerializationContext.h"
 
@@ -95,8 +95,10 @@ KSTStatus writeNode(const KSTRequirement* node, base::ByteWriter& writer) {
 
 KSTStatus GetSerializedRequirementSize(const KSTRequirement* requirement,
                                        std::size_t* outSize) noexcept {
-    KSTStatus err = kst::requireArguments(kst::serializationContext(),
-                                          {{requirement, "requirement"}, {outSize, "outSize"}});
+    KSTStatus err = kst::serializationContext().requireArguments({
+        kst::Argument(requirement, "requirement"),
+        kst::Argument(outSize, "outSize"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -112,8 +114,11 @@ KSTStatus GetSerializedRequirementSize(const KSTRequirement* requirement,
 KSTStatus SerializeRequirement(const KSTRequirement* requirement, void* buffer,
                                std::size_t* bufferSize) noexcept {
     const kst::AssertionContext context = kst::serializationContext();
-    KSTStatus err = kst::requireArguments(
-        context, {{requirement, "requirement"}, {buffer, "buffer"}, {bufferSize, "bufferSize"}});
+    KSTStatus err = context.requireArguments({
+        kst::Argument(requirement, "requirement"),
+        kst::Argument(buffer, "buffer"),
+        kst::Argument(bufferSize, "bufferSize"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }

@@ -1,10 +1,10 @@
 #include "KSTLib/VerifyAclSerialization.h"
 
+#include "common/AssertLine.h"
 #include "common/HandleWire.h"
 #include "common/ParameterWire.h"
 #include "common/PayloadReader.h"
 #include "common/ReceivedBlob.h"
-#include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
 #include "common/WriterRoom.h"
 
@@ -34,8 +34,10 @@ GetSerializedVerifyAclConstraintSize(const KSTHandle* /*handle*/, const void* ac
                                      std::uint32_t /*maxGlobalCredentialAge*/,
                                      const KSTParameter* parameters, std::uint32_t parametersCount,
                                      std::uint32_t* outSize) noexcept {
-    KSTStatus err = kst::requireArguments(serializationContext(),
-                                          {{aclConstraint, "aclConstraint"}, {outSize, "outSize"}});
+    KSTStatus err = serializationContext().requireArguments({
+        kst::Argument(aclConstraint, "aclConstraint"),
+        kst::Argument(outSize, "outSize"),
+    });
     if (err == kKSTErrorSuccess) {
         err = kst::checkParameterList(parameters, parametersCount);
     }
@@ -56,7 +58,7 @@ KSTStatus SerializeVerifyAclConstraint(const KSTHandle* handle, const void* aclC
                                        std::uint32_t parametersCount, void* outBuffer,
                                        std::uint32_t* outSize) noexcept {
     const kst::AssertionContext context = serializationContext();
-    KSTStatus err = kst::requireArguments(context, {{aclConstraint, "aclConstraint"}});
+    KSTStatus err = context.requireArguments({kst::Argument(aclConstraint, "aclConstraint")});
     if (err == kKSTErrorSuccess) {
         err = kst::checkWriter(parameters, parametersCount, outBuffer, outSize);
     }
@@ -94,9 +96,11 @@ KSTStatus DeserializeVerifyAclConstraint(const void* buffer, std::uint32_t size,
     std::uint8_t preflight = 0;
     kst::PayloadReader payload(
         buffer, size, {outHandle, outMaxGlobalCredentialAge, outParameters, outParametersCount});
-    KSTStatus err = payload.begin({{outAclConstraint, "aclConstraint"},
-                                   {outAclConstraintLength, "aclConstraintLength"},
-                                   {outPreflight, "preflight"}});
+    KSTStatus err = payload.begin({
+        kst::Argument(outAclConstraint, "aclConstraint"),
+        kst::Argument(outAclConstraintLength, "aclConstraintLength"),
+        kst::Argument(outPreflight, "preflight"),
+    });
     if (err == kKSTErrorSuccess) {
         err = constraint.readWithLength(payload.rest(), "constraint",
                                         "(size - offset) >= constraintLength");

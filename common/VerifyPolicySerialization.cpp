@@ -1,10 +1,10 @@
 #include "KSTLib/VerifyPolicySerialization.h"
 
+#include "common/AssertLine.h"
 #include "common/HandleWire.h"
 #include "common/ParameterWire.h"
 #include "common/PayloadReader.h"
 #include "common/ReceivedBlob.h"
-#include "common/RequiredArguments.h"
 #include "common/SerializationContext.h"
 #include "common/WriterRoom.h"
 
@@ -47,8 +47,11 @@ KSTStatus GetSerializedVerifyPolicySize(const KSTHandle* handle, const char* pol
                                         const KSTParameter* parameters,
                                         std::uint32_t parametersCount,
                                         std::size_t* outSize) noexcept {
-    const KSTStatus missing = kst::requireArguments(
-        serializationContext(), {{handle, "handle"}, {policyId, "policyId"}, {outSize, "outSize"}});
+    const KSTStatus missing = serializationContext().requireArguments({
+        kst::Argument(handle, "handle"),
+        kst::Argument(policyId, "policyId"),
+        kst::Argument(outSize, "outSize"),
+    });
     if (missing != kKSTErrorSuccess) {
         return missing;
     }
@@ -78,7 +81,10 @@ KSTStatus SerializeVerifyPolicy(const KSTHandle* handle, const char* policyId,
                                 const KSTParameter* parameters, std::uint32_t parametersCount,
                                 void* outBuffer, std::size_t* outSize) noexcept {
     const kst::AssertionContext context = serializationContext();
-    KSTStatus err = kst::requireArguments(context, {{handle, "handle"}, {policyId, "policyId"}});
+    KSTStatus err = context.requireArguments({
+        kst::Argument(handle, "handle"),
+        kst::Argument(policyId, "policyId"),
+    });
     if (err == kKSTErrorSuccess) {
         err = kst::checkWriter(parameters, parametersCount, outBuffer, outSize);
     }
@@ -116,7 +122,10 @@ KSTStatus DeserializeVerifyPolicy(const void* buffer, std::size_t size, KSTHandl
     std::uint8_t preflight = 0;
     kst::PayloadReader payload(
         buffer, size, {outHandle, outMaxGlobalCredentialAge, outParameters, outParametersCount});
-    KSTStatus err = payload.begin({{outPolicyId, "policyId"}, {outPreflight, "preflight"}});
+    KSTStatus err = payload.begin({
+        kst::Argument(outPolicyId, "policyId"),
+        kst::Argument(outPreflight, "preflight"),
+    });
     if (err == kKSTErrorSuccess) {
         err = readPolicyId(payload.rest(), policyId);
     }

@@ -82,6 +82,7 @@ TEST_F(Contexts, CreateWithoutAPlaceForIt) {
     EXPECT_EQ(KSTContextCreate(nullptr), -3);
     EXPECT_TRUE(sent().empty());
     EXPECT_EQ(channel.scalarCalls.size(), 1U);
+    EXPECT_EQ(log.lines().front().file, "KSTLib/Contexts.cpp");
     expectLogged({failedCheck("context"), returned("KSTContextCreate", -3)});
 }
 

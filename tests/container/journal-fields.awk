@@ -1,5 +1,5 @@
 # Reads journal entries in the export format and prints those that are not as the daemon writes them:
-# native ones with severity 6 and the place in the code that the text names as well, those of the
+# native ones with severity 6 and the place in the code, whose line the text names as well, those of the
 # platform, which name none, and lines of a failing library call, which come by standard output.
 
 BEGIN {
@@ -12,7 +12,7 @@ function is_native(field, text, function_part) {
         return 0
     text = field["MESSAGE"]
     if (text ~ /AssertMacros/)
-        return ends_with(text, " file: " field["CODE_FILE"] ":" field["CODE_LINE"])
+        return ends_with(text, ":" field["CODE_LINE"]) && field["CODE_FILE"] ~ /^(kstd|common|KSTLib)\/.*\.(cpp|h)$/
     if (text ~ /^kstd: [A-Z][A-Za-z]*: /)
         return !("CODE_FUNC" in field)
     function_part = ": " field["CODE_FUNC"] ": "
