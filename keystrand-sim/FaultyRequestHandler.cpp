@@ -93,13 +93,16 @@ RequestOutcome FaultyRequestHandler::handle(std::span<const std::uint8_t> packet
         reply = perform(header->operation, body, connection);
         performed = reply.status;
     }
+    auto afterwards = std::exchange(reply.afterwards, nullptr);
     replace(reply, effect);
     const bool sendsStatus = !effect.silence && !effect.hangUp && !effect.garbageSize;
     if (header->operation == KernelOperation::structCall) {
         log_.record(
             logEntry(call, sendsStatus ? std::optional(reply.status) : std::nullopt, performed));
     }
-    return answer(*header, reply, effect);
+    RequestOutcome outcome = answer(*header, reply, effect);
+    outcome.afterwards = std::move(afterwards);
+    return outcome;
 }
 
 void FaultyRequestHandler::replace(Reply& reply, const FaultEffect& effect) {

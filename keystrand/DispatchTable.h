@@ -48,6 +48,8 @@ struct CommandFrame {
 struct CommandResult {
     KernelStatus status = kKernelSuccess;
     std::vector<std::uint8_t> output;
+    /// What waits until the client has its answer; null for nothing.
+    std::function<void()> afterwards = nullptr;
 };
 
 /// Commands by number, each with the payload lengths that it takes. The command codes of a frame

@@ -34,9 +34,10 @@ CommandResult daemonStarted(RestrictedModeController& restrictedMode, Payload pa
     if (!allowed || std::any_of(reserved.begin(), reserved.end(), [](auto b) { return b != 0; })) {
         return refuse();
     }
-    restrictedMode.daemonStarted(*allowed,
-                                 bytesAt<kStateBlobSize>(payload, kDaemonStartedStateOffset));
-    return {};
+    return {.status = kKernelSuccess,
+            .output = {},
+            .afterwards = restrictedMode.daemonStarted(
+                *allowed, bytesAt<kStateBlobSize>(payload, kDaemonStartedStateOffset))};
 }
 
 CommandResult setAllowed(RestrictedModeController& restrictedMode, Payload payload) {

@@ -51,10 +51,12 @@ KernelConnection::Alive KernelConnection::receive() {
 }
 
 KernelConnection::Alive KernelConnection::carryOut(RequestOutcome outcome) {
+    afterwards_ = std::move(outcome.afterwards);
     switch (outcome.kind) {
     case RequestOutcome::Kind::hangUp:
         return Alive::no;
     case RequestOutcome::Kind::silence:
+        doAfterwards();
         return Alive::yes;
     case RequestOutcome::Kind::reply:
         break;
@@ -74,6 +76,7 @@ KernelConnection::Alive KernelConnection::sendReply() {
     if (size >= 0) {
         reply_.clear();
         source_.listenFor(EPOLLIN);
+        doAfterwards();
         return Alive::yes;
     }
     if (errno == EPIPE || errno == ECONNRESET) {
@@ -92,10 +95,18 @@ void KernelConnection::dropReply() {
     delay_.disable();
     reply_.clear();
     source_.listenFor(EPOLLIN);
+    doAfterwards();
+}
+
+void KernelConnection::doAfterwards() {
+    if (const auto afterwards = std::exchange(afterwards_, nullptr)) {
+        afterwards();
+    }
 }
 
 void KernelConnection::endUnless(Alive alive) {
     if (alive == Alive::no) {
+        doAfterwards();
         const Ended ended = ended_;
         ended();
     }

@@ -38,6 +38,7 @@ class KernelConnection {
     [[nodiscard]] Alive carryOut(RequestOutcome outcome);
     [[nodiscard]] Alive sendReply();
     void dropReply();
+    void doAfterwards();
     void endUnless(Alive alive);
 
     base::FileDescriptor fd_;
@@ -46,6 +47,7 @@ class KernelConnection {
     Ended ended_;
     ConnectionState state_;
     std::vector<std::uint8_t> reply_;
+    std::function<void()> afterwards_;
     EventSource source_;
     EventSource delay_;
 };

@@ -12,12 +12,24 @@ bool NotificationPublisher::publish(const Notification& notification) {
     }
     ++publishedCount_;
     rememberKept(notification);
-    if (!events_.post(wire::kNotifydMatchingStream,
-                      base::concat(wire::rm::kNotificationNamePrefix, property))) {
+    if (!postEventOf(property)) {
         return false;
     }
     registry_.announce(property);
     return true;
+}
+
+void NotificationPublisher::postAgain(const std::vector<Registry::Record>& records) {
+    for (const Registry::Record& record : records) {
+        if (registry_.forgetAnnouncements(record)) {
+            postEventOf(record.name);
+        }
+    }
+}
+
+bool NotificationPublisher::postEventOf(std::string_view property) {
+    return events_.post(wire::kNotifydMatchingStream,
+                        base::concat(wire::rm::kNotificationNamePrefix, property));
 }
 
 void NotificationPublisher::rememberKept(const Notification& notification) {

@@ -6,6 +6,8 @@
 
 #include <cstdint>
 #include <optional>
+#include <string_view>
+#include <vector>
 
 namespace keystrand {
 
@@ -19,6 +21,15 @@ class NotificationPublisher {
     /// False when the record could not be put into the registry or its event was not taken.
     bool publish(const Notification& notification);
 
+    /// The records that are not acknowledged, in the order in which they were published.
+    [[nodiscard]] std::vector<Registry::Record> unacknowledged() const {
+        return registry_.records();
+    }
+
+    /// Posts the event of each of these records again that is still there. It announces nothing
+    /// anew: the first acknowledgement drops the record, whatever other events are on their way.
+    void postAgain(const std::vector<Registry::Record>& records);
+
     [[nodiscard]] std::uint64_t publishedCount() const { return publishedCount_; }
 
     /// What the last records of types 1 and 3 gave the daemon to keep.
@@ -28,6 +39,7 @@ class NotificationPublisher {
     }
 
   private:
+    bool postEventOf(std::string_view property);
     void rememberKept(const Notification& notification);
 
     Registry& registry_;

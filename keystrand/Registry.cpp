@@ -3,6 +3,8 @@
 #include "wire/KernelSocket.h"
 #include "wire/RestrictedMode.h"
 
+#include <algorithm>
+
 namespace keystrand {
 
 bool Registry::set(std::string_view name, std::span<const std::uint8_t> value) {
@@ -26,6 +28,26 @@ void Registry::announce(std::string_view name) {
     if (found != properties_.end()) {
         ++found->second.announcements;
     }
+}
+
+std::vector<Registry::Record> Registry::records() const {
+    std::vector<Record> all;
+    for (const auto& [name, property] : properties_) {
+        all.push_back({name, property.generation});
+    }
+    std::sort(all.begin(), all.end(), [](const Record& left, const Record& right) {
+        return left.generation < right.generation;
+    });
+    return all;
+}
+
+bool Registry::forgetAnnouncements(const Record& record) {
+    const auto found = properties_.find(record.name);
+    if (found == properties_.end() || found->second.generation != record.generation) {
+        return false;
+    }
+    found->second.announcements = 0;
+    return true;
 }
 
 bool Registry::remove(std::string_view name) {

@@ -34,12 +34,26 @@ class Registry {
         std::uint64_t announcements = 0;
     };
 
+    /// One value of a property.
+    struct Record {
+        std::string name;
+        std::uint64_t generation = 0;
+    };
+
     /// Gives the property a value and a new generation. False, with nothing changed, when the name
     /// is empty or too long, the value is too long, or it would be one property too many.
     [[nodiscard]] bool set(std::string_view name, std::span<const std::uint8_t> value);
 
     /// An event for the property was posted. Nothing when there is no such property.
     void announce(std::string_view name);
+
+    /// What the properties hold, in the order in which they were set.
+    [[nodiscard]] std::vector<Record> records() const;
+
+    /// No event for the property counts as being on its way any more: the next copy and its
+    /// acknowledgement drop the record. False, with nothing changed, when the property does not
+    /// hold that record.
+    [[nodiscard]] bool forgetAnnouncements(const Record& record);
 
     /// False when there is no such property.
     [[nodiscard]] bool remove(std::string_view name);

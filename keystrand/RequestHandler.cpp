@@ -30,13 +30,15 @@ RequestOutcome RequestHandler::handle(std::span<const std::uint8_t> packet,
     if (!header) {
         return {.kind = RequestOutcome::Kind::hangUp, .packet = {}};
     }
-    const Reply reply =
+    Reply reply =
         perform(header->operation, packet.subspan(wire::kKernelRequestHeaderSize), connection);
-    return answerWith({.operation = header->operation,
-                       .sequence = header->sequence,
-                       .status = reply.status,
-                       .reported = reply.reported},
-                      reply.body);
+    RequestOutcome outcome = answerWith({.operation = header->operation,
+                                         .sequence = header->sequence,
+                                         .status = reply.status,
+                                         .reported = reply.reported},
+                                        reply.body);
+    outcome.afterwards = std::move(reply.afterwards);
+    return outcome;
 }
 
 RequestOutcome RequestHandler::answerWith(const wire::KernelReplyHeader& header, Bytes body) {
@@ -138,7 +140,8 @@ RequestHandler::Reply RequestHandler::structCall(Bytes body,
     }
     return {.status = kKernelSuccess,
             .reported = static_cast<std::uint32_t>(result.output.size()),
-            .body = std::move(result.output)};
+            .body = std::move(result.output),
+            .afterwards = std::move(result.afterwards)};
 }
 
 RequestHandler::Reply RequestHandler::scalarCall(Bytes body,

@@ -6,6 +6,7 @@
 
 #include <chrono>
 #include <cstdint>
+#include <functional>
 #include <optional>
 #include <span>
 #include <string_view>
@@ -24,6 +25,8 @@ struct RequestOutcome {
     Kind kind = Kind::reply;
     std::vector<std::uint8_t> packet;
     std::chrono::milliseconds delay{0};
+    /// To be called once, when the packet is sent or will never be; null for nothing.
+    std::function<void()> afterwards = nullptr;
 };
 
 /// Turns a request packet into a reply packet. Knows nothing of sockets.
@@ -50,6 +53,7 @@ class RequestHandler {
         KernelStatus status = kKernelSuccess;
         std::uint32_t reported = 0;
         std::vector<std::uint8_t> body;
+        std::function<void()> afterwards = nullptr;
     };
 
     /// The header of a packet that is a request; none for one whose sender is to be hung up on.

@@ -51,7 +51,17 @@ void RestrictedModeController::setBootArg(bool bootArg) {
     setPolicy(policy);
 }
 
-void RestrictedModeController::daemonStarted(bool allowed, const StateBytes& state) {
+std::function<void()> RestrictedModeController::daemonStarted(bool allowed,
+                                                              const StateBytes& state) {
+    // What is published from here on has its event already.
+    auto unacknowledged = publisher_.unacknowledged();
+    takeUp(allowed, state);
+    return [this, unacknowledged = std::move(unacknowledged)] {
+        publisher_.postAgain(unacknowledged);
+    };
+}
+
+void RestrictedModeController::takeUp(bool allowed, const StateBytes& state) {
     if (state == StateBytes{} ||
         !isNews(state, publisher_.lastState(), registry_, wire::rm::kTimerRestartedProperty)) {
         setAllowed(allowed);

@@ -35,7 +35,10 @@ class RestrictedModeController {
     /// The daemon hands back what it kept. That is news only when it differs from what was last
     /// published and nothing newer is waiting to be read; otherwise what is known here stays. A
     /// state of zeros means that the daemon has none.
-    void daemonStarted(bool allowed, const StateBytes& state);
+    ///
+    /// What is returned is to be called when the daemon has its reply: it posts the events of the
+    /// records that an earlier daemon has left unacknowledged.
+    [[nodiscard]] std::function<void()> daemonStarted(bool allowed, const StateBytes& state);
     void restoreAnalytics(const AnalyticsBytes& blob);
 
     /// Does what became due on the clock, each thing at its own time.
@@ -44,6 +47,7 @@ class RestrictedModeController {
     [[nodiscard]] const RestrictedModeTimer& timer() const { return timer_; }
 
   private:
+    void takeUp(bool allowed, const StateBytes& state);
     void publish(const RestrictedModeTimer::Notifications& notifications);
     void setPolicy(const RestrictedModePolicy& policy);
 

@@ -19,6 +19,9 @@ class EventsTest : public SimulatorProcess {
         ByteVector packet = exchange(client, propertyRequest(1, property));
         return {packet.begin() + 24, packet.end()};
     }
+    static ByteVector daemonStarted() {
+        return control(3, Bytes().u8(1).u16(0).bytes(ByteVector(13)));
+    }
     static ByteVector event(const std::string& property) {
         return eventDatagram(kStream, "com.zerva.Keystrand." + property);
     }
@@ -228,6 +231,60 @@ TEST_F(EventsTest, DaemonHandsBackWhatItKeptOverARestartOfTheKernelSide) {
     EXPECT_EQ(ask("status", "alarm"), "1003600");
     EXPECT_EQ(ask("status", "period-restricted"), "8");
     EXPECT_EQ(hexOf("KSTRMTimerRestarted"), record);
+}
+
+TEST_F(EventsTest, ADaemonThatStartsIsToldOfEachUnacknowledgedRecordOnce) {
+    const PacketSocket events = PacketSocket::boundTo(eventPath());
+    start({"--clock", "1000000", "--quiet"});
+    const PacketSocket client = openClient();
+    EXPECT_EQ(call(client, daemonStarted()), reply(5, 2, 0, 0));
+    tell("publish save-analytics");
+    tell("publish timer-restarted");
+    tell("publish analytics-collected");
+    EXPECT_EQ(exchange(client, propertyRequest(1, "KSTRMTimerRestarted")).size(), 60U);
+    EXPECT_EQ(call(client, control(7, ackName("KSTRMTimerRestarted"))), reply(5, 2, 0, 0));
+    for (int i = 0; i < 3; ++i) {
+        ASSERT_TRUE(events.receive());
+    }
+    EXPECT_EQ(call(client, daemonStarted()), reply(5, 2, 0, 0));
+    EXPECT_EQ(events.receive(), event("KSTRMSaveAnalytics"));
+    EXPECT_EQ(events.receive(), event("KSTRMAnalyticsCollected"));
+    EXPECT_EQ(ask("status", "events-sent"), "5");
+    EXPECT_EQ(ask("status", "events-queued"), "0");
+    // A copy and an acknowledgement are enough for both events of a record.
+    EXPECT_EQ(exchange(client, propertyRequest(1, "KSTRMSaveAnalytics")).size(), 60U);
+    EXPECT_EQ(call(client, control(7, ackName("KSTRMSaveAnalytics"))), reply(5, 2, 0, 0));
+    EXPECT_EQ(ask("status", "properties"), "1");
+}
+
+TEST_F(EventsTest, ADaemonIsToldOnlyWhenItHasItsReply) {
+    const PacketSocket events = PacketSocket::boundTo(eventPath());
+    start({"--clock", "1000000", "--quiet"});
+    tell("publish save-analytics");
+    EXPECT_EQ(events.receive(), event("KSTRMSaveAnalytics"));
+    tell("fault control=3 delay=600000");
+    tell("fault control=3 silence perform");
+    tell("fault control=3 hang-up perform");
+    tell("fault control=3 silence");
+    {
+        const PacketSocket client = openClient();
+        ASSERT_TRUE(client.send(structCall(2, 4096, daemonStarted())));
+        tell("wait control=3 count=1");
+        EXPECT_EQ(ask("status", "events-sent"), "1");
+        EXPECT_EQ(ask("status", "events-queued"), "0");
+    }
+    // It has hung up and gets none any more.
+    EXPECT_EQ(events.receive(), event("KSTRMSaveAnalytics"));
+    for (int i = 2; i <= 3; ++i) {
+        const PacketSocket client = openClient();
+        ASSERT_TRUE(client.send(structCall(2, 4096, daemonStarted())));
+        EXPECT_EQ(events.receive(), event("KSTRMSaveAnalytics"));
+    }
+    // Nothing came of this one.
+    const PacketSocket client = openClient();
+    ASSERT_TRUE(client.send(structCall(2, 4096, daemonStarted())));
+    tell("wait control=3 count=4");
+    EXPECT_EQ(ask("status", "events-sent"), "4");
 }
 
 TEST_F(EventsTest, RecordPublishedWhileTheOlderIsHandledIsNotLost) {

@@ -94,6 +94,42 @@ TEST_F(RegistryTest, RecordThatWasReadAndNotAcknowledgedLeavesNoAnnouncementBehi
     EXPECT_TRUE(registry_.acknowledge("P"));
 }
 
+TEST_F(RegistryTest, AnnouncementsThatAreForgottenNeedNoAnswer) {
+    ASSERT_TRUE(registry_.set("P", kFirst));
+    registry_.announce("P");
+    ASSERT_TRUE(registry_.set("P", kSecond));
+    registry_.announce("P");
+    ASSERT_TRUE(registry_.forgetAnnouncements({"P", registry_.find("P")->generation}));
+    EXPECT_FALSE(registry_.acknowledge("P"));
+    EXPECT_EQ(registry_.copy("P"), kSecond);
+    EXPECT_TRUE(registry_.acknowledge("P"));
+}
+
+TEST_F(RegistryTest, AnnouncementsOfANewerRecordAreNotForgotten) {
+    ASSERT_TRUE(registry_.set("P", kFirst));
+    const std::uint64_t former = registry_.find("P")->generation;
+    ASSERT_TRUE(registry_.set("P", kSecond));
+    registry_.announce("P");
+    registry_.announce("P");
+    EXPECT_FALSE(registry_.forgetAnnouncements({"P", former}));
+    EXPECT_FALSE(registry_.forgetAnnouncements({"Q", former}));
+    static_cast<void>(registry_.copy("P"));
+    EXPECT_FALSE(registry_.acknowledge("P"));
+}
+
+TEST_F(RegistryTest, RecordsComeInTheOrderInWhichTheyWereSet) {
+    EXPECT_TRUE(registry_.records().empty());
+    for (const char* const name : {"B", "A", "C", "B"}) {
+        ASSERT_TRUE(registry_.set(name, kFirst));
+    }
+    std::string order;
+    for (const Registry::Record& record : registry_.records()) {
+        order += record.name;
+        EXPECT_EQ(record.generation, registry_.find(record.name)->generation);
+    }
+    EXPECT_EQ(order, "ACB");
+}
+
 TEST_F(RegistryTest, AnnouncingWhatIsNotThereDoesNothing) {
     registry_.announce("P");
     EXPECT_EQ(registry_.count(), 0U);

@@ -45,6 +45,11 @@ class RestrictedModeControllerTest : public testing::Test {
         return found == nullptr ? ByteVector() : found->value;
     }
 
+    /// The daemon says so and has its reply.
+    void daemonStarts(bool allowed, const StateBytes& handedBack) {
+        controller_.daemonStarted(allowed, handedBack)();
+    }
+
     void moveClock(Clock::Seconds time) {
         clock_.time = time;
         controller_.catchUp();
@@ -84,7 +89,7 @@ TEST_F(RestrictedModeControllerTest, RecordStaysWhenItsEventIsRefused) {
 }
 
 TEST_F(RestrictedModeControllerTest, ZeroStateOnlySaysWhetherItIsAllowed) {
-    controller_.daemonStarted(false, state(0, 0, 0));
+    daemonStarts(false, state(0, 0, 0));
     EXPECT_FALSE(controller_.timer().policy().allowed);
     EXPECT_FALSE(controller_.timer().locked());
     EXPECT_THAT(poster_.events, IsEmpty());
@@ -94,21 +99,62 @@ TEST_F(RestrictedModeControllerTest, StateThatWasLastPublishedIsNoNews) {
     controller_.lock();
     acknowledge("KSTRMTimerRestarted");
     poster_.events.clear();
-    controller_.daemonStarted(true, state(1, kStart, 0));
+    daemonStarts(true, state(1, kStart, 0));
     EXPECT_THAT(poster_.events, IsEmpty());
 }
 
 TEST_F(RestrictedModeControllerTest, StateOlderThanAWaitingRecordIsNotTakenOver) {
     controller_.lock();
-    controller_.daemonStarted(true, state(1, kStart - 50, 0));
+    daemonStarts(true, state(1, kStart - 50, 0));
     EXPECT_EQ(controller_.timer().timerRestarted().state.standardModeStart, kStart);
 }
 
 TEST_F(RestrictedModeControllerTest, OtherStateIsTakenOverWhenNothingWaits) {
     controller_.lock();
     acknowledge("KSTRMTimerRestarted");
-    controller_.daemonStarted(true, state(9, kStart - 50, 0));
+    daemonStarts(true, state(9, kStart - 50, 0));
     EXPECT_EQ(property("KSTRMTimerRestarted"), timerRestarted(kStart + 50, 9, kStart - 50, 0));
+}
+
+TEST_F(RestrictedModeControllerTest,
+       RecordsLeftUnacknowledgedAreToldAgainOnceTheDaemonHasItsReply) {
+    controller_.lock();
+    moveClock(kStart + 100);
+    controller_.unlock();
+    poster_.events.clear();
+    const auto afterwards = controller_.daemonStarted(true, {});
+    EXPECT_THAT(poster_.events, IsEmpty());
+    afterwards();
+    EXPECT_THAT(poster_.events,
+                ElementsAre("com.zerva.notifyd.matching "
+                            "com.zerva.Keystrand.KSTRMTimerRestartedAnalyticsCollected",
+                            "com.zerva.notifyd.matching com.zerva.Keystrand.KSTRMTimerRestarted",
+                            "com.zerva.notifyd.matching com.zerva.Keystrand.KSTRMSaveAnalytics"));
+}
+
+TEST_F(RestrictedModeControllerTest, WhatIsToldAgainAnnouncesNothingAnew) {
+    controller_.lock();
+    moveClock(kStart + 100);
+    daemonStarts(true, {});
+    acknowledge("KSTRMTimerRestarted");
+    acknowledge("KSTRMSaveAnalytics");
+}
+
+TEST_F(RestrictedModeControllerTest, WhatIsPublishedMeanwhileHasItsOwnEvent) {
+    controller_.lock();
+    const auto afterwards = controller_.daemonStarted(true, {});
+    controller_.unlock();
+    poster_.events.clear();
+    afterwards();
+    EXPECT_THAT(poster_.events, IsEmpty());
+    static_cast<void>(registry_.copy("KSTRMTimerRestarted"));
+    EXPECT_FALSE(registry_.acknowledge("KSTRMTimerRestarted"));
+    acknowledge("KSTRMTimerRestarted");
+}
+
+TEST_F(RestrictedModeControllerTest, WhatTheStartItselfPublishesIsToldOnce) {
+    daemonStarts(true, state(9, kStart - 50, 0));
+    EXPECT_EQ(poster_.events.size(), registry_.count());
 }
 
 TEST_F(RestrictedModeControllerTest, FiguresOlderThanAWaitingRecordAreNotTakenOver) {
