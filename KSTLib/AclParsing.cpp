@@ -2,7 +2,7 @@
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
 #include "KSTLib/PolicyVerification.h"
-#include "KSTLib/ProcessAclSerialization.h"
+#include "KSTLib/RequestSerialization.h"
 #include "common/Allocation.h"
 #include "common/BuiltPayload.h"
 #include "common/RequiredFunction.h"

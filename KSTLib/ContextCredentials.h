@@ -1,9 +1,8 @@
 #ifndef KST_KSTLIB_CONTEXT_CREDENTIALS_H
 #define KST_KSTLIB_CONTEXT_CREDENTIALS_H
 
-#include "KSTLib/Context.h"
+#include "KSTLib/Contexts.h"
 #include "KSTLib/Credential.h"
-#include "KSTLib/Handle.h"
 #include "KSTLib/Public.h"
 #include "KSTLib/Status.h"
 
@@ -26,60 +25,61 @@ extern "C" {
 #endif
 
 /** Adds `credential` to `context`. */
-KSTStatus KSTContextAddCredential(KSTContextRef context,
-                                  const KSTCredential* credential) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTContextAddCredential(KSTContextRef context,
+                                              const KSTCredential* credential) KST_PUBLIC;
 
 /** Adds `credential` with command 5. */
-KSTStatus KSTContextAddCredentialWithScope(KSTContextRef context, const KSTCredential* credential,
-                                           KSTScope scope) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTContextAddCredentialWithScope(KSTContextRef context,
+                                                       const KSTCredential* credential,
+                                                       KSTScope scope) KST_PUBLIC;
 
 /** Takes the credentials of `type` out of `context`. */
-KSTStatus KSTContextRemoveCredentialsByType(KSTContextRef context, uint32_t type) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTContextRemoveCredentialsByType(KSTContextRef context,
+                                                        uint32_t type) KST_PUBLIC;
 
 /** Takes the credentials of `type` out with command 9. */
-KSTStatus KSTContextRemoveCredentialsByTypeAndScope(KSTContextRef context, uint32_t type,
-                                                    KSTScope scope) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTContextRemoveCredentialsByTypeAndScope(KSTContextRef context,
+                                                                uint32_t type,
+                                                                KSTScope scope) KST_PUBLIC;
 
 /** Takes the credentials that equal `credential` out of `context`. */
-KSTStatus KSTContextRemoveCredentialsByValue(KSTContextRef context,
-                                             const KSTCredential* credential) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTContextRemoveCredentialsByValue(
+    KSTContextRef context, const KSTCredential* credential) KST_PUBLIC;
 
 /** Takes the credentials that equal `credential` out with command 6. */
-KSTStatus KSTContextRemoveCredentialsByValueAndScope(KSTContextRef context,
-                                                     const KSTCredential* credential,
-                                                     KSTScope scope) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTContextRemoveCredentialsByValueAndScope(KSTContextRef context,
+                                                                 const KSTCredential* credential,
+                                                                 KSTScope scope) KST_PUBLIC;
 
 /** Whether `context` has a credential of `type`: 0 when it has, kKSTErrorNotContained when it has
  *  not. `context` must not be null. */
-KSTStatus KSTContextContainsCredentialType(KSTContextRef context, uint32_t type) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTContextContainsCredentialType(KSTContextRef context,
+                                                       uint32_t type) KST_PUBLIC;
 
 /** As KSTContextContainsCredentialType, which passes 0 for `argument`, with command 4. What the
  *  argument means is the kernel service's. */
-KSTStatus KSTContextContainsCredentialTypeEx(KSTContextRef context, uint32_t type,
-                                             uint32_t argument) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTContextContainsCredentialTypeEx(KSTContextRef context, uint32_t type,
+                                                         uint32_t argument) KST_PUBLIC;
 
 /** Takes the passphrases of `purpose` out with command 16. */
-KSTStatus KSTContextRemovePassphraseCredentialsByPurposeAndScope(KSTContextRef context,
-                                                                 KSTPassphrasePurpose purpose,
-                                                                 KSTScope scope) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTContextRemovePassphraseCredentialsByPurposeAndScope(
+    KSTContextRef context, KSTPassphrasePurpose purpose, KSTScope scope) KST_PUBLIC;
 
 /** Puts `credential` in the place of the passphrases with command 15. */
-KSTStatus KSTContextReplacePassphraseCredentialsWithScope(KSTContextRef context,
-                                                          const KSTCredential* credential,
-                                                          KSTScope scope) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTContextReplacePassphraseCredentialsWithScope(
+    KSTContextRef context, const KSTCredential* credential, KSTScope scope) KST_PUBLIC;
 
 /** Whether `context` has a passphrase of `purpose`, with command 13: as
  *  KSTContextContainsCredentialTypeEx. */
-KSTStatus KSTContextContainsPassphraseCredentialWithPurpose(KSTContextRef context,
-                                                            KSTPassphrasePurpose purpose,
-                                                            uint32_t argument) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTContextContainsPassphraseCredentialWithPurpose(
+    KSTContextRef context, KSTPassphrasePurpose purpose, uint32_t argument) KST_PUBLIC;
 
 /** Adds `credential` to the global context. A context is created for the call and destroyed after
  *  it, whether the call succeeds or not; what creating it fails with is returned too. */
-KSTStatus KSTGlobalContextAddCredential(const KSTCredential* credential) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTGlobalContextAddCredential(const KSTCredential* credential) KST_PUBLIC;
 
 /** Takes the credentials of `type` out of the global context. As KSTGlobalContextAddCredential. */
-KSTStatus KSTGlobalContextRemoveCredentialsByType(uint32_t type) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTGlobalContextRemoveCredentialsByType(uint32_t type) KST_PUBLIC;
 
 #ifdef __cplusplus
 }

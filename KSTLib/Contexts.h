@@ -2,12 +2,12 @@
 #define KST_KSTLIB_CONTEXTS_H
 
 #include "KSTLib/Blocks.h"
-#include "KSTLib/Context.h"
 #include "KSTLib/Public.h"
 #include "KSTLib/Status.h"
 
 #include <stdbool.h>
 #include <stddef.h>
+#include <stdint.h>
 
 /** Contexts of the kernel service: where a client puts credentials and has policies verified.
  *
@@ -18,6 +18,29 @@
  *  How the functions send, on which threads they may be called and what every one of them may
  *  return is told in KSTLib/KSTLib.h. After a failure the library asks the kernel service for its
  *  log level, if it is connected. */
+
+/** The kernel's name for a context: 16 opaque bytes, which are also the context's external form. On
+ *  the wire an absent handle is 16 zero bytes. */
+typedef struct KSTHandle {
+    uint8_t bytes[16];
+} KSTHandle;
+
+enum { kKSTHandleSize = 16 };
+
+/** Where a credential belongs. */
+typedef uint32_t KSTScope;
+
+enum {
+    /** One context. */
+    kKSTScopeContext = 1,
+    /** The global context that all clients share; the only scope that needs no context. */
+    kKSTScopeGlobal = 2
+};
+
+/** A context of the kernel service as a client holds it: an object with the context's handle
+ *  in it, from a create function until a delete function. It is not locked: it is not deleted while
+ *  another thread uses it. */
+typedef struct KSTContext* KSTContextRef;
 
 #ifdef __cplusplus
 extern "C" {
@@ -32,7 +55,7 @@ extern "C" {
  *
  *  kKSTErrorBadParameter: `context` is null; nothing is sent. kKSTErrorOutOfMemory: no memory for
  *  the context. kKSTErrorUnexpected: the reply has not 17 bytes. */
-KSTStatus KSTContextCreate(KSTContextRef* context) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTContextCreate(KSTContextRef* context) KST_PUBLIC;
 
 /** Opens the context whose external form is the `dataLength` bytes at `externalForm`, which stay
  *  the caller's, with command 18. Returns it, and the caller gives it to KSTContextDelete; or null
@@ -41,8 +64,8 @@ KSTStatus KSTContextCreate(KSTContextRef* context) KST_PUBLIC;
  *
  *  Failures: `externalForm` is null or `dataLength` is not 16, and nothing is sent; no memory; the
  *  reply has not 5 bytes; or the command fails. */
-KSTContextRef KSTContextCreateWithExternalForm(const void* externalForm,
-                                               size_t dataLength) KST_PUBLIC;
+KST_CHECKED KSTContextRef KSTContextCreateWithExternalForm(const void* externalForm,
+                                                           size_t dataLength) KST_PUBLIC;
 
 /** Deletes `context`. With `destroy` the kernel service's end goes too, by command 2; without it
  *  nothing is sent, and who has the external form can go on using the context. The object is wiped

@@ -1,6 +1,5 @@
-#include "KSTLib/CredentialObjects.h"
-
-#include "KSTLib/LibCallCredential.h"
+#include "KSTLib/Credential.h"
+#include "KSTLib/LibCall.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/ObjectArguments.h"
 

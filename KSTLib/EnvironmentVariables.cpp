@@ -1,5 +1,6 @@
 #include "KSTLib/Channel.h"
 #include "KSTLib/KSTLib.h"
+#include "KSTLib/LibCall.h"
 #include "KSTLib/LibraryLogging.h"
 
 KSTStatus KSTSetEnvironmentVariable(std::uint32_t variable, const void* data,

@@ -3,38 +3,20 @@
 
 #include "KSTLib/AllocatedBytes.h"
 #include "KSTLib/Blocks.h"
-#include "KSTLib/Command.h"
-#include "KSTLib/Context.h"
 #include "KSTLib/ContextCredentials.h"
-#include "KSTLib/ContextPropertySerialization.h"
 #include "KSTLib/Contexts.h"
 #include "KSTLib/Credential.h"
-#include "KSTLib/CredentialCommandSerialization.h"
-#include "KSTLib/CredentialObjects.h"
-#include "KSTLib/CredentialSerialization.h"
-#include "KSTLib/DataBlob.h"
-#include "KSTLib/Handle.h"
-#include "KSTLib/LibCall.h"
-#include "KSTLib/LibCallBlock.h"
-#include "KSTLib/LibCallContext.h"
-#include "KSTLib/LibCallCredential.h"
-#include "KSTLib/LibCallRequirement.h"
-#include "KSTLib/Parameter.h"
-#include "KSTLib/ParameterSerialization.h"
 #include "KSTLib/PolicyVerification.h"
-#include "KSTLib/ProcessAclSerialization.h"
 #include "KSTLib/Public.h"
 #include "KSTLib/Requirement.h"
-#include "KSTLib/RequirementObjects.h"
-#include "KSTLib/RequirementSerialization.h"
 #include "KSTLib/Status.h"
-#include "KSTLib/VerifyAclSerialization.h"
-#include "KSTLib/VerifyPolicySerialization.h"
 
 #include <stddef.h>
 #include <stdint.h>
 
-/** The client library of the kernel service, whole.
+/** The client library of the kernel service: the functions whose names begin with KST. Those that
+ *  turn records into bytes are in KSTLib/Serialization.h, those over a transport of the caller's
+ *  own in KSTLib/LibCall.h; a program that needs neither has none of their names.
  *
  *  The functions in this file and in KSTLib/Contexts.h, KSTLib/ContextCredentials.h and
  *  KSTLib/PolicyVerification.h send commands over the library's own connection, which the first of
@@ -47,8 +29,10 @@
  *    kKSTErrorOutOfMemory  memory for the command could not be had; nothing was sent;
  *    a status of the platform (-1001 to -5095) or of the kernel side, unchanged.
  *
- *  All failures are written to the system log, and what goes through a LibCall function also prints
- *  that function's line to standard output. */
+ *  A failed check writes its line to the system log whatever the log level is, and each place that
+ *  a failure passes on its way to the caller writes one more. The line of the return is written too
+ *  unless the log level is above 70; kKSTErrorNotContained has that line alone. What goes through a
+ *  LibCall function also prints that function's line to standard output. */
 
 #ifdef __cplusplus
 extern "C" {
@@ -60,27 +44,29 @@ extern "C" {
  *
  *  kKSTErrorBadParameter: `data` is null with a length, or not null with a length of 0 or above 64;
  *  nothing is sent then. */
-KSTStatus KSTSetEnvironmentVariable(uint32_t variable, const void* data,
-                                    size_t dataLength) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTSetEnvironmentVariable(uint32_t variable, const void* data,
+                                                size_t dataLength) KST_PUBLIC;
 
 /** Reads the kernel service's environment variable number `variable` and calls `processVariable`
  *  with its 0 to 64 bytes; no bytes are a null pointer and 0. On any status but 0 the block is not
  *  called.
  *
  *  kKSTErrorBadParameter: `processVariable` is a null block; nothing is sent then. */
-KSTStatus KSTGetEnvironmentVariable(uint32_t variable, KSTDataBlock processVariable) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTGetEnvironmentVariable(uint32_t variable,
+                                                KSTDataBlock processVariable) KST_PUBLIC;
 
 /** Sends the control code `code` with `dataLength` bytes at `data` (1 to 256), or without data when
  *  `data` is null and `dataLength` is 0, to the kernel service. The bytes stay the caller's.
  *
  *  `resultBlock`, unless it is a null block, is called whatever the status is, with up to 256 bytes
- *  of reply; no bytes are a null pointer and 0. When no reply arrived it gets 256 zero bytes. Only
- *  the status that the function returns says whether the bytes mean anything.
+ *  of reply; no bytes are a null pointer and 0. Once the command was
+ *  to be sent, every failure gives it 256 zero bytes, also one that the kernel service answered.
+ *  Only the status that the function returns says whether the bytes mean anything.
  *
  *  kKSTErrorBadParameter: `data` is null with a length, or not null with a length of 0 or above
  *  256; nothing is sent and the block is not called then. */
-KSTStatus KSTKernelControl(uint32_t code, const void* data, size_t dataLength,
-                           KSTDataBlock resultBlock) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTKernelControl(uint32_t code, const void* data, size_t dataLength,
+                                       KSTDataBlock resultBlock) KST_PUBLIC;
 
 #ifdef __cplusplus
 }

@@ -1,5 +1,6 @@
 #include "KSTLib/Channel.h"
 #include "KSTLib/KSTLib.h"
+#include "KSTLib/LibCall.h"
 #include "KSTLib/LibraryLogging.h"
 
 KSTStatus KSTKernelControl(std::uint32_t code, const void* data, std::size_t dataLength,

@@ -2,8 +2,7 @@
 #define KST_KSTLIB_POLICY_VERIFICATION_H
 
 #include "KSTLib/Blocks.h"
-#include "KSTLib/Context.h"
-#include "KSTLib/Parameter.h"
+#include "KSTLib/Contexts.h"
 #include "KSTLib/Public.h"
 #include "KSTLib/Requirement.h"
 #include "KSTLib/Status.h"
@@ -14,12 +13,12 @@
 
 /** Asks the kernel service whether the credentials of a context satisfy a policy or a constraint
  *  from an access-control list. When they do not, the answer brings the requirement that is still
- *  unmet (KSTLib/RequirementObjects.h).
+ *  unmet (KSTLib/Requirement.h).
  *
  *  `policyId` is a text of at most 128 bytes. `preflight` asks without using anything up.
  *  `maxGlobalCredentialAge` bounds the age of credentials of the global context in a unit that is
- *  the kernel service's. `parameters` are at most 10 (KSTLib/Parameter.h), or null with the count
- *  0. All of them stay the caller's.
+ *  the kernel service's. `parameters` are at most 10, or null with the count 0. All of them stay
+ *  the caller's.
  *
  *  A block is handed the answer and, while it runs, the requirement tree, which is freed after it;
  *  an answer that the policy is satisfied may come without one, and then it is null.
@@ -32,19 +31,47 @@
  *    kKSTErrorUnexpected    the reply is shorter than 4 bytes, or longer than the 4096 that were
  *                           offered. */
 
+/** The type of a parameter, 0 to 7. It settles how long the value must be:
+ *
+ *  | type    | bytes     | value           |
+ *  | 0       | 0         | none            |
+ *  | 1, 5    | 4         | a signed number |
+ *  | 2, 6, 7 | 16        | opaque          |
+ *  | 3       | 1 to 1000 | opaque          |
+ *  | 4       | 4         | a user id       |
+ */
+typedef uint32_t KSTParameterType;
+
+/** How many parameters go with one request at most. */
+#define kKSTMaxParameters 10
+
+/** The longest value, which only type 3 may have. */
+#define kKSTParameterMaxDataLength 1000
+
+typedef struct KSTParameter {
+    KSTParameterType type;
+    /** The value; null when its length is 0. */
+    const void* parameterData;
+    uint32_t parameterDataLength;
+} KSTParameter;
+
+#ifdef __cplusplus
+static_assert(sizeof(KSTParameter) == 24, "natural alignment");
+#endif
+
 #ifdef __cplusplus
 extern "C" {
 #endif
 
 /** Asks with command 3, without preflight, parameters or global credentials of any age but 0. The
  *  block is called on success only. */
-KSTStatus KSTContextVerifyPolicy(KSTContextRef context, const char* policyId,
-                                 KSTPolicyBlock processRequirement) KST_PUBLIC;
+KST_CHECKED KSTStatus KSTContextVerifyPolicy(KSTContextRef context, const char* policyId,
+                                             KSTPolicyBlock processRequirement) KST_PUBLIC;
 
 /** As KSTContextVerifyPolicy, with preflight or without. */
-KSTStatus KSTContextVerifyPolicyWithPreflight(KSTContextRef context, const char* policyId,
-                                              bool preflight,
-                                              KSTPolicyBlock processRequirement) KST_PUBLIC;
+KST_CHECKED KSTStatus
+KSTContextVerifyPolicyWithPreflight(KSTContextRef context, const char* policyId, bool preflight,
+                                    KSTPolicyBlock processRequirement) KST_PUBLIC;
 
 /** Asks with command 3. The block, unless it is a null block, is called exactly once, after a
  *  failure too, and is the only one to learn the status. */

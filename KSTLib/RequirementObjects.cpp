@@ -1,8 +1,7 @@
-#include "KSTLib/RequirementObjects.h"
-
-#include "KSTLib/LibCallRequirement.h"
+#include "KSTLib/LibCall.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/ObjectArguments.h"
+#include "KSTLib/Requirement.h"
 #include "common/RequirementLayout.h"
 #include "common/RequirementProperties.h"
 

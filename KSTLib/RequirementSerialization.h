@@ -28,16 +28,16 @@ extern "C" {
  *
  *  kKSTErrorBadParameter: a child is null, or a composite's `dataLength` is too short for the
  *  children that it counts. */
-KSTStatus GetSerializedRequirementSize(const KSTRequirement* requirement,
-                                       size_t* outSize) KST_PUBLIC;
+KST_CHECKED KSTStatus GetSerializedRequirementSize(const KSTRequirement* requirement,
+                                                   size_t* outSize) KST_PUBLIC;
 
 /** Writes the tree `requirement` to `buffer`, which has room for `*bufferSize` bytes, and sets
  *  `*bufferSize` to the bytes written.
  *
  *  kKSTErrorBadParameter, with nothing written: there is not enough room, or the tree has no
  *  size. */
-KSTStatus SerializeRequirement(const KSTRequirement* requirement, void* buffer,
-                               size_t* bufferSize) KST_PUBLIC;
+KST_CHECKED KSTStatus SerializeRequirement(const KSTRequirement* requirement, void* buffer,
+                                           size_t* bufferSize) KST_PUBLIC;
 
 /** Reads the tree at the start of the `size` bytes at `buffer`. Stores a new tree in
  *  `*outRequirement`, which the caller gives to DeallocRequirement, and the bytes that were read in
@@ -45,8 +45,9 @@ KSTStatus SerializeRequirement(const KSTRequirement* requirement, void* buffer,
  *
  *  kKSTErrorBadParameter: `size` is too small; for a composite also when it is smaller than the
  *  composite is in memory. kKSTErrorOutOfMemory. */
-KSTStatus DeserializeRequirement(const void* buffer, size_t size, KSTRequirement** outRequirement,
-                                 size_t* consumedBytes) KST_PUBLIC;
+KST_CHECKED KSTStatus DeserializeRequirement(const void* buffer, size_t size,
+                                             KSTRequirement** outRequirement,
+                                             size_t* consumedBytes) KST_PUBLIC;
 
 /** Wipes and frees the tree `requirement`, children first. Its nodes come from this library and
  *  have the `dataLength` that they were made with. Null is ignored, as a child too. */

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "KSTLib/Context.h"
+#include "KSTLib/Contexts.h"
 #include "KSTLib/Status.h"
 #include "common/AssertLine.h"
 

@@ -1,7 +1,6 @@
 #pragma once
 
-#include "KSTLib/Context.h"
-#include "KSTLib/Handle.h"
+#include "KSTLib/Contexts.h"
 
 /// What a KSTContextRef points to: the handle and, in memory that came from KSTContextCreate, one
 /// byte more behind it, which nobody reads again.

@@ -1,5 +1,4 @@
-#include "KSTLib/ContextPropertySerialization.h"
-
+#include "KSTLib/CredentialSerialization.h"
 #include "common/AssertLine.h"
 #include "common/HandleWire.h"
 #include "common/SerializationContext.h"

@@ -1,5 +1,3 @@
-#include "KSTLib/CredentialCommandSerialization.h"
-
 #include "KSTLib/CredentialSerialization.h"
 #include "common/AssertLine.h"
 #include "common/HandleWire.h"

@@ -1,7 +1,7 @@
 #include "common/CredentialCommands.h"
 
 #include "KSTLib/Command.h"
-#include "KSTLib/CredentialCommandSerialization.h"
+#include "KSTLib/CredentialSerialization.h"
 #include "common/Allocation.h"
 #include "common/BuiltPayload.h"
 #include "common/ContextObject.h"

@@ -1,8 +1,7 @@
 #pragma once
 
-#include "KSTLib/Context.h"
+#include "KSTLib/Contexts.h"
 #include "KSTLib/Credential.h"
-#include "KSTLib/Handle.h"
 #include "common/CommandSender.h"
 
 #include <cstddef>

@@ -1,5 +1,4 @@
-#include "KSTLib/DataBlob.h"
-
+#include "KSTLib/Serialization.h"
 #include "common/Allocation.h"
 
 void DeallocDataBlob(void* data, std::size_t length) noexcept {

@@ -1,6 +1,5 @@
-#include "KSTLib/LibCallBlock.h"
-
 #include "KSTLib/Command.h"
+#include "KSTLib/LibCall.h"
 #include "common/LibCallReport.h"
 #include "common/NumberedPayload.h"
 #include "common/RequiredFunction.h"

@@ -1,6 +1,5 @@
-#include "KSTLib/LibCallContext.h"
-
 #include "KSTLib/Command.h"
+#include "KSTLib/LibCall.h"
 #include "common/AssertLine.h"
 #include "common/ContextObject.h"
 #include "common/CredentialCommands.h"

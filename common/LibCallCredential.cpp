@@ -1,6 +1,5 @@
-#include "KSTLib/LibCallCredential.h"
-
 #include "KSTLib/CredentialSerialization.h"
+#include "KSTLib/LibCall.h"
 #include "common/Allocation.h"
 #include "common/AssertLine.h"
 #include "common/CredentialProperties.h"

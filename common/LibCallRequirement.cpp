@@ -1,5 +1,4 @@
-#include "KSTLib/LibCallRequirement.h"
-
+#include "KSTLib/LibCall.h"
 #include "KSTLib/RequirementSerialization.h"
 #include "common/AssertLine.h"
 #include "common/LibCallReport.h"

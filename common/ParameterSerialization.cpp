@@ -1,5 +1,4 @@
-#include "KSTLib/ParameterSerialization.h"
-
+#include "KSTLib/RequestSerialization.h"
 #include "common/Allocation.h"
 #include "common/SerializationContext.h"
 

@@ -1,6 +1,6 @@
 #include "common/ParameterWire.h"
 
-#include "KSTLib/ParameterSerialization.h"
+#include "KSTLib/RequestSerialization.h"
 #include "common/Allocation.h"
 #include "common/AssertLine.h"
 #include "common/SerializationContext.h"

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "KSTLib/Parameter.h"
+#include "KSTLib/PolicyVerification.h"
 #include "KSTLib/Status.h"
 #include "base/ByteReader.h"
 #include "base/ByteWriter.h"

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "KSTLib/Handle.h"
-#include "KSTLib/Parameter.h"
+#include "KSTLib/Contexts.h"
+#include "KSTLib/PolicyVerification.h"
 #include "KSTLib/Status.h"
 #include "base/ByteReader.h"
 #include "common/AssertLine.h"

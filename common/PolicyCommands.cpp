@@ -1,9 +1,8 @@
 #include "common/PolicyCommands.h"
 
 #include "KSTLib/Command.h"
+#include "KSTLib/RequestSerialization.h"
 #include "KSTLib/RequirementSerialization.h"
-#include "KSTLib/VerifyAclSerialization.h"
-#include "KSTLib/VerifyPolicySerialization.h"
 #include "base/ByteReader.h"
 #include "common/Allocation.h"
 #include "common/BuiltPayload.h"

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "KSTLib/Context.h"
-#include "KSTLib/Parameter.h"
+#include "KSTLib/Contexts.h"
+#include "KSTLib/PolicyVerification.h"
 #include "KSTLib/Requirement.h"
 #include "common/CommandSender.h"
 

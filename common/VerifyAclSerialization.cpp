@@ -1,5 +1,4 @@
-#include "KSTLib/VerifyAclSerialization.h"
-
+#include "KSTLib/RequestSerialization.h"
 #include "common/AssertLine.h"
 #include "common/HandleWire.h"
 #include "common/ParameterWire.h"

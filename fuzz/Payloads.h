@@ -1,7 +1,7 @@
 #pragma once
 
 #include "KSTLib/AllocatedBytes.h"
-#include "KSTLib/Parameter.h"
+#include "KSTLib/PolicyVerification.h"
 #include "common/Allocation.h"
 
 #include <algorithm>

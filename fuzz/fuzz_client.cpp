@@ -4,7 +4,9 @@
 
 #include "KSTLib/Channel.h"
 #include "KSTLib/KSTLib.h"
+#include "KSTLib/LibCall.h"
 #include "KSTLib/Platform.h"
+#include "KSTLib/Serialization.h"
 #include "fuzz/Payloads.h"
 
 #include <array>

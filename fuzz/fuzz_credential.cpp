@@ -3,7 +3,7 @@
 
 #include "KSTLib/AllocatedBytes.h"
 #include "KSTLib/CredentialSerialization.h"
-#include "KSTLib/LibCallCredential.h"
+#include "KSTLib/LibCall.h"
 
 #include <cstdint>
 #include <cstdlib>

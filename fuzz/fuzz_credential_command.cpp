@@ -1,8 +1,6 @@
 // Payloads of the credential commands and of the context property from outside: what can be read
 // comes back the same, and nothing stays allocated.
 
-#include "KSTLib/ContextPropertySerialization.h"
-#include "KSTLib/CredentialCommandSerialization.h"
 #include "KSTLib/CredentialSerialization.h"
 #include "fuzz/Payloads.h"
 

@@ -1,9 +1,8 @@
 // Process-ACL payloads from outside: what can be read comes back the same, and nothing stays
 // allocated.
 
-#include "KSTLib/DataBlob.h"
-#include "KSTLib/ParameterSerialization.h"
-#include "KSTLib/ProcessAclSerialization.h"
+#include "KSTLib/RequestSerialization.h"
+#include "KSTLib/Serialization.h"
 #include "fuzz/Payloads.h"
 
 namespace {

@@ -2,7 +2,7 @@
 // was written, and nothing stays allocated.
 
 #include "KSTLib/AllocatedBytes.h"
-#include "KSTLib/RequirementObjects.h"
+#include "KSTLib/Requirement.h"
 #include "KSTLib/RequirementSerialization.h"
 
 #include <cstdint>

@@ -1,7 +1,7 @@
 #include "keystrand-sim/RequestLog.h"
 
 #include "KSTLib/Command.h"
-#include "KSTLib/Handle.h"
+#include "KSTLib/Contexts.h"
 #include "base/ByteReader.h"
 #include "common/CredentialTypes.h"
 

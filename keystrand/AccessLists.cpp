@@ -2,7 +2,7 @@
 
 #include "KSTLib/Command.h"
 #include "KSTLib/Credential.h"
-#include "KSTLib/ProcessAclSerialization.h"
+#include "KSTLib/RequestSerialization.h"
 #include "base/ByteWriter.h"
 #include "base/Concat.h"
 #include "keystrand/Commands.h"

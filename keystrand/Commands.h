@@ -1,6 +1,6 @@
 #pragma once
 
-#include "KSTLib/Handle.h"
+#include "KSTLib/Contexts.h"
 #include "base/ByteReader.h"
 #include "keystrand/DispatchTable.h"
 #include "keystrand/KernelState.h"

@@ -1,5 +1,5 @@
 #include "KSTLib/Command.h"
-#include "KSTLib/ContextPropertySerialization.h"
+#include "KSTLib/CredentialSerialization.h"
 #include "keystrand/Commands.h"
 
 #include <iterator>

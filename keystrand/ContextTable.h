@@ -1,6 +1,6 @@
 #pragma once
 
-#include "KSTLib/Handle.h"
+#include "KSTLib/Contexts.h"
 #include "keystrand/CredentialSet.h"
 #include "keystrand/NumberedValues.h"
 

@@ -1,5 +1,5 @@
 #include "KSTLib/Command.h"
-#include "KSTLib/CredentialCommandSerialization.h"
+#include "KSTLib/CredentialSerialization.h"
 #include "common/CredentialTypes.h"
 #include "keystrand/Commands.h"
 

@@ -1,6 +1,5 @@
 #include "KSTLib/Command.h"
-#include "KSTLib/VerifyAclSerialization.h"
-#include "KSTLib/VerifyPolicySerialization.h"
+#include "KSTLib/RequestSerialization.h"
 #include "keystrand/AccessLists.h"
 #include "keystrand/Commands.h"
 #include "keystrand/Evaluation.h"

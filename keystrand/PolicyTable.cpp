@@ -1,6 +1,6 @@
 #include "keystrand/PolicyTable.h"
 
-#include "KSTLib/VerifyPolicySerialization.h"
+#include "KSTLib/RequestSerialization.h"
 #include "base/Concat.h"
 #include "keystrand/RequirementParser.h"
 

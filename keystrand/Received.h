@@ -1,8 +1,8 @@
 #pragma once
 
-#include "KSTLib/DataBlob.h"
-#include "KSTLib/Parameter.h"
-#include "KSTLib/ParameterSerialization.h"
+#include "KSTLib/PolicyVerification.h"
+#include "KSTLib/RequestSerialization.h"
+#include "KSTLib/Serialization.h"
 
 #include <cstddef>
 #include <cstdint>

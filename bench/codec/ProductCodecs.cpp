@@ -1,6 +1,8 @@
 #include "bench/codec/ProductCodecs.h"
 
 #include "KSTLib/KSTLib.h"
+#include "KSTLib/LibCall.h"
+#include "KSTLib/Serialization.h"
 #include "base/Concat.h"
 
 #include <stdexcept>

@@ -1,8 +1,8 @@
 #pragma once
 
+#include "KSTLib/Contexts.h"
 #include "KSTLib/Credential.h"
-#include "KSTLib/Handle.h"
-#include "KSTLib/Parameter.h"
+#include "KSTLib/PolicyVerification.h"
 #include "KSTLib/Requirement.h"
 
 #include <cstdint>

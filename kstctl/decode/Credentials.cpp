@@ -1,4 +1,3 @@
-#include "KSTLib/CredentialCommandSerialization.h"
 #include "KSTLib/CredentialSerialization.h"
 #include "base/Concat.h"
 #include "common/CredentialTypes.h"

@@ -1,7 +1,7 @@
 #pragma once
 
+#include "KSTLib/Contexts.h"
 #include "KSTLib/Credential.h"
-#include "KSTLib/Handle.h"
 #include "kstctl/Report.h"
 #include "kstctl/decode/Decoded.h"
 

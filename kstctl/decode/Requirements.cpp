@@ -1,4 +1,4 @@
-#include "KSTLib/ContextPropertySerialization.h"
+#include "KSTLib/CredentialSerialization.h"
 #include "KSTLib/RequirementSerialization.h"
 #include "base/Concat.h"
 #include "common/RequirementLayout.h"

@@ -1,6 +1,8 @@
 #include "tests/KSTLib/InterfaceInC.h"
 
 #include "KSTLib/KSTLib.h"
+#include "KSTLib/LibCall.h"
+#include "KSTLib/Serialization.h"
 
 #include <string.h>
 
@@ -32,8 +34,7 @@ int32_t kernelControlFromC(uint32_t code, const void* data, size_t length, struc
 }
 
 int32_t kernelControlWithoutBlockFromC(uint32_t code) {
-    const KSTDataBlock block = {NULL, NULL};
-    return KSTKernelControl(code, NULL, 0, block);
+    return KSTKernelControl(code, NULL, 0, KST_NO_BLOCK);
 }
 
 int32_t setVariableFromC(uint32_t variable, const void* data, size_t length) {

@@ -193,3 +193,9 @@ TEST(InterfaceNames, EveryFunctionIsThereOnce) {
     EXPECT_EQ(names.size(), kPublicFunctionCount);
     EXPECT_TRUE(names.contains("KSTContextCreate"));
 }
+
+TEST(InterfaceNames, VersionIsTheLibrarys) {
+    EXPECT_EQ(std::to_string(KST_VERSION_MAJOR) + "." + std::to_string(KST_VERSION_MINOR) + "." +
+                  std::to_string(KST_VERSION_PATCH),
+              KSTLIB_VERSION);
+}

@@ -1,4 +1,6 @@
 #include "KSTLib/KSTLib.h"
+#include "KSTLib/LibCall.h"
+#include "KSTLib/Serialization.h"
 #include "tests/KSTLib/InterfaceInC.h"
 
 #define NAMED(function)                                                                            \

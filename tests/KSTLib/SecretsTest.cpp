@@ -2,7 +2,9 @@
 
 #include "KSTLib/Channel.h"
 #include "KSTLib/KSTLib.h"
+#include "KSTLib/LibCall.h"
 #include "KSTLib/Platform.h"
+#include "KSTLib/Serialization.h"
 #include "tests/support/MemoryScan.h"
 #include "tests/support/RecordingLog.h"
 #include "tests/support/ScriptedGate.h"

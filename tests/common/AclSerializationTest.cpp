@@ -1,5 +1,4 @@
-#include "KSTLib/ProcessAclSerialization.h"
-#include "KSTLib/VerifyAclSerialization.h"
+#include "KSTLib/RequestSerialization.h"
 #include "tests/common/ParameterPayloads.h"
 #include "tests/support/ScriptedGate.h"
 

@@ -1,5 +1,7 @@
 #include "KSTLib/Blocks.h"
 
+#include "KSTLib/Requirement.h"
+
 #include <gtest/gtest.h>
 
 #include <cstdint>
@@ -45,6 +47,7 @@ TEST(DataBlock, NullIsNull) {
     EXPECT_FALSE(callBlock(nullptr, "", 0));
     EXPECT_FALSE(callBlock({}, "", 0));
     EXPECT_FALSE(callBlock(KSTDataBlock(), "", 0));
+    EXPECT_FALSE(callBlock(KST_NO_BLOCK, "", 0));
     const KSTDataBlock block = nullptr;
     EXPECT_EQ(block.invoke, nullptr);
     EXPECT_EQ(block.captured, nullptr);
@@ -147,6 +150,7 @@ TEST(OtherBlocks, GetTheirOwnArguments) {
 
     EXPECT_EQ(KSTPropertyBlock(nullptr).invoke, nullptr);
     EXPECT_EQ(KSTRequirementBlock().invoke, nullptr);
+    EXPECT_EQ(KSTRequirementBlock(KST_NO_BLOCK).invoke, nullptr);
     EXPECT_FALSE((std::is_convertible_v<KSTDataBlock, KSTPropertyBlock>));
     EXPECT_FALSE((std::is_convertible_v<void (*)(const void*, std::size_t), KSTPropertyBlock>));
 }

@@ -1,5 +1,4 @@
-#include "KSTLib/ContextPropertySerialization.h"
-
+#include "KSTLib/CredentialSerialization.h"
 #include "tests/common/SerializationFixture.h"
 
 #include <gtest/gtest.h>

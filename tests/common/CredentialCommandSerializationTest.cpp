@@ -1,5 +1,3 @@
-#include "KSTLib/CredentialCommandSerialization.h"
-
 #include "KSTLib/CredentialSerialization.h"
 #include "tests/common/CredentialSamples.h"
 #include "tests/support/ScriptedGate.h"

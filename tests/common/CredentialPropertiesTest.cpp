@@ -1,5 +1,5 @@
 #include "KSTLib/CredentialSerialization.h"
-#include "KSTLib/LibCallCredential.h"
+#include "KSTLib/LibCall.h"
 #include "tests/common/CredentialSamples.h"
 #include "tests/support/ScriptedGate.h"
 

@@ -1,5 +1,4 @@
 #include "KSTLib/LibCall.h"
-#include "KSTLib/LibCallBlock.h"
 #include "tests/support/LibraryFixture.h"
 #include "tests/support/RecordingBlock.h"
 #include "tests/support/ScriptedTransport.h"

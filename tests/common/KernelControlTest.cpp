@@ -1,4 +1,4 @@
-#include "KSTLib/LibCallBlock.h"
+#include "KSTLib/LibCall.h"
 #include "tests/support/LibraryFixture.h"
 #include "tests/support/RecordingBlock.h"
 #include "tests/support/ScriptedTransport.h"

@@ -1,6 +1,4 @@
-#include "KSTLib/LibCallContext.h"
-
-#include "KSTLib/LibCallRequirement.h"
+#include "KSTLib/LibCall.h"
 #include "KSTLib/RequirementSerialization.h"
 #include "tests/common/CredentialSamples.h"
 #include "tests/support/ContextlessTransport.h"

@@ -1,10 +1,7 @@
 #pragma once
 
-#include "KSTLib/DataBlob.h"
-#include "KSTLib/ParameterSerialization.h"
-#include "KSTLib/ProcessAclSerialization.h"
-#include "KSTLib/VerifyAclSerialization.h"
-#include "KSTLib/VerifyPolicySerialization.h"
+#include "KSTLib/RequestSerialization.h"
+#include "KSTLib/Serialization.h"
 #include "tests/common/SerializationFixture.h"
 
 #include <array>

@@ -1,6 +1,5 @@
-#include "KSTLib/ParameterSerialization.h"
-
 #include "KSTLib/LibCall.h"
+#include "KSTLib/RequestSerialization.h"
 #include "tests/common/ParameterPayloads.h"
 #include "tests/support/ScriptedGate.h"
 

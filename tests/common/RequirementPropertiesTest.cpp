@@ -1,4 +1,4 @@
-#include "KSTLib/LibCallRequirement.h"
+#include "KSTLib/LibCall.h"
 #include "KSTLib/RequirementSerialization.h"
 #include "tests/common/RequirementSamples.h"
 

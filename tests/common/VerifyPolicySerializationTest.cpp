@@ -1,5 +1,4 @@
-#include "KSTLib/VerifyPolicySerialization.h"
-
+#include "KSTLib/RequestSerialization.h"
 #include "tests/common/ParameterPayloads.h"
 #include "tests/support/ScriptedGate.h"
 

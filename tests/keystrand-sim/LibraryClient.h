@@ -1,7 +1,9 @@
 #pragma once
 
 #include "KSTLib/KSTLib.h"
+#include "KSTLib/LibCall.h"
 #include "KSTLib/Platform.h"
+#include "KSTLib/Serialization.h"
 #include "platform/linux/LinuxKernelChannel.h"
 #include "platform/linux/LinuxServiceRegistry.h"
 #include "tests/keystrand-sim/SimulatorProcess.h"

@@ -3,8 +3,10 @@
 
 #include "KSTLib/Channel.h"
 #include "KSTLib/KSTLib.h"
+#include "KSTLib/LibCall.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/Platform.h"
+#include "KSTLib/Serialization.h"
 #include "base/Concat.h"
 #include "common/ContextObject.h"
 #include "keystrand-sim/ControlArguments.h"

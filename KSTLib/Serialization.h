@@ -1,9 +1,16 @@
-#ifndef KST_KSTLIB_DATA_BLOB_H
-#define KST_KSTLIB_DATA_BLOB_H
+#ifndef KST_KSTLIB_SERIALIZATION_H
+#define KST_KSTLIB_SERIALIZATION_H
 
+#include "KSTLib/CredentialSerialization.h"
 #include "KSTLib/Public.h"
+#include "KSTLib/RequestSerialization.h"
+#include "KSTLib/RequirementSerialization.h"
 
 #include <stddef.h>
+
+/** Credentials, requirements and the payloads of all requests as bytes, for who carries them
+ *  himself: a kernel side, a transport (KSTLib/LibCall.h), a tool. Who asks the kernel service
+ *  needs KSTLib/KSTLib.h alone. */
 
 #ifdef __cplusplus
 extern "C" {
