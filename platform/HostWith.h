@@ -8,7 +8,11 @@ namespace platform {
 struct HostParts {
     SystemLog* log = nullptr;
     EventStream* events = nullptr;
+    AlarmEvent* alarms = nullptr;
     MainRunLoop* runLoop = nullptr;
+    ManagedSettings* settings = nullptr;
+    Files* files = nullptr;
+    Clock* clock = nullptr;
     PropertyLists* propertyLists = nullptr;
 };
 
@@ -21,12 +25,12 @@ struct HostParts {
             .registry = host.registry,
             .channel = host.channel,
             .events = chosen(parts.events, host.events),
-            .alarms = host.alarms,
+            .alarms = chosen(parts.alarms, host.alarms),
             .transactions = host.transactions,
             .runLoop = chosen(parts.runLoop, host.runLoop),
-            .settings = host.settings,
-            .files = host.files,
-            .clock = host.clock,
+            .settings = chosen(parts.settings, host.settings),
+            .files = chosen(parts.files, host.files),
+            .clock = chosen(parts.clock, host.clock),
             .propertyLists = chosen(parts.propertyLists, host.propertyLists),
             .json = host.json,
             .defaults = host.defaults,

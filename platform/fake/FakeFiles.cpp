@@ -14,7 +14,7 @@ constexpr int kFirstDescriptor = 3;
 } // namespace
 
 OpenFile FakeFiles::openForWriting(const std::string& path, ProtectionClass protection,
-                                   int /*classOptions*/, unsigned mode) {
+                                   int classOptions, unsigned mode) {
     calls_.push_back(base::concat("open ", path));
     if (std::exchange(failures.open, false)) {
         return {-1, path};
@@ -27,7 +27,7 @@ OpenFile FakeFiles::openForWriting(const std::string& path, ProtectionClass prot
     if (!file) {
         return {-1, path};
     }
-    protections_.insert_or_assign(path, protection);
+    protections_.insert_or_assign(path, Protection{protection, classOptions});
     const int descriptor = lowestFreeDescriptor();
     descriptors_.emplace(descriptor, std::move(file));
     return {descriptor, path};
@@ -51,7 +51,7 @@ std::optional<std::vector<std::uint8_t>> FakeFiles::load(const std::string& path
     return bytes;
 }
 
-std::optional<ProtectionClass> FakeFiles::protectionOf(const std::string& path) const {
+std::optional<FakeFiles::Protection> FakeFiles::protectionOf(const std::string& path) const {
     const auto found = protections_.find(path);
     return found == protections_.end() ? std::nullopt : std::optional(found->second);
 }

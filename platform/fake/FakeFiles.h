@@ -60,8 +60,14 @@ class FakeFiles final : public Files {
     [[nodiscard]] std::size_t openDescriptors() const { return descriptors_.size(); }
     [[nodiscard]] std::size_t openStreams() const { return openStreams_; }
 
-    /// The protection class that a file was last opened with.
-    [[nodiscard]] std::optional<ProtectionClass> protectionOf(const std::string& path) const;
+    /// What a file was last opened with beside its mode.
+    struct Protection {
+        ProtectionClass protection = ProtectionClass::none;
+        int classOptions = kNoClassOptions;
+
+        friend bool operator==(const Protection&, const Protection&) = default;
+    };
+    [[nodiscard]] std::optional<Protection> protectionOf(const std::string& path) const;
 
     /// Closes a descriptor to which no stream was attached.
     void closeDescriptor(int descriptor) { descriptors_.erase(descriptor); }
@@ -79,7 +85,7 @@ class FakeFiles final : public Files {
     std::string realRoot_;
     std::vector<std::string> calls_;
     std::map<int, std::shared_ptr<FakeFile>> descriptors_;
-    std::map<std::string, ProtectionClass> protections_;
+    std::map<std::string, Protection> protections_;
     std::set<std::string> syncedNames_;
     std::size_t openStreams_ = 0;
 };

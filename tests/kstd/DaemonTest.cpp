@@ -106,35 +106,42 @@ TEST_F(DaemonTest, EventQueuedBeforeTheStartIsDeliveredOnceTheRunLoopRuns) {
                             "only stop after <kstd: main: Stoping service - only.>"));
 }
 
-/// Writes down who subscribes.
+/// Writes down who subscribes, and what the log says last.
 class SubscriptionDiary final : public platform::EventStream {
   public:
-    explicit SubscriptionDiary(std::vector<std::string>& diary) : diary_(diary) {}
+    SubscriptionDiary(std::vector<std::string>& diary, platform::FakeHost& fake)
+        : diary_(diary), fake_(fake) {}
     void setHandler(std::string_view stream, Handler /*handler*/) override {
-        diary_.push_back("subscribe " + std::string(stream));
+        const auto texts = fake_.log.texts();
+        diary_.push_back("subscribe " + std::string(stream) + " after <" +
+                         (texts.empty() ? "" : texts.back()) + ">");
     }
 
   private:
     std::vector<std::string>& diary_;
+    platform::FakeHost& fake_;
 };
 
-TEST_F(DaemonTest, AllServicesAreStartedBeforeTheFirstStreamIsSubscribed) {
-    SubscriptionDiary events(diary);
+TEST_F(DaemonTest, ServicesAreStartedThenStreamsSubscribedThenTheRunLoopIsEntered) {
+    SubscriptionDiary events(diary, fake);
     const platform::Host host = platform::hostWith(fake.host(), {.events = &events});
     fake.events.closeSources();
     EXPECT_EQ(Daemon(host, {witness("first"), witness("second")}).run(), 0);
     EXPECT_THAT(diary,
                 ElementsAre(testing::StartsWith("first start"), testing::StartsWith("second start"),
-                            "subscribe com.zerva.notifyd.matching",
-                            "subscribe com.zerva.corvid.matching",
+                            "subscribe com.zerva.notifyd.matching after "
+                            "<kstd: main: Started service - second.>",
+                            "subscribe com.zerva.corvid.matching after "
+                            "<kstd: main: Started service - second.>",
                             testing::StartsWith("first stop"), testing::StartsWith("second stop")));
+    EXPECT_THAT(lines(), testing::Contains("kstd: main: Entering the main runloop."));
 }
 
 TEST_F(DaemonTest, TheAlarmStreamIsSubscribedWhenTheListIsMade) {
-    SubscriptionDiary events(diary);
+    SubscriptionDiary events(diary, fake);
     const platform::Host host = platform::hostWith(fake.host(), {.events = &events});
     const auto services = makeServices(host);
-    EXPECT_THAT(diary, ElementsAre("subscribe com.zerva.alarm"));
+    EXPECT_THAT(diary, ElementsAre("subscribe com.zerva.alarm after <>"));
 }
 
 TEST_F(DaemonTest, ATransactionIsHeldWhileAnEventOfEitherStreamIsHandled) {

@@ -91,6 +91,7 @@ TEST_F(EventStoreTest, EventsComeInTheOrderInWhichTheyWereAdded) {
         expected.emplace_back(event(i));
     }
     EXPECT_EQ(store->allEvents(), expected);
+    EXPECT_EQ(store->statementsBySQL().count("select data from all_events"), 1U);
     EXPECT_EQ(lines(), Texts());
 }
 

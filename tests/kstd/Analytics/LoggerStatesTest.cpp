@@ -1,5 +1,6 @@
 // What one logged event does, by the state in which it finds the logger.
 
+#include "platform/HostWith.h"
 #include "tests/kstd/Analytics/LoggerFixture.h"
 
 #include <algorithm>
@@ -302,6 +303,41 @@ TEST_F(LoggerFixture, TheDateAfterAnUploadIsOneIntervalFromItsEnd) {
     // Setting the date, keeping the event, the document, the upload, the reset.
     EXPECT_EQ(fake.queues.workItems() - workItems, 5U);
     EXPECT_EQ(dueDate(), kNext);
+}
+
+/// Calls back when a line is written.
+class WatchedLog final : public platform::SystemLog {
+  public:
+    explicit WatchedLog(std::function<void(std::string_view)> onLine)
+        : onLine_(std::move(onLine)) {}
+    void write(platform::LogLevel /*level*/, std::string_view text,
+               const platform::CodePlace& /*place*/) override {
+        onLine_(text);
+    }
+
+  private:
+    std::function<void(std::string_view)> onLine_;
+};
+
+/// What another thread stores between the two deletions goes with the second one.
+TEST_F(LoggerFixture, EventsAreDeletedOnceMoreAtTheEndOfAnUpload) {
+    configureUploadLink();
+    fake.https.setAnswer("POST", kUploadLink, FakeHTTPAnswer::status(200));
+    int stored = 0;
+    WatchedLog log([&](std::string_view text) {
+        if (text == "uploaded oracle statistics") {
+            EXPECT_EQ(events().size(), 0U);
+            store({{"eventType", "between"}});
+            machine.clock.advance(5 * platform::kNanosecondsPerSecond);
+            ++stored;
+        }
+    });
+    const auto watched = TestLogger::logger(platform::hostWith(fake.host(), {.log = &log}));
+    setDueDate(kNow - 1);
+    watched->logEventNamed("event", nullptr);
+    EXPECT_EQ(stored, 1);
+    EXPECT_EQ(events().size(), 0U);
+    EXPECT_EQ(dueDate(), kNow + 5 + kInterval);
 }
 
 } // namespace

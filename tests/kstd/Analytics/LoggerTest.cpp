@@ -215,6 +215,15 @@ TEST_F(LoggerTest, DatesOfASubclass) {
     EXPECT_EQ(logger().datePropertyForKey("k"), std::nullopt);
 }
 
+/// Work of the queue that asks for the queue stops the process.
+TEST_F(LoggerTest, DatesOfASubclassAreWorkOfTheQueue) {
+    logger();
+    EXPECT_DEATH(onQueue([this] { logger().setDateProperty(Timestamp{0}, "k"); }),
+                 "com.zerva.keystrand.analytics");
+    EXPECT_DEATH(onQueue([this] { static_cast<void>(logger().datePropertyForKey("k")); }),
+                 "com.zerva.keystrand.analytics");
+}
+
 TEST_F(LoggerTest, DatesOfASubclassDoNotOpenTheDatabase) {
     onQueue([this] { logger().fields.database->close(); });
     logger().setDateProperty(Timestamp{1234}, "k");

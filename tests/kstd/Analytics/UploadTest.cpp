@@ -79,6 +79,31 @@ TEST_F(UploadTest, EmptyStore) {
     EXPECT_EQ(document(), kEmptyDocument);
 }
 
+/// Is a second later at every reading.
+class RunningClock final : public platform::Clock {
+  public:
+    [[nodiscard]] platform::Date now() override {
+        ++readings_;
+        return {platform::FakeClock::kStart.nanosecondsSince1970 +
+                readings_ * platform::kNanosecondsPerSecond};
+    }
+
+  private:
+    std::int64_t readings_ = 0;
+};
+
+TEST_F(UploadTest, TheSummaryIsOfTheTimeOfTheDocument) {
+    RunningClock clock;
+    const auto running = TestLogger::logger(platform::hostWith(fake.host(), {.clock = &clock}));
+    const auto document = running->getLoggingJSON();
+    ASSERT_TRUE(document);
+    const auto read = fake.json.read(document.value().view());
+    ASSERT_TRUE(read);
+    const ValueMap& map = *read.value().as<ValueMap>();
+    const ValueMap& summary = *map.at("events").as<platform::ValueList>()->back().as<ValueMap>();
+    EXPECT_EQ(summary.at("eventTime"), map.at("postTime"));
+}
+
 TEST_F(UploadTest, TheSummaryHasTheTopic) {
     configure("splunk_topic", "kst");
     EXPECT_NE(document().find(R"("eventType":"accumulatedPolicyStats","topic":"kst"}])"),

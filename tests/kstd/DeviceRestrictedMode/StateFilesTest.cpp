@@ -36,7 +36,8 @@ TEST_F(StateFilesTest, SaveOpensAttachesWritesSyncsAndClosesInThisOrder) {
     EXPECT_THAT(fake.files.calls(), ElementsAre("open /var/root/.usbrestrictedmode_v2", "attach",
                                                 "write 13", "sync", "close"));
     EXPECT_THAT(lines(), ElementsAre(kCalled));
-    EXPECT_EQ(fake.files.protectionOf(kStatePath), platform::ProtectionClass::none);
+    EXPECT_EQ(fake.files.protectionOf(kStatePath),
+              (platform::FakeFiles::Protection{platform::ProtectionClass::none, 0}));
     EXPECT_EQ(machine.disk.find(kStatePath)->mode, 0600U);
     expectNothingOpen();
 }

@@ -68,7 +68,8 @@ TEST_F(FakeFilesTest, StreamDestroyedOpenIsNotedAsClosed) {
 TEST_F(FakeFilesTest, ProtectionClassIsRemembered) {
     EXPECT_EQ(files_.protectionOf(kPath), std::nullopt);
     static_cast<void>(stream());
-    EXPECT_EQ(files_.protectionOf(kPath), platform::ProtectionClass::none);
+    EXPECT_EQ(files_.protectionOf(kPath),
+              (platform::FakeFiles::Protection{platform::ProtectionClass::none, 0}));
 }
 
 TEST_F(FakeFilesTest, FailedOpenHappensOnceAndMakesNothing) {

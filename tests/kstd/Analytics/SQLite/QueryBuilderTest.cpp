@@ -119,10 +119,22 @@ TEST_F(QueryBuilderTest, StopEndsAfterItsRowAndResets) {
     EXPECT_EQ(text(), "select * from T");
 }
 
-TEST_F(QueryBuilderTest, RowsWithoutAVisitorAreDropped) {
+TEST_F(QueryBuilderTest, RowsWithoutAVisitorAreSteppedThroughAndDropped) {
     insertThree();
+    int rows = 0;
+    sqlite3_trace_v2(
+        opened->db(), SQLITE_TRACE_ROW,
+        [](unsigned /*kind*/, void* count, void* /*statement*/, void* /*unused*/) {
+            ++*static_cast<int*>(count);
+            return 0;
+        },
+        &rows);
     opened->selectFrom("T", kNoWhere, {}, kNoOrder, kNoLimit, nullptr);
+    EXPECT_EQ(rows, 3);
     EXPECT_TRUE(opened->statementForSQL("select * from T")->isReset());
+    opened->select({"a"}, "T", "a > ?", {1}, kNoOrder, kNoLimit, nullptr);
+    EXPECT_EQ(rows, 5);
+    EXPECT_TRUE(opened->statementForSQL("select a from T where a > ?")->isReset());
     EXPECT_EQ(lines(), Texts());
 }
 
