@@ -76,7 +76,8 @@ class LoggerFixture : public testing::Test, public MachineWithDirectory {
 
     /// What the log holds, each line after its level. The log is empty afterwards.
     Lines takeLines() {
-        static constexpr const char* kLevels[] = {"debug: ", "info: ", "warning: ", "error: "};
+        static constexpr const char* kLevels[] = {
+            "debug: ", "info: ", "notice: ", "warning: ", "error: "};
         Lines lines;
         for (const auto& line : fake.log.lines()) {
             lines.push_back(kLevels[static_cast<int>(line.level)] + line.text);
