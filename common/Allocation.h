@@ -2,8 +2,10 @@
 
 #include "KSTLib/AllocatedBytes.h"
 
+#include <atomic>
 #include <cstddef>
 #include <cstdint>
+#include <pthread.h>
 #include <span>
 
 /// The one allocator of the library. Not synchronised.
@@ -12,6 +14,10 @@ namespace kst {
 /// Zeroed memory of `size` bytes, counted in gAllocatedBytes, or null (counted as nothing) when
 /// there is none or the gate refused it. Size 0 gives a pointer that is released like any other.
 [[nodiscard]] void* allocate(std::size_t size) noexcept;
+
+/// `allocate` for memory that is written before it is read: what was there before is not cleared,
+/// so that a size costs nothing until its bytes are used.
+[[nodiscard]] void* allocateUncleared(std::size_t size) noexcept;
 
 /// Overwrites `size` bytes with zeros, frees them and subtracts `size` from gAllocatedBytes. `size`
 /// is what `memory` was allocated with. Null is ignored.
@@ -41,22 +47,59 @@ class AllocationGate {
 /// use. Returns the one before.
 AllocationGate* setAllocationGate(AllocationGate* gate) noexcept;
 
-/// Memory from `allocate`, released at the end of the scope.
+/// Makes bytes known that a call of the library holds and that may be secret, for as long as this
+/// exists: a child of the process has no use for what other threads' calls held when it was forked.
+///
+/// Threads may make and destroy theirs at the same time. Nothing here makes a fork wait.
+class CallBuffer {
+  public:
+    CallBuffer() = default;
+    CallBuffer(void* bytes, std::size_t size) noexcept { hold(bytes, size); }
+    CallBuffer(const CallBuffer&) = delete;
+    CallBuffer& operator=(const CallBuffer&) = delete;
+    ~CallBuffer() { leave(); }
+
+    /// To be called once, before anything secret is written. Null is nothing.
+    void hold(void* bytes, std::size_t size) noexcept;
+
+    /// Before the bytes are freed or become somebody else's.
+    void leave() noexcept;
+
+    /// In a child of the process: wipes what other threads' calls held and forgets it. Takes no
+    /// lock and allocates nothing.
+    static void wipeThoseOfOtherThreads() noexcept;
+
+  private:
+    void link() noexcept;
+    void unlink() noexcept;
+
+    void* bytes_ = nullptr;
+    std::size_t size_ = 0;
+    pthread_t thread_{};
+    std::atomic<CallBuffer*> next_ = nullptr;
+    CallBuffer* previous_ = nullptr;
+};
+
+/// Memory from `allocate` for one call, released at the end of the scope.
 class AllocatedMemory {
   public:
     explicit AllocatedMemory(std::size_t size) noexcept
-        : bytes_(static_cast<std::uint8_t*>(allocate(size))), size_(size) {}
+        : bytes_(static_cast<std::uint8_t*>(allocate(size))), size_(size), buffer_(bytes_, size) {}
     AllocatedMemory(const AllocatedMemory&) = delete;
     AllocatedMemory& operator=(const AllocatedMemory&) = delete;
-    ~AllocatedMemory() { release(bytes_, size_); }
+    ~AllocatedMemory();
 
     /// Null when the allocation failed.
     [[nodiscard]] std::uint8_t* bytes() const { return bytes_; }
     [[nodiscard]] std::size_t size() const { return size_; }
 
+    /// The caller owns the bytes from now on.
+    [[nodiscard]] std::uint8_t* handOut() noexcept;
+
   private:
     std::uint8_t* bytes_;
     std::size_t size_;
+    CallBuffer buffer_;
 };
 
 } // namespace kst

@@ -1,13 +1,17 @@
 #include "common/ReceivedBlob.h"
 
-#include "common/Allocation.h"
 #include "common/SerializationContext.h"
 
+#include <string.h>
 #include <utility>
 
 namespace kst {
 
 ReceivedBlob::~ReceivedBlob() {
+    if (bytes_ != nullptr) {
+        ::explicit_bzero(bytes_, written_);
+    }
+    buffer_.leave();
     release(bytes_, length_, written_);
 }
 
@@ -16,15 +20,17 @@ KSTStatus ReceivedBlob::read(base::ByteReader& reader, std::size_t length, const
     if (length == 0) {
         return kKSTErrorSuccess;
     }
-    bytes_ = static_cast<std::uint8_t*>(allocate(length));
+    bytes_ = static_cast<std::uint8_t*>(allocateUncleared(length));
     if (bytes_ == nullptr) {
         return fail(serializationContext(), memoryCheck, 0, kKSTErrorOutOfMemory);
     }
     length_ = length;
-    if (!reader.readBytes(bytes_, length)) {
+    if (reader.left() < length) {
         return fail(serializationContext(), sizeCheck, 0, kKSTErrorBadParameter);
     }
+    buffer_.hold(bytes_, length);
     written_ = length;
+    static_cast<void>(reader.readBytes(bytes_, length));
     return kKSTErrorSuccess;
 }
 
@@ -39,6 +45,7 @@ KSTStatus ReceivedBlob::readWithLength(base::ByteReader& reader, const char* mem
 }
 
 std::uint8_t* ReceivedBlob::handOut() noexcept {
+    buffer_.leave();
     return std::exchange(bytes_, nullptr);
 }
 

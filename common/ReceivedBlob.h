@@ -2,6 +2,7 @@
 
 #include "KSTLib/Status.h"
 #include "base/ByteReader.h"
+#include "common/Allocation.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -20,8 +21,8 @@ class ReceivedBlob {
     ///
     /// The memory is had before the bytes are looked for: kKSTErrorOutOfMemory, with a line that
     /// says `memoryCheck`, comes before kKSTErrorBadParameter, with `sizeCheck`. A length that the
-    /// payload does not have costs address space only, because nothing is written then. To be
-    /// called once.
+    /// payload does not have costs address space only, because nothing is cleared and nothing
+    /// written then. To be called once.
     [[nodiscard]] KSTStatus read(base::ByteReader& reader, std::size_t length,
                                  const char* memoryCheck, const char* sizeCheck) noexcept;
 
@@ -38,6 +39,7 @@ class ReceivedBlob {
     std::uint8_t* bytes_ = nullptr;
     std::size_t length_ = 0;
     std::size_t written_ = 0;
+    CallBuffer buffer_;
 };
 
 } // namespace kst

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "common/Allocation.h"
+
 #include <array>
 #include <cstddef>
 #include <cstdint>
@@ -23,6 +25,7 @@ class WipedBytes {
 
   private:
     std::array<std::uint8_t, Size> bytes_{};
+    CallBuffer buffer_{bytes_.data(), Size};
 };
 
 } // namespace kst

@@ -8,6 +8,7 @@
 #include <cstdio>
 #include <cstring>
 #include <new>
+#include <span>
 #include <vector>
 
 namespace {
@@ -46,8 +47,10 @@ TEST(WipedBytes, ZeroBeforeAndAfter) {
     EXPECT_EQ(buffer->size(), 100U);
     EXPECT_TRUE(std::all_of(buffer->data(), buffer->data() + 100, isZero));
     std::memset(buffer->data(), 0xbb, 100);
+    const auto bytes =
+        std::span(storage).subspan(static_cast<std::size_t>(buffer->data() - storage.data()), 100);
     buffer->~Buffer();
-    EXPECT_TRUE(std::all_of(storage.begin(), storage.end(), isZero));
+    EXPECT_TRUE(std::all_of(bytes.begin(), bytes.end(), isZero));
 }
 
 TEST(NumberedPayload, NumberThenData) {
