@@ -1,3 +1,4 @@
+#include "KSTLib/Channel.h"
 #include "KSTLib/Command.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
@@ -78,6 +79,7 @@ KSTStatus parseAcl(const void* acl, std::uint32_t aclLength, Characteristics& re
 KSTStatus KSTParseAclAndCopyConstraintCharacteristics(
     const void* acl, std::size_t aclLength,
     KSTStatusDataBlock processConstraintCharacteristics) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     const KSTStatusDataBlock& block = processConstraintCharacteristics;
     Characteristics result;

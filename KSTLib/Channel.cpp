@@ -6,6 +6,8 @@
 #include "common/Allocation.h"
 #include "common/CommandHeader.h"
 
+#include <cerrno>
+#include <chrono>
 #include <cstring>
 #include <limits>
 
@@ -15,6 +17,46 @@ namespace {
 
 constexpr const char* kServiceClass = "Keystrand";
 constexpr std::uint32_t kConnectionType = 0;
+
+CallState call;
+
+void setDeadline(std::optional<platform::KernelConnections::Deadline> deadline) {
+    if (const LibraryPlatform* platform = installedPlatform()) {
+        platform->registry.setDeadline(deadline);
+        platform->channel.setDeadline(deadline);
+    }
+}
+
+/// The platform's status for want of memory is the library's.
+KSTStatus asLibraryStatus(platform::Status status) {
+    return status == platform::statusFromErrno(ENOMEM) ? kKSTErrorOutOfMemory : status;
+}
+
+/// Reports what the platform or the kernel side failed with.
+KSTStatus failTransport(const LibraryPlatform& platform, platform::Status status,
+                        CheckPlace place = CheckPlace::here()) {
+    call.connectionLost = !platform.channel.isConnected(gConnection);
+    return failCall(libraryContext(), asLibraryStatus(status), place);
+}
+
+/// The frame of a command, in `cmd`.
+KSTStatus fillFrame(const AllocatedMemory& cmd, std::uint8_t code, std::uint8_t thirdByte,
+                    const void* inData, std::size_t inSize) {
+    if (cmd.bytes() == nullptr) {
+        return fail(libraryContext(), "cmd", 0, kKSTErrorOutOfMemory);
+    }
+    const KSTStatus err = buildCommand(cmd.bytes(), code, thirdByte);
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    if (inSize > 0) {
+        if (inData == nullptr) {
+            return fail(libraryContext(), "inData", 0, kKSTErrorBadParameter);
+        }
+        std::memcpy(cmd.bytes() + kKSTCommandHeaderSize, inData, inSize);
+    }
+    return kKSTErrorSuccess;
+}
 
 /// Steps of `performCommand` once the frame is complete.
 KSTStatus sendFrame(const AllocatedMemory& frame, void* outData, std::size_t* outSize) {
@@ -27,9 +69,10 @@ KSTStatus sendFrame(const AllocatedMemory& frame, void* outData, std::size_t* ou
     const KSTStatus err = platform->channel.structCall(
         gConnection, kKSTSelectorCommand, frame.bytes(), frame.size(), outData, &replySize);
     if (err != kKSTErrorSuccess) {
-        return failCall(libraryContext(), err);
+        return failTransport(*platform, err);
     }
     if (replySize > offeredSize) {
+        call.connectionLost = !platform->channel.isConnected(gConnection);
         return fail(libraryContext(), "replySize <= offeredSize", 0, kKSTErrorUnexpected);
     }
     if (outSize != nullptr) {
@@ -58,9 +101,42 @@ KSTStatus readLogLevel(platform::KernelChannel& channel) {
 bool gChannelOpen = false;
 platform::ConnectionHandle gConnection = platform::kNoConnection;
 
+CallScope::CallScope() noexcept : outer_(call) {
+    leaveInheritedToParent();
+    const LibraryPlatform* platform = installedPlatform();
+    call = {};
+    if (platform != nullptr) {
+        call.deadline = std::chrono::steady_clock::now() + platform->callLimit;
+    }
+    setDeadline(call.deadline);
+}
+
+CallScope::~CallScope() {
+    call = outer_;
+    setDeadline(call.deadline);
+}
+
+bool isTimeUp() noexcept {
+    return call.deadline && std::chrono::steady_clock::now() >= *call.deadline;
+}
+
+bool isConnectionLost() noexcept {
+    return call.connectionLost;
+}
+
+void closeChannel() noexcept {
+    gChannelOpen = false;
+    gConnection = platform::kNoConnection;
+    call = {};
+}
+
 KSTStatus init() noexcept {
+    leaveInheritedToParent();
     if (gChannelOpen) {
         return kKSTErrorSuccess;
+    }
+    if (!watchForks()) {
+        return fail(libraryContext(), "watchForks()", 0, kKSTErrorOutOfMemory);
     }
     const LibraryPlatform* platform = installedPlatform();
     const platform::ServiceHandle service = platform != nullptr
@@ -72,7 +148,7 @@ KSTStatus init() noexcept {
     platform::ConnectionHandle connection = platform::kNoConnection;
     const KSTStatus err = platform->channel.open(service, kConnectionType, &connection);
     if (err != kKSTErrorSuccess) {
-        return failCall(libraryContext(), err);
+        return failCall(libraryContext(), asLibraryStatus(err));
     }
     platform->registry.release(service);
     gConnection = connection;
@@ -97,20 +173,22 @@ KSTStatus performCommand(std::uint8_t code, std::uint8_t thirdByte, const void* 
         return fail(libraryContext(), "cmd", 0, kKSTErrorOutOfMemory);
     }
     const AllocatedMemory cmd(kKSTCommandHeaderSize + inSize);
-    if (cmd.bytes() == nullptr) {
-        return fail(libraryContext(), "cmd", 0, kKSTErrorOutOfMemory);
-    }
-    const KSTStatus err = buildCommand(cmd.bytes(), code, thirdByte);
+    const KSTStatus err = fillFrame(cmd, code, thirdByte, inData, inSize);
+    return err == kKSTErrorSuccess ? sendFrame(cmd, outData, outSize) : err;
+}
+
+KSTStatus postCommand(std::uint8_t code, const void* inData, std::size_t inSize) noexcept {
+    const AllocatedMemory cmd(kKSTCommandHeaderSize + inSize);
+    KSTStatus err = fillFrame(cmd, code, 0, inData, inSize);
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    if (inSize > 0) {
-        if (inData == nullptr) {
-            return fail(libraryContext(), "inData", 0, kKSTErrorBadParameter);
-        }
-        std::memcpy(cmd.bytes() + kKSTCommandHeaderSize, inData, inSize);
+    const LibraryPlatform* platform = installedPlatform();
+    if (platform == nullptr) {
+        return fail(libraryContext(), "service", 0, kKSTErrorUnexpected);
     }
-    return sendFrame(cmd, outData, outSize);
+    err = platform->channel.post(gConnection, kKSTSelectorCommand, cmd.bytes(), cmd.size());
+    return err == kKSTErrorSuccess ? err : failCall(libraryContext(), asLibraryStatus(err));
 }
 
 KSTStatus channelTransport(void* /*transportContext*/, std::uint32_t code, std::uint32_t thirdByte,

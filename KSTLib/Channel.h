@@ -5,17 +5,45 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 
 /// The library's connection to the kernel service and the commands on it. Opened once, never
-/// closed. Not synchronised.
+/// closed; a child of the process has none at first. Not synchronised.
 namespace kst {
 
 extern bool gChannelOpen;
 extern platform::ConnectionHandle gConnection;
 
+/// What all that is sent from now on has in common.
+struct CallState {
+    std::optional<platform::KernelConnections::Deadline> deadline;
+    /// A command failed and the connection is gone.
+    bool connectionLost = false;
+};
+
+/// One call of an exported function: whatever it sends has one time limit, LibraryPlatform's
+/// `callLimit`. A call that a result block makes has its own.
+class CallScope {
+  public:
+    CallScope() noexcept;
+    CallScope(const CallScope&) = delete;
+    CallScope& operator=(const CallScope&) = delete;
+    ~CallScope();
+
+  private:
+    CallState outer_;
+};
+
+/// Of the call under way.
+[[nodiscard]] bool isTimeUp() noexcept;
+[[nodiscard]] bool isConnectionLost() noexcept;
+
+/// Lets the library be without a connection, outside of any call; the log level stays.
+void closeChannel() noexcept;
+
 /// Opens the channel unless it is open. kKSTErrorUnexpected: there is no kernel service, or no
-/// platform. Any other status is the platform's; the channel stays closed then, and the service
-/// object is not given back.
+/// platform. kKSTErrorOutOfMemory: no memory for the connection. Any other status is the
+/// platform's; the channel stays closed then, and the service object is not given back.
 [[nodiscard]] KSTStatus init() noexcept;
 
 /// Writes bytes 0 to 6 of a frame that has room for at least 8: second byte 0, byte 7 left alone.
@@ -33,6 +61,11 @@ extern platform::ConnectionHandle gConnection;
 [[nodiscard]] KSTStatus performCommand(std::uint8_t code, std::uint8_t thirdByte,
                                        const void* inData, std::size_t inSize, void* outData,
                                        std::size_t* outSize) noexcept;
+
+/// `performCommand` that waits for nothing: neither until the frame can be sent nor for the reply,
+/// which nobody sees. The connection ends with it. kKSTErrorSuccess: it was sent.
+[[nodiscard]] KSTStatus postCommand(std::uint8_t code, const void* inData,
+                                    std::size_t inSize) noexcept;
 
 /// The library's own KSTTransport: `init`, then `performCommand`. The context is not looked at; of
 /// `code` and `thirdByte` the low byte is sent.

@@ -1,5 +1,6 @@
 #include "KSTLib/ContextCredentials.h"
 
+#include "KSTLib/Channel.h"
 #include "KSTLib/Command.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
@@ -58,6 +59,22 @@ KSTStatus isContained(std::uint32_t code, KSTContextRef context, std::uint32_t n
     return contained ? kKSTErrorSuccess : kKSTErrorNotContained;
 }
 
+/// KSTContextAddCredentialWithScope, in the time of the call that it is part of.
+KSTStatus addCredential(KSTContextRef context, const KSTCredential* credential, KSTScope scope) {
+    constexpr const char* kFunction = "KSTContextAddCredentialWithScope";
+    kst::logCalled(kFunction);
+    return kst::logReturning(kFunction,
+                             sendCredential(kst::kAddCredential, context, credential, scope));
+}
+
+/// KSTContextRemoveCredentialsByTypeAndScope, likewise.
+KSTStatus removeCredentials(KSTContextRef context, std::uint32_t type, KSTScope scope) {
+    constexpr const char* kFunction = "KSTContextRemoveCredentialsByTypeAndScope";
+    kst::logCalled(kFunction);
+    return kst::logReturning(
+        kFunction, removeByNumber(kKSTCommandRemoveCredentialsByType, context, type, scope));
+}
+
 KSTStatus addGlobally(const KSTCredential* credential) {
     KSTStatus err =
         kst::libraryContext().requireArguments({kst::Argument(credential, "credential")});
@@ -66,7 +83,7 @@ KSTStatus addGlobally(const KSTCredential* credential) {
         err = context.create();
     }
     if (err == kKSTErrorSuccess) {
-        err = KSTContextAddCredentialWithScope(context.get(), credential, kKSTScopeGlobal);
+        err = addCredential(context.get(), credential, kKSTScopeGlobal);
     }
     return err;
 }
@@ -75,7 +92,7 @@ KSTStatus removeGlobally(std::uint32_t type) {
     kst::TemporaryContext context;
     KSTStatus err = context.create();
     if (err == kKSTErrorSuccess) {
-        err = KSTContextRemoveCredentialsByTypeAndScope(context.get(), type, kKSTScopeGlobal);
+        err = removeCredentials(context.get(), type, kKSTScopeGlobal);
     }
     return err;
 }
@@ -83,31 +100,32 @@ KSTStatus removeGlobally(std::uint32_t type) {
 } // namespace
 
 KSTStatus KSTContextAddCredential(KSTContextRef context, const KSTCredential* credential) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return KSTContextAddCredentialWithScope(context, credential, kKSTScopeContext);
 }
 
 KSTStatus KSTContextAddCredentialWithScope(KSTContextRef context, const KSTCredential* credential,
                                            KSTScope scope) noexcept {
-    kst::logCalled(__func__);
-    return kst::logReturning(__func__,
-                             sendCredential(kst::kAddCredential, context, credential, scope));
+    const kst::CallScope call;
+    return addCredential(context, credential, scope);
 }
 
 KSTStatus KSTContextRemoveCredentialsByType(KSTContextRef context, std::uint32_t type) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return KSTContextRemoveCredentialsByTypeAndScope(context, type, kKSTScopeContext);
 }
 
 KSTStatus KSTContextRemoveCredentialsByTypeAndScope(KSTContextRef context, std::uint32_t type,
                                                     KSTScope scope) noexcept {
-    kst::logCalled(__func__);
-    return kst::logReturning(
-        __func__, removeByNumber(kKSTCommandRemoveCredentialsByType, context, type, scope));
+    const kst::CallScope call;
+    return removeCredentials(context, type, scope);
 }
 
 KSTStatus KSTContextRemoveCredentialsByValue(KSTContextRef context,
                                              const KSTCredential* credential) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return KSTContextRemoveCredentialsByValueAndScope(context, credential, kKSTScopeContext);
 }
@@ -115,18 +133,21 @@ KSTStatus KSTContextRemoveCredentialsByValue(KSTContextRef context,
 KSTStatus KSTContextRemoveCredentialsByValueAndScope(KSTContextRef context,
                                                      const KSTCredential* credential,
                                                      KSTScope scope) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return kst::logReturning(__func__,
                              sendCredential(kst::kRemoveCredential, context, credential, scope));
 }
 
 KSTStatus KSTContextContainsCredentialType(KSTContextRef context, std::uint32_t type) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return KSTContextContainsCredentialTypeEx(context, type, 0);
 }
 
 KSTStatus KSTContextContainsCredentialTypeEx(KSTContextRef context, std::uint32_t type,
                                              std::uint32_t argument) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return kst::logReturning(
         __func__, isContained(kKSTCommandContainsCredentialType, context, type, argument));
@@ -135,6 +156,7 @@ KSTStatus KSTContextContainsCredentialTypeEx(KSTContextRef context, std::uint32_
 KSTStatus KSTContextRemovePassphraseCredentialsByPurposeAndScope(KSTContextRef context,
                                                                  KSTPassphrasePurpose purpose,
                                                                  KSTScope scope) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return kst::logReturning(
         __func__, removeByNumber(kKSTCommandRemovePassphraseCredentials, context, purpose, scope));
@@ -143,6 +165,7 @@ KSTStatus KSTContextRemovePassphraseCredentialsByPurposeAndScope(KSTContextRef c
 KSTStatus KSTContextReplacePassphraseCredentialsWithScope(KSTContextRef context,
                                                           const KSTCredential* credential,
                                                           KSTScope scope) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return kst::logReturning(__func__,
                              sendCredential(kst::kReplacePassphrase, context, credential, scope));
@@ -151,17 +174,20 @@ KSTStatus KSTContextReplacePassphraseCredentialsWithScope(KSTContextRef context,
 KSTStatus KSTContextContainsPassphraseCredentialWithPurpose(KSTContextRef context,
                                                             KSTPassphrasePurpose purpose,
                                                             std::uint32_t argument) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return kst::logReturning(
         __func__, isContained(kKSTCommandContainsPassphraseCredential, context, purpose, argument));
 }
 
 KSTStatus KSTGlobalContextAddCredential(const KSTCredential* credential) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return kst::logReturning(__func__, addGlobally(credential));
 }
 
 KSTStatus KSTGlobalContextRemoveCredentialsByType(std::uint32_t type) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return kst::logReturning(__func__, removeGlobally(type));
 }

@@ -4,6 +4,7 @@
 #include "KSTLib/Command.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
+#include "KSTLib/TemporaryContext.h"
 #include "common/Allocation.h"
 #include "common/AssertLine.h"
 #include "common/ContextObject.h"
@@ -14,6 +15,7 @@
 namespace {
 
 constexpr std::size_t kCreateReplySize = kKSTHandleSize + sizeof(std::uint8_t);
+constexpr const char* kDeleteFunction = "KSTContextDelete";
 constexpr std::size_t kOpenReplySize = sizeof(std::uint32_t) + sizeof(std::uint8_t);
 
 /// What every function of the family does with a failure.
@@ -44,18 +46,17 @@ KSTStatus create(const char* function, KSTContextRef* context) {
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    auto* ref = static_cast<std::uint8_t*>(kst::allocate(kCreateReplySize));
-    if (ref == nullptr) {
+    kst::AllocatedMemory ref(kCreateReplySize);
+    if (ref.bytes() == nullptr) {
         return kst::fail(kst::libraryContext(), "ref", 0, kKSTErrorOutOfMemory);
     }
-    err = requestContext(ref);
+    err = requestContext(ref.bytes());
     if (err != kKSTErrorSuccess) {
-        kst::release(ref, kCreateReplySize);
         return err;
     }
-    kst::gLogLevel = ref[kKSTHandleSize];
+    kst::gLogLevel = ref.bytes()[kKSTHandleSize];
     kst::logLevelSet(function);
-    *context = reinterpret_cast<KSTContext*>(ref);
+    *context = reinterpret_cast<KSTContext*>(ref.handOut());
     return kKSTErrorSuccess;
 }
 
@@ -114,7 +115,7 @@ KSTStatus sendHandle(std::uint32_t code, KSTContextRef context) {
     return kst::librarySender().send(code, context->handle.bytes, kKSTHandleSize, nullptr, nullptr);
 }
 
-KSTStatus deleteContext(KSTContextRef context, bool destroy) {
+KSTStatus deleteContextInternal(KSTContextRef context, bool destroy) {
     KSTStatus err = kst::libraryContext().requireArguments({kst::Argument(context, "context")});
     if (err == kKSTErrorSuccess && destroy) {
         err = sendHandle(kKSTCommandContextDelete, context);
@@ -142,13 +143,39 @@ KSTStatus getExternalForm(KSTContextRef context, const KSTDataBlock& processExte
 
 } // namespace
 
+namespace kst {
+
+KSTStatus createContext(KSTContextRef* context) noexcept {
+    constexpr const char* kFunction = "KSTContextCreate";
+    logCalled(kFunction);
+    return logContextReturning(kFunction, create(kFunction, context));
+}
+
+KSTStatus deleteContext(KSTContextRef context, bool destroy) noexcept {
+    logCalled(kDeleteFunction);
+    return logContextReturning(kDeleteFunction, deleteContextInternal(context, destroy));
+}
+
+KSTStatus postContextDelete(KSTContextRef context) noexcept {
+    logCalled(kDeleteFunction);
+    const KSTStatus err =
+        postCommand(kKSTCommandContextDelete, context->handle.bytes, kKSTHandleSize);
+    if (err == kKSTErrorSuccess) {
+        disposeOfContext(context);
+    }
+    return logReturning(kDeleteFunction, err);
+}
+
+} // namespace kst
+
 KSTStatus KSTContextCreate(KSTContextRef* context) noexcept {
-    kst::logCalled(__func__);
-    return logContextReturning(__func__, create(__func__, context));
+    const kst::CallScope call;
+    return kst::createContext(context);
 }
 
 KSTContextRef KSTContextCreateWithExternalForm(const void* externalForm,
                                                std::size_t dataLength) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     KSTContextRef context = nullptr;
     const KSTStatus err = open(externalForm, dataLength, context);
@@ -160,11 +187,12 @@ KSTContextRef KSTContextCreateWithExternalForm(const void* externalForm,
 }
 
 KSTStatus KSTContextDelete(KSTContextRef context, bool destroy) noexcept {
-    kst::logCalled(__func__);
-    return logContextReturning(__func__, deleteContext(context, destroy));
+    const kst::CallScope call;
+    return kst::deleteContext(context, destroy);
 }
 
 void KSTContextGetExternalForm(KSTContextRef context, KSTDataBlock processExternalForm) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     logContextReturning(__func__, getExternalForm(context, processExternalForm));
 }

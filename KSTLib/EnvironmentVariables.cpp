@@ -5,6 +5,7 @@
 
 KSTStatus KSTSetEnvironmentVariable(std::uint32_t variable, const void* data,
                                     std::size_t dataLength) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return kst::logReturning(__func__,
                              LibCall_KSTSetEnvironmentVariable(kst::channelTransport, nullptr,
@@ -12,6 +13,7 @@ KSTStatus KSTSetEnvironmentVariable(std::uint32_t variable, const void* data,
 }
 
 KSTStatus KSTGetEnvironmentVariable(std::uint32_t variable, KSTDataBlock processVariable) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return kst::logReturning(__func__,
                              LibCall_KSTGetEnvironmentVariable_Block(kst::channelTransport, nullptr,

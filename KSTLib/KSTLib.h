@@ -24,9 +24,20 @@
  *  call tries again. They are synchronous and run on the calling thread. Nothing is locked: a
  *  program with several threads makes one call at a time.
  *
+ *  Each of them waits for the kernel service for 5 seconds at the most, however much it sends. A
+ *  context that one makes for itself (on the global scope) is deleted at its end; when the time is
+ *  up that is sent without waiting for an answer.
+ *
+ *  A process may fork at any time, also while another thread is inside a call, for which fork does
+ *  not wait. The child has no connection: it closes what it inherited without a byte on it, and its
+ *  first call that sends opens one of its own. The parent goes on undisturbed. In the child
+ * contexts keep their handles, the log level is as it was, and what the library held for the calls
+ * of other threads is wiped.
+ *
  *  Every function may return, beside what it names itself:
  *    kKSTErrorUnexpected   the kernel service could not be found;
- *    kKSTErrorOutOfMemory  memory for the command could not be had; nothing was sent;
+ *    kKSTErrorOutOfMemory  memory for the command or the connection could not be had; nothing was
+ *                          sent;
  *    a status of the platform (-1001 to -5095) or of the kernel side, unchanged.
  *
  *  A failed check writes its line to the system log whatever the log level is, and each place that

@@ -17,9 +17,9 @@ namespace kst {
     return err == kKSTErrorSuccess ? err : failCall(libraryContext(), err, place);
 }
 
-/// `updateLogLevel`, unless there is no connection to ask over.
+/// `updateLogLevel`, unless there is no connection to ask over, or the call that failed ended it.
 inline void updateLogLevelIfOpen() noexcept {
-    if (gChannelOpen) {
+    if (gChannelOpen && !isConnectionLost()) {
         updateLogLevel();
     }
 }

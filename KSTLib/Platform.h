@@ -4,6 +4,9 @@
 #include "platform/ServiceRegistry.h"
 #include "platform/SystemLog.h"
 
+#include <chrono>
+#include <cstdint>
+
 /// What the library stands on: one set for the process. Not synchronised.
 namespace kst {
 
@@ -12,6 +15,8 @@ struct LibraryPlatform {
     platform::SystemLog& log;
     platform::ServiceRegistry& registry;
     platform::KernelChannel& channel;
+    /// How long an exported function may wait for the kernel side in all.
+    std::chrono::milliseconds callLimit{5000};
 };
 
 /// Makes `platform` what the library stands on and starts the library anew: no connection, the
@@ -24,5 +29,16 @@ void removePlatform() noexcept;
 
 /// What is installed, or null.
 [[nodiscard]] const LibraryPlatform* installedPlatform() noexcept;
+
+/// Sees to it that a child of the process begins without a connection and without what calls of
+/// other threads held. Done when a platform is installed; false when that failed for want of memory
+/// and fails again.
+[[nodiscard]] bool watchForks() noexcept;
+
+/// The same by a child of which nobody told, because it was not made by `fork`.
+void leaveInheritedToParent() noexcept;
+
+/// Differs between a process and its child.
+[[nodiscard]] std::uint64_t processNumber() noexcept;
 
 } // namespace kst

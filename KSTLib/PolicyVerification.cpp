@@ -1,5 +1,6 @@
 #include "KSTLib/PolicyVerification.h"
 
+#include "KSTLib/Channel.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
 #include "KSTLib/RequirementSerialization.h"
@@ -124,6 +125,7 @@ KSTStatus verifyPolicyGlobally(kst::PolicyQuestion question, const char* policyI
 
 KSTStatus KSTContextVerifyPolicy(KSTContextRef context, const char* policyId,
                                  KSTPolicyBlock processRequirement) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return kst::logReturning(__func__, verifyPolicyAndHandOver({context, false, 0, nullptr, 0},
                                                                policyId, processRequirement));
@@ -132,6 +134,7 @@ KSTStatus KSTContextVerifyPolicy(KSTContextRef context, const char* policyId,
 KSTStatus KSTContextVerifyPolicyWithPreflight(KSTContextRef context, const char* policyId,
                                               bool preflight,
                                               KSTPolicyBlock processRequirement) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     return kst::logReturning(__func__, verifyPolicyAndHandOver({context, preflight, 0, nullptr, 0},
                                                                policyId, processRequirement));
@@ -141,6 +144,7 @@ void KSTContextVerifyPolicyEx(KSTContextRef context, const char* policyId, bool 
                               const KSTParameter* parameters, std::uint32_t parametersCount,
                               std::uint32_t maxGlobalCredentialAge,
                               KSTPolicyStatusBlock processRequirement) noexcept {
+    const kst::CallScope call;
     static_cast<void>(
         verifyPolicyEx({context, preflight, maxGlobalCredentialAge, parameters, parametersCount},
                        policyId, processRequirement));
@@ -149,6 +153,7 @@ void KSTContextVerifyPolicyEx(KSTContextRef context, const char* policyId, bool 
 void KSTGlobalContextVerifyPolicy(const char* policyId, bool preflight,
                                   const KSTParameter* parameters, std::uint32_t parametersCount,
                                   KSTPolicyStatusBlock processRequirement) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     kst::logReturning(
         __func__, verifyPolicyGlobally({nullptr, preflight, kAnyAge, parameters, parametersCount},
@@ -160,6 +165,7 @@ void KSTContextVerifyAclConstraint(KSTContextRef context, const void* aclConstra
                                    const KSTParameter* parameters, std::uint32_t parametersCount,
                                    std::uint32_t maxGlobalCredentialAge,
                                    KSTPolicyStatusBlock processRequirement) noexcept {
+    const kst::CallScope call;
     kst::logCalled(__func__);
     kst::PolicyAnswer answer;
     const KSTStatus err = verifyAclConstraint(

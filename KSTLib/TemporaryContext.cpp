@@ -1,18 +1,27 @@
 #include "KSTLib/TemporaryContext.h"
 
-#include "KSTLib/Contexts.h"
+#include "KSTLib/Channel.h"
 #include "KSTLib/LibraryLogging.h"
+#include "KSTLib/Platform.h"
 
 namespace kst {
 
 TemporaryContext::~TemporaryContext() {
-    if (context_ != nullptr && KSTContextDelete(context_, true) != kKSTErrorSuccess) {
-        static_cast<void>(KSTContextDelete(context_, false));
+    if (context_ == nullptr) {
+        return;
+    }
+    KSTStatus err = kKSTErrorUnexpected;
+    if (process_ == processNumber()) {
+        err = isTimeUp() ? postContextDelete(context_) : deleteContext(context_, true);
+    }
+    if (err != kKSTErrorSuccess) {
+        static_cast<void>(deleteContext(context_, false));
     }
 }
 
 KSTStatus TemporaryContext::create(CheckPlace place) noexcept {
-    const KSTStatus err = KSTContextCreate(&context_);
+    process_ = processNumber();
+    const KSTStatus err = createContext(&context_);
     return err == kKSTErrorSuccess ? err : failCall(libraryContext(), err, place);
 }
 

@@ -4,10 +4,21 @@
 #include "KSTLib/Status.h"
 #include "common/AssertLine.h"
 
+#include <cstdint>
+
 namespace kst {
 
-/// A context that is made for one call on the global scope and destroyed at the end of the scope.
-/// When the kernel service cannot be told, the object goes alone.
+/// KSTContextCreate and KSTContextDelete as parts of another function's call, in whose time they
+/// are.
+[[nodiscard]] KSTStatus createContext(KSTContextRef* context) noexcept;
+[[nodiscard]] KSTStatus deleteContext(KSTContextRef context, bool destroy) noexcept;
+
+/// `deleteContext` that tells the kernel service and does not wait for its answer.
+[[nodiscard]] KSTStatus postContextDelete(KSTContextRef context) noexcept;
+
+/// A context that is made for one call on the global scope and destroyed at the end of the scope:
+/// also when the call's time is up, but then nobody waits for the kernel service's answer. When it
+/// cannot be told, and in a child that a block of the call forked, the object goes alone.
 class TemporaryContext {
   public:
     TemporaryContext() = default;
@@ -22,6 +33,7 @@ class TemporaryContext {
 
   private:
     KSTContextRef context_ = nullptr;
+    std::uint64_t process_ = 0;
 };
 
 } // namespace kst

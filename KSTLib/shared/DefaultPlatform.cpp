@@ -6,19 +6,25 @@
 #include "platform/linux/LinuxSystemLog.h"
 #include "platform/linux/Paths.h"
 
+#include <cstddef>
+#include <new>
+
 namespace {
 
 struct DefaultPlatform {
     platform::Paths paths{"/"};
     platform::LinuxSystemLog log{paths};
-    platform::LinuxServiceRegistry registry{paths.kernelSocket(), log};
-    platform::LinuxKernelChannel channel{paths.kernelSocket(), registry, log};
+    platform::LinuxServiceRegistry registry{platform::Paths::kKernelSocket, log};
+    platform::LinuxKernelChannel channel{platform::Paths::kKernelSocket, registry, log};
 };
+
+// Not allocated: there may be no memory when the library is loaded, which nobody could be told.
+alignas(DefaultPlatform) std::byte place[sizeof(DefaultPlatform)];
 
 /// Runs when the library is loaded, before any function of it can be called. What it makes is never
 /// destroyed: a program may call the library from its own last destructor.
 [[gnu::constructor]] void installDefaultPlatform() {
-    auto* const made = new DefaultPlatform;
+    auto* const made = new (place) DefaultPlatform;
     kst::installPlatform({made->log, made->registry, made->channel});
 }
 

@@ -9,6 +9,9 @@ namespace platform {
 /// a private directory in development and tests.
 class Paths {
   public:
+    /// Where clients look for the kernel service, who know no other root than "/".
+    static constexpr std::string_view kKernelSocket = "/run/keystrand/service.sock";
+
     /// `root` is absolute; slashes at its end do not matter.
     explicit Paths(std::string_view root);
 
@@ -19,7 +22,7 @@ class Paths {
 
     [[nodiscard]] std::string eventSocket() const { return under("/run/kstd/events.sock"); }
     [[nodiscard]] std::string httpsSocket() const { return under("/run/kstd/https.sock"); }
-    [[nodiscard]] std::string kernelSocket() const { return under("/run/keystrand/service.sock"); }
+    [[nodiscard]] std::string kernelSocket() const { return under(kKernelSocket); }
     [[nodiscard]] std::string managedSettingsDirectory() const { return under("/etc/kstd"); }
     [[nodiscard]] std::string managedSettings() const {
         return under("/etc/kstd/managed-settings.conf");
