@@ -19,11 +19,15 @@
 #include <span>
 #include <string>
 #include <string_view>
+#include <typeinfo>
 #include <vector>
 
 struct sqlite3;
 
 namespace kstd {
+
+/// What `type` is called in its source, without namespaces.
+[[nodiscard]] std::string ownClassName(const std::type_info& type);
 
 using ColumnNames = std::vector<std::string>;
 /// Columns by their names, those that are NULL left out.
@@ -31,6 +35,17 @@ using RowList = std::vector<platform::ValueMap>;
 /// Gets one row after the other; setting `stop` ends it after that row. Must not use the database
 /// with the very text of the query that it is called for: that would start the query anew.
 using RowVisitor = std::function<void(const platform::ValueMap& row, bool& stop)>;
+
+/// The name that the table of a record class is named after: what its static KSTDSQLiteClassName
+/// tells, or, without one, its own name, without namespaces.
+template <typename Record>
+[[nodiscard]] std::string KSTDSQLiteClassName() {
+    if constexpr (requires { Record::KSTDSQLiteClassName(); }) {
+        return Record::KSTDSQLiteClassName();
+    } else {
+        return ownClassName(typeid(Record));
+    }
+}
 
 /// One database file, its connection, its cached statements and its table of properties.
 ///
@@ -197,8 +212,12 @@ class KSTDSQLite {
     void deleteFrom(std::string_view table, std::string_view where,
                     const platform::ValueList& bindings);
 
-    /// The name of the class without the prefix; none, with a line, when it does not begin with it.
-    [[nodiscard]] std::optional<std::string> tableNameForClass(std::string_view className) const;
+    /// The name of a record class without the prefix; none, with a line, when it does not begin
+    /// with it.
+    template <typename Record>
+    [[nodiscard]] std::optional<std::string> tableNameForClass() const {
+        return tableNameForClassNamed(KSTDSQLiteClassName<Record>());
+    }
 
   protected:
     [[nodiscard]] const DatabaseEnvironment& environment() const { return environment_; }
@@ -208,6 +227,8 @@ class KSTDSQLite {
     /// What an opening has done about the tables.
     enum class Tables { kept, made, rebuilt, failed };
 
+    [[nodiscard]] std::optional<std::string>
+    tableNameForClassNamed(std::string_view className) const;
     [[nodiscard]] bool openConnection(platform::Error& reason);
     [[nodiscard]] bool configureConnection();
     [[nodiscard]] Tables makeTablesCurrent();

@@ -2,6 +2,9 @@
 #include "kstd/Analytics/SQLite/KSTDSQLite.h"
 #include "kstd/Analytics/SQLite/StatementRows.h"
 
+#include <cstdlib>
+#include <cxxabi.h>
+#include <memory>
 #include <utility>
 
 namespace kstd {
@@ -183,7 +186,15 @@ void KSTDSQLite::deleteFrom(std::string_view table, std::string_view where,
     stepOnce(*this, base::concat("delete from ", table, " where ", where), bindings);
 }
 
-std::optional<std::string> KSTDSQLite::tableNameForClass(std::string_view className) const {
+std::string ownClassName(const std::type_info& type) {
+    const std::unique_ptr<char, decltype(&std::free)> readable(
+        abi::__cxa_demangle(type.name(), nullptr, nullptr, nullptr), &std::free);
+    const std::string_view name = readable != nullptr ? readable.get() : type.name();
+    const std::size_t scope = name.rfind("::");
+    return std::string(scope == std::string_view::npos ? name : name.substr(scope + 2));
+}
+
+std::optional<std::string> KSTDSQLite::tableNameForClassNamed(std::string_view className) const {
     if (!className.starts_with(objectClassPrefix_)) {
         logError(base::concat("KSTDSQLite: Object class \"", className,
                               "\" does not have prefix \"", objectClassPrefix_, "\""));

@@ -292,17 +292,46 @@ TEST_F(QueryBuilderTest, ClosedDatabaseYieldsNothing) {
     EXPECT_EQ(lines(), Texts(2, "KSTDSQLite: Database is closed"));
 }
 
+struct RXEvent {};
+struct RX {};
+struct R {};
+struct Event {};
+struct rxEvent {};
+struct Renamed {
+    static std::string KSTDSQLiteClassName() { return "RXOther"; }
+};
+struct RXUnnamed {
+    static std::string KSTDSQLiteClassName() { return ""; }
+};
+
+TEST_F(QueryBuilderTest, RecordClassTellsItsName) {
+    EXPECT_EQ(KSTDSQLiteClassName<RXEvent>(), "RXEvent");
+    EXPECT_EQ(KSTDSQLiteClassName<KSTDSQLite>(), "KSTDSQLite");
+    EXPECT_EQ(KSTDSQLiteClassName<Renamed>(), "RXOther");
+    EXPECT_EQ(KSTDSQLiteClassName<RXUnnamed>(), "");
+}
+
 TEST_F(QueryBuilderTest, TableOfAClassIsItsNameWithoutThePrefix) {
-    EXPECT_EQ(opened->tableNameForClass("RXEvent"), "Event");
-    EXPECT_EQ(opened->tableNameForClass("RX"), "");
+    EXPECT_EQ(opened->tableNameForClass<RXEvent>(), "Event");
+    EXPECT_EQ(opened->tableNameForClass<RX>(), "");
+    EXPECT_EQ(opened->tableNameForClass<Renamed>(), "Other");
     EXPECT_EQ(lines(), Texts());
-    for (const char* const name : {"Event", "rxEvent", "R", ""}) {
-        EXPECT_EQ(opened->tableNameForClass(name), std::nullopt);
-        EXPECT_EQ(lines(), Texts{"KSTDSQLite: Object class \"" + std::string(name) +
-                                 "\" does not have prefix \"RX\""});
-    }
+    const auto refused = [](const std::string& name, const std::string& prefix) {
+        return Texts{"KSTDSQLite: Object class \"" + name + "\" does not have prefix \"" + prefix +
+                     "\""};
+    };
+    EXPECT_EQ(opened->tableNameForClass<Event>(), std::nullopt);
+    EXPECT_EQ(lines(), refused("Event", "RX"));
+    EXPECT_EQ(opened->tableNameForClass<R>(), std::nullopt);
+    EXPECT_EQ(lines(), refused("R", "RX"));
+    EXPECT_EQ(opened->tableNameForClass<rxEvent>(), std::nullopt);
+    EXPECT_EQ(lines(), refused("rxEvent", "RX"));
+    EXPECT_EQ(opened->tableNameForClass<RXUnnamed>(), std::nullopt);
+    EXPECT_EQ(lines(), refused("", "RX"));
     opened->setObjectClassPrefix("Ev");
-    EXPECT_EQ(opened->tableNameForClass("Event"), "ent");
+    EXPECT_EQ(opened->tableNameForClass<Event>(), "ent");
+    EXPECT_EQ(opened->tableNameForClass<Renamed>(), std::nullopt);
+    EXPECT_EQ(lines(), refused("RXOther", "Ev"));
 }
 
 } // namespace
