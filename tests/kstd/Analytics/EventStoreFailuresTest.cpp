@@ -131,6 +131,57 @@ TEST_F(EventStoreFailuresTest, FileWithoutItsLastPage) {
     expectSound(path);
 }
 
+/// A page that nobody reads keeps nobody from storing.
+TEST_F(EventStoreFailuresTest, PageDamagedAmongTheEvents) {
+    constexpr std::int64_t kEvents = 300;
+    {
+        const Store store = makeStore();
+        for (std::int64_t i = 0; i < kEvents; ++i) {
+            store->addEventDict(event(i), kEventTable);
+        }
+    }
+    TQAnalyticsLoggerSQLiteStore::releaseStores();
+    const std::string page = OtherConnection(path).one(
+        "select pageno from dbstat where name = 'all_events' and pagetype = 'leaf' "
+        "order by path limit 1 offset 3");
+    std::string content = read(path);
+    content.replace((std::stoul(page) - 1) * 4096, 4096, std::string(4096, '\xff'));
+    write(path, content);
+
+    const Store store = makeStore();
+    store->addEventDict(event(kEvents), kEventTable);
+    EXPECT_EQ(lines(), Texts());
+    const std::size_t readable = store->allEvents().size();
+    EXPECT_GT(readable, 0U);
+    EXPECT_LT(readable, static_cast<std::size_t>(kEvents));
+    EXPECT_EQ(lines(), Texts{"KSTDSQLite: Failed to step (11): \"select data from all_events\""});
+    store->clearAllData();
+    EXPECT_EQ(lines(),
+              Texts{"KSTDSQLite: Failed to step (11): \"delete from all_events where id >= 0\""});
+    EXPECT_EQ(store->allEvents().size(), readable);
+}
+
+/// SQLite takes the first part of a log that is not as it was written for its end.
+TEST_F(EventStoreFailuresTest, DamagedLogEndsBeforeTheDamage) {
+    const Store store = makeStore();
+    ASSERT_EQ(OtherConnection(path).run("pragma wal_checkpoint(TRUNCATE)"), SQLITE_OK);
+    for (const std::int64_t i : {1, 2, 3}) {
+        store->addEventDict(event(i), kEventTable);
+    }
+    // As a power cut leaves them, and then some.
+    const std::string copy = directory.file("copy.db");
+    write(copy, read(path));
+    std::string logged = read(path + "-wal");
+    logged[logged.size() - 100] = static_cast<char>(logged[logged.size() - 100] ^ 1);
+    write(copy + "-wal", logged);
+
+    const Store damaged = storeAt(copy);
+    EXPECT_EQ(damaged->allEvents(), (ValueList{event(1), event(2)}));
+    damaged->addEventDict(event(4), kEventTable);
+    EXPECT_EQ(damaged->allEvents(), (ValueList{event(1), event(2), event(4)}));
+    EXPECT_EQ(lines(), Texts());
+}
+
 TEST_F(EventStoreFailuresTest, EmptyFileIsANewDatabase) {
     write(path, "");
     const Store store = makeStore();

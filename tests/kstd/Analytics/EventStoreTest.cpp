@@ -1,3 +1,4 @@
+#include "kstd/Analytics/SQLite/StatementRows.h"
 #include "tests/kstd/Analytics/EventStoreFixture.h"
 
 #include <thread>
@@ -101,6 +102,23 @@ TEST_F(EventStoreTest, EventsSurviveTheProcess) {
     clock.advance(1);
     EXPECT_EQ(makeStore()->allEvents(), ValueList{event(1)});
     EXPECT_EQ(lines(), Texts());
+}
+
+/// What a power cut may take is what was logged since then.
+TEST_F(EventStoreTest, LogIsSyncedWhenItIsWorkedIntoTheFileAndThatEveryThousandPages) {
+    const Store store = makeStore();
+    const auto valueOf = [&store](const std::string& pragma) {
+        std::int64_t value = -1;
+        forEachRow(*store, "pragma " + pragma, {}, [&value](const KSTDSQLiteStatement& row) {
+            value = row.int64AtIndex(0);
+            return true;
+        });
+        return value;
+    };
+    EXPECT_EQ(valueOf("synchronous"), 1);
+    EXPECT_EQ(valueOf("wal_autocheckpoint"), 1000);
+    store->addEventDict(event(1), kEventTable);
+    EXPECT_GT(std::filesystem::file_size(path + "-wal"), 0U);
 }
 
 TEST_F(EventStoreTest, EventThatCannotBeExpressedIsDroppedWithALine) {

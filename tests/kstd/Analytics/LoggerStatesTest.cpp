@@ -2,6 +2,8 @@
 
 #include "platform/HostWith.h"
 #include "tests/kstd/Analytics/LoggerFixture.h"
+#include "tests/kstd/Analytics/SQLite/LockHolder.h"
+#include "tests/kstd/Analytics/SQLite/SleeplessFiles.h"
 
 #include <algorithm>
 #include <filesystem>
@@ -303,6 +305,34 @@ TEST_F(LoggerFixture, TheDateAfterAnUploadIsOneIntervalFromItsEnd) {
     // Setting the date, keeping the event, the document, the upload, the reset.
     EXPECT_EQ(fake.queues.workItems() - workItems, 5U);
     EXPECT_EQ(dueDate(), kNext);
+}
+
+/// Another program that holds a write transaction for longer than anybody waits.
+TEST_F(LoggerFixture, LockHoldsAnEventUpForFiveMinutesAndTheFirstOneForFourTimesThat) {
+    constexpr std::int64_t kFiveMinutes = 300'000'000;
+    std::filesystem::create_directories(databaseFile().parent_path());
+    LockHolder holder(databaseFile());
+    std::int64_t waited = 0;
+    const SleeplessFiles sleepless([&waited](int microseconds) { waited += microseconds; });
+    setDueDate(kNow + kInterval);
+    holder.lock();
+    logger().logEventNamed("event", nullptr);
+    EXPECT_EQ(waited, kFiveMinutes);
+    EXPECT_EQ(events().size(), 0U);
+
+    onQueue([this] { logger().fields.database->close(); });
+    waited = 0;
+    static_cast<void>(TQAnalyticsLoggerSQLiteStore::storeWithPath(
+        databaseFile(), kEventSchema,
+        {.log = fake.log, .clock = machine.clock, .propertyLists = fake.propertyLists}));
+    logger().logEventNamed("event", nullptr);
+    EXPECT_EQ(waited, 4 * kFiveMinutes);
+
+    holder.unlock();
+    waited = 0;
+    logger().logEventNamed("event", nullptr);
+    EXPECT_EQ(events().size(), 1U);
+    EXPECT_EQ(waited, 0);
 }
 
 /// Calls back when a line is written.
