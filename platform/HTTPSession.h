@@ -87,7 +87,7 @@ struct HTTPRequest {
     std::optional<Link> link;
     /// Of a "POST". Must last until the completion was called.
     std::string_view body = {};
-    /// An answer with a longer body is a transport error.
+    /// Of a "GET": an answer with a longer body is a transport error.
     std::size_t maximumAnswerSize = 1024UL * 1024;
 };
 
@@ -98,7 +98,9 @@ struct HTTPResponse {
     std::string className;
 };
 
-/// How a request ended: an error, or a response with its body.
+/// How a request ended: an error, or a response with its body. That of the answer to a "POST" is
+/// never given: once the header of the final answer has come, nothing that befalls its body is an
+/// error. (As long as a document is not out, an answer that accepts it must be whole to count.)
 struct HTTPReply {
     /// Domain kTransportErrorDomain.
     std::optional<Error> error;
@@ -121,9 +123,10 @@ using HTTPCompletion = std::function<void(const HTTPReply&)>;
 /// Requests that share headers and a delegate, and nothing else: no cookies, caches or credentials
 /// are kept.
 ///
-/// Redirects are not followed: the answer is what the first server says. There is no limit on the
-/// whole time of a request, but one on the time to connect and one on standing still; both end it
-/// with kTimedOut. No header is sent but Host, Content-Length (with a body) and the session's own.
+/// Redirects are not followed: the answer is what the first server says. How long a request may
+/// take depends on its method and its size only (platform/shared/HTTPLimits.h); what takes longer
+/// ends it with kTimedOut. No header is sent but Host, Content-Length (with a body) and the
+/// session's own.
 class HTTPSession {
   public:
     HTTPSession() = default;

@@ -27,8 +27,8 @@ struct Options {
     std::string root;
     int idleMilliseconds = 0;
     std::string trustAnchors;
-    int slowSeconds = 0;
-    long slowestSpeed = 0;
+    double fetchSeconds = 0;
+    double answerSeconds = 0;
 };
 
 /// The HTTPS client, which lies beside this program, with what it is to be told.
@@ -38,11 +38,11 @@ std::vector<std::string> httpsClient(const Options& options) {
     if (!options.trustAnchors.empty()) {
         words.insert(words.end(), {"--trust-anchors", options.trustAnchors});
     }
-    if (options.slowSeconds > 0) {
-        words.insert(words.end(), {"--slow-limit", std::to_string(options.slowSeconds)});
+    if (options.fetchSeconds > 0) {
+        words.insert(words.end(), {"--fetch-limit", std::to_string(options.fetchSeconds)});
     }
-    if (options.slowestSpeed > 0) {
-        words.insert(words.end(), {"--slowest-speed", std::to_string(options.slowestSpeed)});
+    if (options.answerSeconds > 0) {
+        words.insert(words.end(), {"--answer-limit", std::to_string(options.answerSeconds)});
     }
     return words;
 }
@@ -99,10 +99,10 @@ int main(int argc, char** argv) try {
                    "End after this many milliseconds without work; 0 is never");
     app.add_option("--trust-anchors", options.trustAnchors,
                    "Certificates (PEM) that servers are trusted by, in place of the system's");
-    app.add_option("--slow-limit", options.slowSeconds,
-                   "Give a server up that is too slow for this many seconds; 0 is the default");
-    app.add_option("--slowest-speed", options.slowestSpeed,
-                   "Fewer bytes a second than this are too slow; 0 is the default");
+    app.add_option("--fetch-limit", options.fetchSeconds,
+                   "Seconds that an endpoint bag may take; 0 is the default");
+    app.add_option("--answer-limit", options.answerSeconds,
+                   "Seconds that a server may take to answer a document; 0 is the default");
     CLI11_PARSE(app, argc, argv);
     return runDaemon(options, stop);
 } catch (const std::exception& error) {

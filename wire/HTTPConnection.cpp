@@ -12,11 +12,14 @@ using State = HTTPConnectionState;
 
 class HTTPConnection::Deadline {
   public:
-    explicit Deadline(Patience patience) {
+    Deadline(Patience patience, std::optional<Clock::time_point> end) : end_(end) {
         if (patience) {
-            end_ = Clock::now() + *patience;
+            const auto patient = Clock::now() + *patience;
+            end_ = end_ ? std::min(*end_, patient) : patient;
         }
     }
+
+    [[nodiscard]] bool hasPassed() const { return end_ && Clock::now() >= *end_; }
 
     /// What is left, as poll takes it; -1 is for ever.
     [[nodiscard]] int milliseconds() const {
@@ -29,8 +32,6 @@ class HTTPConnection::Deadline {
     }
 
   private:
-    using Clock = std::chrono::steady_clock;
-
     std::optional<Clock::time_point> end_;
 };
 
@@ -60,7 +61,7 @@ State HTTPConnection::sendPiece(std::span<const std::uint8_t> bytes) {
 }
 
 State HTTPConnection::sendAll(std::initializer_list<std::span<const std::uint8_t>> parts) {
-    const Deadline deadline(patience_);
+    const Deadline deadline(patience_, end_);
     for (std::span<const std::uint8_t> left : parts) {
         while (!left.empty()) {
             const ssize_t sent =
@@ -81,7 +82,10 @@ State HTTPConnection::sendAll(std::initializer_list<std::span<const std::uint8_t
 }
 
 State HTTPConnection::receive(HTTPMessage& message) {
-    const Deadline deadline(patience_);
+    const Deadline deadline(patience_, end_);
+    if (deadline.hasPassed()) {
+        return State::timedOut;
+    }
     HTTPHeaderBytes bytes{};
     State state = receiveAll(bytes, deadline);
     if (state != State::open) {

@@ -36,6 +36,7 @@ struct HTTPMessage {
 /// open a connection is of no more use.
 class HTTPConnection {
   public:
+    using Clock = std::chrono::steady_clock;
     /// How long one message may take in either direction; none is for ever.
     using Patience = std::optional<std::chrono::milliseconds>;
 
@@ -43,6 +44,10 @@ class HTTPConnection {
     /// for any more; -1 for none.
     HTTPConnection(base::FileDescriptor socket, Patience patience, int interrupt = -1)
         : socket_(std::move(socket)), patience_(patience), interrupt_(interrupt) {}
+
+    /// From then on nothing is received or waited for any more, however often the peer says
+    /// something.
+    void endAt(Clock::time_point end) { end_ = end; }
 
     [[nodiscard]] HTTPConnectionState send(std::span<const std::uint8_t> message);
 
@@ -67,6 +72,7 @@ class HTTPConnection {
 
     base::FileDescriptor socket_;
     Patience patience_;
+    std::optional<Clock::time_point> end_;
     int interrupt_;
     std::vector<std::uint8_t> fields_;
 };

@@ -75,6 +75,9 @@ HTTPReply FakeHTTPSession::replyTo(const HTTPRequest& request,
     if (answer.reply.response) {
         script_.noteArrival(taken.number);
     }
+    if (request.method == "POST") {
+        return {answer.reply.error, answer.reply.response, {}};
+    }
     if (answer.reply.body.size() > request.maximumAnswerSize) {
         return failedReply(kAnswerTooLarge, describeTooLarge(request.maximumAnswerSize));
     }

@@ -6,20 +6,24 @@
 namespace platform {
 
 bool HTTPAnswer::takeBody(const char* bytes, std::size_t size) {
-    if (size > maximumBody_ - body_.size()) {
-        excess_ = describeTooLarge(maximumBody_);
+    if (!maximumBody_) {
+        return true;
+    }
+    if (size > *maximumBody_ - body_.size()) {
+        excess_ = describeTooLarge(*maximumBody_);
         return false;
     }
     body_.append(bytes, size);
     return true;
 }
 
-bool HTTPAnswer::countHeaders(std::size_t size) {
-    if (size > maximumHeaders_ - headerSize_) {
+bool HTTPAnswer::countHeader(std::string_view line) {
+    if (line.size() > maximumHeaders_ - headerSize_) {
         excess_ = base::concat("headers longer than ", maximumHeaders_, " bytes");
         return false;
     }
-    headerSize_ += size;
+    headerSize_ += line.size();
+    isHeaderWhole_ = line == "\r\n" || line == "\n";
     return true;
 }
 

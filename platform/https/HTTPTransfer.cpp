@@ -5,13 +5,18 @@
 
 #include <algorithm>
 #include <iterator>
+#include <linux/sockios.h>
 #include <mutex>
+#include <sys/ioctl.h>
 #include <sys/socket.h>
 #include <utility>
 
 namespace platform {
 
 namespace {
+
+/// How often the caller is asked whether it still waits.
+constexpr std::chrono::milliseconds kTurn{500};
 
 /// Headers that libcurl would add by itself.
 constexpr const char* kUnwantedHeaders[] = {"Accept:", "Content-Type:", "Expect:"};
@@ -36,20 +41,14 @@ std::size_t receiveBody(char* bytes, std::size_t one, std::size_t count, void* a
     return answerAt(answer).takeBody(bytes, one * count) ? one * count : CURL_WRITEFUNC_ERROR;
 }
 
-std::size_t receiveHeader(char* /*bytes*/, std::size_t one, std::size_t count,
-                          void* answer) noexcept {
-    return answerAt(answer).countHeaders(one * count) ? one * count : CURL_WRITEFUNC_ERROR;
+// Called with whole lines.
+std::size_t receiveHeader(char* bytes, std::size_t one, std::size_t count, void* answer) noexcept {
+    return answerAt(answer).countHeader({bytes, one * count}) ? one * count : CURL_WRITEFUNC_ERROR;
 }
 
 std::size_t giveBody(char* room, std::size_t one, std::size_t count, void* caller) noexcept {
     const std::size_t given = callerAt(caller).giveBody({room, one * count});
     return given > 0 ? given : CURL_READFUNC_ABORT;
-}
-
-// Anything but 0 ends the transfer.
-int goOn(void* caller, curl_off_t /*down*/, curl_off_t /*downloaded*/, curl_off_t /*up*/,
-         curl_off_t /*uploaded*/) noexcept {
-    return callerAt(caller).isWaiting() ? 0 : 1;
 }
 
 CURLcode installTrustCheck(CURL* /*handle*/, void* context, void* check) noexcept {
@@ -96,12 +95,27 @@ Failure failureFor(CURLcode code) {
 
 } // namespace
 
+const char* HTTPTransfer::wordsFor(Stage::Kind kind) {
+    switch (kind) {
+    case Stage::Kind::connecting:
+        return "not connected";
+    case Stage::Kind::fetching:
+        return "not fetched";
+    case Stage::Kind::sending:
+        return "not sent";
+    case Stage::Kind::answering:
+        break;
+    }
+    return "no answer";
+}
+
 HTTPTransfer::HTTPTransfer(const HTTPRequest& request, const HTTPTransferSettings& settings,
                            HTTPCaller* caller)
     : request_(request),
       settings_(settings),
       caller_(caller),
-      answer_(request.maximumAnswerSize, kMaximumAnswerHeaders) {
+      answer_(isPost() ? std::nullopt : std::optional(request.maximumAnswerSize),
+              kMaximumAnswerHeaders) {
     initialiseLibrary();
     url_.reset(curl_url());
     handle_.reset(curl_easy_init());
@@ -116,7 +130,94 @@ HTTPReply HTTPTransfer::perform() {
     if (!handle_ || !makeHeaders() || !configure()) {
         return failedReply(kTransferFailed, "transfer failed: cannot be prepared");
     }
-    return replyFor(curl_easy_perform(handle_.get()));
+    return replyFor(transfer());
+}
+
+CURLcode HTTPTransfer::transfer() {
+    const std::unique_ptr<CURLM, decltype(&curl_multi_cleanup)> transfers(curl_multi_init(),
+                                                                          &curl_multi_cleanup);
+    if (!transfers || curl_multi_add_handle(transfers.get(), handle_.get()) != CURLM_OK) {
+        return CURLE_FAILED_INIT;
+    }
+    enter(isPost() ? Stage::Kind::connecting : Stage::Kind::fetching);
+    const CURLcode code = transferWith(transfers.get());
+    curl_multi_remove_handle(transfers.get(), handle_.get());
+    return code;
+}
+
+CURLcode HTTPTransfer::transferWith(CURLM* transfers) {
+    for (;;) {
+        int running = 0;
+        if (curl_multi_perform(transfers, &running) != CURLM_OK) {
+            return CURLE_FAILED_INIT;
+        }
+        if (running == 0) {
+            int left = 0;
+            const CURLMsg* const message = curl_multi_info_read(transfers, &left);
+            return message != nullptr ? message->data.result : CURLE_FAILED_INIT;
+        }
+        if (isDecided()) {
+            return CURLE_OK;
+        }
+        if (caller_ != nullptr && !caller_->isWaiting()) {
+            return CURLE_ABORTED_BY_CALLBACK;
+        }
+        noteProgress();
+        const auto left = std::chrono::ceil<HTTPLimits::Time>(stage_.end - Clock::now());
+        if (left.count() <= 0) {
+            hasStageEnded_ = true;
+            return CURLE_OPERATION_TIMEDOUT;
+        }
+        curl_multi_poll(transfers, nullptr, 0, static_cast<int>(std::min(left, kTurn).count()),
+                        nullptr);
+    }
+}
+
+void HTTPTransfer::enter(Stage::Kind kind) {
+    const HTTPLimits& limits = settings_.options.limits;
+    const HTTPLimits::Time kLimits[] = {limits.connecting, limits.fetching,
+                                        limits.toSend(bodySize()), limits.answering};
+    const HTTPLimits::Time limit = kLimits[static_cast<std::size_t>(kind)];
+    stage_ = {kind, limit, Clock::now() + limit};
+}
+
+void HTTPTransfer::noteProgress() {
+    if (stage_.kind == Stage::Kind::connecting && isConnected()) {
+        enter(Stage::Kind::sending);
+    }
+    if (stage_.kind == Stage::Kind::sending && isSent()) {
+        enter(Stage::Kind::answering);
+    }
+}
+
+std::uint64_t HTTPTransfer::bodySize() const {
+    return caller_ != nullptr ? caller_->bodySize() : request_.body.size();
+}
+
+bool HTTPTransfer::isConnected() const {
+    curl_off_t when = 0;
+    return curl_easy_getinfo(handle_.get(), CURLINFO_PRETRANSFER_TIME_T, &when) == CURLE_OK &&
+           when > 0;
+}
+
+bool HTTPTransfer::isSent() const {
+    curl_off_t given = 0;
+    const auto size = static_cast<curl_off_t>(bodySize());
+    if (curl_easy_getinfo(handle_.get(), CURLINFO_SIZE_UPLOAD_T, &given) != CURLE_OK ||
+        given < size) {
+        return false;
+    }
+    // What the system holds back for a slow server has not gone out.
+    curl_socket_t socket = CURL_SOCKET_BAD;
+    int held = 0;
+    return curl_easy_getinfo(handle_.get(), CURLINFO_ACTIVESOCKET, &socket) != CURLE_OK ||
+           socket == CURL_SOCKET_BAD || ::ioctl(socket, SIOCOUTQ, &held) != 0 || held == 0;
+}
+
+bool HTTPTransfer::isDecided() const {
+    const long said = status();
+    // A server that refuses a document need not read the rest of it. One that accepts must.
+    return isPost() && answer_.isHeaderWhole() && said >= 200 && (said > 299 || isSent());
 }
 
 std::optional<std::string> HTTPTransfer::readLink() {
@@ -146,8 +247,6 @@ bool HTTPTransfer::configure() {
     configureRequest();
     configureAnswer();
     configureTrust();
-    configureLimits();
-    configureCaller();
     return configured_ == CURLE_OK;
 }
 
@@ -158,6 +257,9 @@ void HTTPTransfer::configureProtocol() {
     set(CURLOPT_PROXY, "");
     set(CURLOPT_FORBID_REUSE, 1L);
     set(CURLOPT_NOSIGNAL, 1L);
+    set(CURLOPT_CONNECTTIMEOUT_MS, static_cast<long>(settings_.options.limits.connecting.count()));
+    // The look-up of a host's name that nobody waits for any more is left alone.
+    set(CURLOPT_QUICK_EXIT, 1L);
     set(CURLOPT_OPENSOCKETFUNCTION, openSocket);
     set(CURLOPT_ERRORBUFFER, message_.data());
 }
@@ -174,7 +276,7 @@ void HTTPTransfer::configureRequest() {
 }
 
 void HTTPTransfer::configureBody() {
-    const std::uint64_t size = caller_ != nullptr ? caller_->bodySize() : request_.body.size();
+    const std::uint64_t size = bodySize();
     set(CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(size));
     if (caller_ != nullptr && size > 0) {
         set(CURLOPT_READFUNCTION, giveBody);
@@ -183,17 +285,6 @@ void HTTPTransfer::configureBody() {
         // Without a buffer libcurl would ask a callback for the body.
         set(CURLOPT_POSTFIELDS, size == 0 ? "" : request_.body.data());
     }
-}
-
-void HTTPTransfer::configureCaller() {
-    if (caller_ == nullptr) {
-        return;
-    }
-    set(CURLOPT_NOPROGRESS, 0L);
-    set(CURLOPT_XFERINFOFUNCTION, goOn);
-    set(CURLOPT_XFERINFODATA, caller_);
-    // The look-up of a host's name that nobody waits for any more is left alone.
-    set(CURLOPT_QUICK_EXIT, 1L);
 }
 
 void HTTPTransfer::configureAnswer() {
@@ -214,13 +305,6 @@ void HTTPTransfer::configureTrust() {
     set(CURLOPT_SSL_SESSIONID_CACHE, 0L);
     set(CURLOPT_SSL_CTX_FUNCTION, installTrustCheck);
     set(CURLOPT_SSL_CTX_DATA, &*trust_);
-}
-
-void HTTPTransfer::configureLimits() {
-    const LinuxHTTPOptions& options = settings_.options;
-    set(CURLOPT_CONNECTTIMEOUT_MS, static_cast<long>(options.connectLimit.count()));
-    set(CURLOPT_LOW_SPEED_LIMIT, options.slowestSpeed);
-    set(CURLOPT_LOW_SPEED_TIME, static_cast<long>(options.slowLimit.count()));
 }
 
 bool HTTPTransfer::addHeader(const std::string& line) {
@@ -250,8 +334,12 @@ HTTPReply HTTPTransfer::replyFor(CURLcode code) {
         return failedReply(kTrustRefused, base::concat("server not trusted: ", *trust_->refusal()));
     }
     const bool endedWithInterimAnswer = code == CURLE_GOT_NOTHING && status() != 0;
-    if (code == CURLE_OK || endedWithInterimAnswer) {
+    if (code == CURLE_OK || endedWithInterimAnswer || isDecided()) {
         return response();
+    }
+    if (hasStageEnded_) {
+        return failedReply(kTimedOut, base::concat("timed out: ", wordsFor(stage_.kind), " within ",
+                                                   stage_.limit.count(), " ms"));
     }
     const Failure failure = failureFor(code);
     return failedReply(failure.code, base::concat(failure.text, ": ", reasonFor(code)));

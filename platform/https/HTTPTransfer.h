@@ -7,6 +7,8 @@
 #include "platform/https/TrustCheck.h"
 
 #include <array>
+#include <chrono>
+#include <cstdint>
 #include <curl/curl.h>
 #include <map>
 #include <memory>
@@ -37,6 +39,15 @@ class HTTPTransfer {
     [[nodiscard]] HTTPReply perform();
 
   private:
+    using Clock = std::chrono::steady_clock;
+
+    /// What the server is waited for.
+    struct Stage {
+        enum class Kind { connecting, fetching, sending, answering } kind;
+        HTTPLimits::Time limit;
+        Clock::time_point end;
+    };
+
     struct Freed {
         void operator()(CURL* handle) const { curl_easy_cleanup(handle); }
         void operator()(CURLU* url) const { curl_url_cleanup(url); }
@@ -50,15 +61,28 @@ class HTTPTransfer {
     void configureProtocol();
     void configureRequest();
     void configureBody();
-    void configureCaller();
     void configureAnswer();
     void configureTrust();
-    void configureLimits();
     [[nodiscard]] bool addHeader(const std::string& line);
     [[nodiscard]] bool makeHeaders();
 
     template <typename Value>
     void set(CURLoption option, Value value);
+
+    /// Makes the transfer, to its end or until it may end.
+    [[nodiscard]] CURLcode transfer();
+    [[nodiscard]] CURLcode transferWith(CURLM* transfers);
+
+    [[nodiscard]] bool isPost() const { return request_.method == "POST"; }
+    [[nodiscard]] std::uint64_t bodySize() const;
+    void enter(Stage::Kind kind);
+    [[nodiscard]] static const char* wordsFor(Stage::Kind kind);
+    void noteProgress();
+    [[nodiscard]] bool isConnected() const;
+    /// Whether the server has got all of a document.
+    [[nodiscard]] bool isSent() const;
+    /// Whether what has come of the answer to a document decides about it.
+    [[nodiscard]] bool isDecided() const;
 
     [[nodiscard]] HTTPReply replyFor(CURLcode code);
     [[nodiscard]] HTTPReply response();
@@ -74,6 +98,8 @@ class HTTPTransfer {
     std::unique_ptr<CURLU, Freed> url_;
     std::unique_ptr<curl_slist, Freed> headers_;
     CURLcode configured_ = CURLE_OK;
+    Stage stage_{};
+    bool hasStageEnded_ = false;
     /// Last, because its connection uses the rest until it is closed.
     std::unique_ptr<CURL, Freed> handle_;
 };

@@ -1,8 +1,8 @@
 #pragma once
 
 #include "platform/HTTPSession.h"
+#include "platform/shared/HTTPLimits.h"
 
-#include <chrono>
 #include <cstddef>
 #include <map>
 #include <memory>
@@ -20,14 +20,7 @@ struct LinuxHTTPOptions {
     /// directory with one file for each under OpenSSL's hashed names. Read anew for every
     /// connection. When it cannot be read, no server is trusted by evaluation.
     std::string trustAnchors = "/etc/ssl/certs/ca-certificates.crt";
-    /// The longest time from the start of a request to the end of the TLS handshake, a delegate's
-    /// time to answer included.
-    std::chrono::milliseconds connectLimit = std::chrono::seconds(30);
-    /// A connection that carries fewer bytes of body a second than `slowestSpeed`, in both
-    /// directions together, for as long as `slowLimit`, ends the request. Headers do not count,
-    /// so this bounds the wait for the answer too.
-    long slowestSpeed = 100;
-    std::chrono::seconds slowLimit{60};
+    HTTPLimits limits = {};
 };
 
 /// HTTP and HTTPS over libcurl and OpenSSL: HTTP/1.1, TLS 1.2 or newer, a connection for each

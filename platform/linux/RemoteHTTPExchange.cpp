@@ -53,8 +53,11 @@ RemoteHTTPExchange::RemoteHTTPExchange(wire::HTTPConnection& connection, const H
     : connection_(connection),
       request_(request),
       settings_(settings),
+      limit_(settings.options.limits.whole(request.method, request.body.size()) +
+             settings.options.grace),
+      end_(wire::HTTPConnection::Clock::now() + limit_),
       hasDelegate_(!settings.delegate.expired()),
-      body_(request.method == "POST" ? request.body : std::string_view()) {}
+      body_(isPost() ? request.body : std::string_view()) {}
 
 HTTPReply RemoteHTTPExchange::perform() {
     const auto request = requestMessage();
@@ -62,6 +65,7 @@ HTTPReply RemoteHTTPExchange::perform() {
         return failedReply(kTransferFailed,
                            "transfer failed: the request does not fit into a message");
     }
+    connection_.endAt(end_);
     State state = connection_.send(*request);
     while (state == State::open && !reply_) {
         wire::HTTPMessage message;
@@ -149,12 +153,16 @@ RemoteHTTPExchange::State RemoteHTTPExchange::takeResponse(std::span<const std::
     if (!response) {
         return State::malformed;
     }
+    HTTPReply reply{
+        std::nullopt, HTTPResponse{response->status, std::string(response->className)}, {}};
+    if (isPost()) {
+        reply_ = std::move(reply);
+        return State::open;
+    }
     if (response->bodySize > request_.maximumAnswerSize) {
         reply_ = failedReply(kAnswerTooLarge, describeTooLarge(request_.maximumAnswerSize));
         return State::open;
     }
-    HTTPReply reply{
-        std::nullopt, HTTPResponse{response->status, std::string(response->className)}, {}};
     const State state = receiveBody(static_cast<std::size_t>(response->bodySize), reply.body);
     if (state == State::open) {
         reply_ = std::move(reply);
@@ -181,6 +189,11 @@ RemoteHTTPExchange::State RemoteHTTPExchange::receiveBody(std::size_t size, std:
 HTTPReply RemoteHTTPExchange::replyFor(State state) const {
     switch (state) {
     case State::timedOut:
+        if (wire::HTTPConnection::Clock::now() >= end_) {
+            return failedReply(kTimedOut,
+                               base::concat("timed out: the HTTPS client took longer than ",
+                                            limit_.count(), " ms"));
+        }
         return failedReply(kTimedOut, base::concat("timed out: the HTTPS client was silent for ",
                                                    settings_.options.silenceLimit.count(), " ms"));
     case State::malformed:

@@ -37,12 +37,13 @@ class RemoteHTTPExchange {
     RemoteHTTPExchange& operator=(const RemoteHTTPExchange&) = delete;
     ~RemoteHTTPExchange() = default;
 
-    /// Makes the request and waits for its end. Once.
+    /// Makes the request and waits for its end, up to the limits. Once.
     [[nodiscard]] HTTPReply perform();
 
   private:
     using State = wire::HTTPConnectionState;
 
+    [[nodiscard]] bool isPost() const { return request_.method == "POST"; }
     [[nodiscard]] std::optional<wire::HTTPMessageBytes> requestMessage() const;
     /// The reply is there when it is over, unless the connection failed.
     [[nodiscard]] State handle(const wire::HTTPMessage& message);
@@ -56,6 +57,8 @@ class RemoteHTTPExchange {
     wire::HTTPConnection& connection_;
     const HTTPRequest& request_;
     const RemoteHTTPSettings& settings_;
+    HTTPLimits::Time limit_;
+    wire::HTTPConnection::Clock::time_point end_;
     bool hasDelegate_;
     int challenges_ = 0;
     /// What the client has not got yet.

@@ -2,6 +2,7 @@
 
 #include "platform/HTTPSession.h"
 #include "platform/linux/StopRequest.h"
+#include "platform/shared/HTTPLimits.h"
 
 #include <chrono>
 #include <map>
@@ -21,6 +22,10 @@ struct RemoteHTTPOptions {
     /// How long it may say nothing. It says something every second while it works, so this is not
     /// a limit on servers.
     std::chrono::milliseconds silenceLimit = std::chrono::seconds(30);
+    /// What it keeps by itself, and how long after them a request is ended from here, whatever it
+    /// says.
+    HTTPLimits limits = {};
+    std::chrono::milliseconds grace = std::chrono::seconds(5);
     /// Ends requests, with kTransferFailed, that have no answer yet, and each that is started
     /// later. It outlives the sessions.
     const StopRequest* stop = nullptr;
@@ -35,9 +40,9 @@ struct RemoteHTTPOptions {
 /// of, and what servers it trusts, stands in platform/https/LinuxHTTPSessions.h.
 ///
 /// When the client cannot be reached, or runs as another user than root or this process's, a
-/// request ends with kCannotConnect; when it is silent, with kTimedOut; when it ends too early or
-/// breaks the rules of the connection, with kTransferFailed. A link or headers that do not fit into
-/// a message are kTransferFailed, too.
+/// request ends with kCannotConnect; when it is silent or takes too long, with kTimedOut; when it
+/// ends too early or breaks the rules of the connection, with kTransferFailed. A link or headers
+/// that do not fit into a message are kTransferFailed, too.
 class RemoteHTTPSessions final : public HTTPSessions {
   public:
     explicit RemoteHTTPSessions(RemoteHTTPOptions options) : options_(std::move(options)) {}

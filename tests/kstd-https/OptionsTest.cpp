@@ -19,44 +19,58 @@ std::optional<int> statusWith(const std::vector<std::string>& options) {
 TEST(HTTPSOptionsTest, WhatIsNotUnderstoodEndsTheProgram) {
     EXPECT_EQ(statusWith({"--help"}), 0);
     EXPECT_EQ(statusWith({}), 1) << "it waits for a request";
-    for (const std::vector<std::string>& options : {std::vector<std::string>{"--no-such-option"},
-                                                    {"word"},
-                                                    {"--slow-limit"},
-                                                    {"--slow-limit", "0"},
-                                                    {"--slow-limit", "86401"},
-                                                    {"--slow-limit", "soon"},
-                                                    {"--connect-limit", "0"},
-                                                    {"--connect-limit", "86401"},
-                                                    {"--slowest-speed", "0"}}) {
+    const auto expectFault = [](const std::vector<std::string>& options) {
         SCOPED_TRACE(testing::PrintToString(options));
         EXPECT_GE(statusWith(options), 100);
-    }
-    for (const std::vector<std::string>& options : {std::vector<std::string>{"--slow-limit", "1"},
-                                                    {"--slow-limit", "86400"},
-                                                    {"--connect-limit", "86400"},
-                                                    {"--slowest-speed", "1"}}) {
-        SCOPED_TRACE(testing::PrintToString(options));
-        EXPECT_EQ(statusWith(options), 1);
+    };
+    expectFault({"--no-such-option"});
+    expectFault({"word"});
+    expectFault({"--slow-limit", "60"});
+    expectFault({"--send-limit"});
+    expectFault({"--send-limit", "0"});
+    expectFault({"--send-limit", "0.0009"});
+    expectFault({"--send-limit", "soon"});
+    for (const char* const limit :
+         {"--connect-limit", "--fetch-limit", "--send-limit", "--answer-limit"}) {
+        expectFault({limit, "86401"});
+        for (const char* const seconds : {"0.001", "1", "86400"}) {
+            EXPECT_EQ(statusWith({limit, seconds}), 1) << limit << ' ' << seconds;
+        }
     }
 }
 
-TEST(HTTPSOptionsTest, ConnectLimitIsKept) {
-    support::Collector collector;
-    collector.control("fault no-handshake");
-    ConnectedClient client({"--connect-limit", "1"});
+TEST(HTTPSOptionsTest, LimitsAreKept) {
+    const struct {
+        const char* option;
+        const char* method;
+        const char* fault;
+    } kCases[] = {
+        {"--connect-limit", "GET", "no-handshake"},
+        {"--fetch-limit", "GET", "never-answers"},
+        {"--answer-limit", "POST", "never-answers"},
+    };
+    support::Collector collector(support::Collector::Protocol::http);
     const std::string link = collector.link("/");
-    ASSERT_EQ(client.connection().send(*wire::encodeHTTPRequest({.method = "GET", .link = link})),
-              wire::HTTPConnectionState::open);
-    wire::HTTPMessage message;
-    int working = 0;
-    while (client.connection().receive(message) == wire::HTTPConnectionState::open &&
-           message.type == wire::HTTPMessageType::working) {
-        ++working;
+    for (const auto& [option, method, fault] : kCases) {
+        SCOPED_TRACE(option);
+        collector.control(base::concat("fault ", fault));
+        const bool isHandshake = fault == std::string("no-handshake");
+        ConnectedClient client({option, "1"});
+        const std::string secure = "https" + link.substr(4);
+        ASSERT_EQ(client.connection().send(*wire::encodeHTTPRequest(
+                      {.method = method, .link = isHandshake ? secure : link})),
+                  wire::HTTPConnectionState::open);
+        wire::HTTPMessage message;
+        int working = 0;
+        while (client.connection().receive(message) == wire::HTTPConnectionState::open &&
+               message.type == wire::HTTPMessageType::working) {
+            ++working;
+        }
+        ASSERT_EQ(message.type, wire::HTTPMessageType::failure);
+        EXPECT_EQ(wire::decodeHTTPFailure(message.fields)->code, 3);
+        EXPECT_GE(working, 1) << "it says that it is at work";
+        EXPECT_EQ(client.awaitEnd(), 0);
     }
-    ASSERT_EQ(message.type, wire::HTTPMessageType::failure);
-    EXPECT_EQ(wire::decodeHTTPFailure(message.fields)->code, 3);
-    EXPECT_GE(working, 1) << "it says that it is at work";
-    EXPECT_EQ(client.awaitEnd(), 0);
 }
 
 } // namespace

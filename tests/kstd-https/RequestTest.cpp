@@ -157,14 +157,21 @@ TEST_F(HTTPSRequestTest, WholeRequestStepByStep) {
     expect(Type::bodyWanted);
     EXPECT_EQ(wire::decodeHTTPBodyWanted(message_.fields), 4U);
     ASSERT_EQ(connection().sendPiece(bytes.subspan(3)), State::open);
-    expectResponse(200, 5);
-    expect(Type::piece);
-    EXPECT_EQ(std::string(message_.fields.begin(), message_.fields.end()), "hallo");
+    expectResponse(200, 0);
     expectEnd();
     EXPECT_EQ(collector_.body(1), body);
     EXPECT_EQ(collector_.lastHead(),
               (Lines{"POST /2/kst HTTP/1.1", base::concat("Host: 127.0.0.1:", collector_.port()),
                      "A: 1", "Empty:", "Content-Length: 7", ""}));
+}
+
+TEST_F(HTTPSRequestTest, AnswerOfAGetIsHandedOnWithItsBody) {
+    control("body hallo");
+    start({.method = "GET", .link = link_, .maximumAnswerSize = 5});
+    expectResponse(200, 5);
+    expect(Type::piece);
+    EXPECT_EQ(std::string(message_.fields.begin(), message_.fields.end()), "hallo");
+    expectEnd();
 }
 
 TEST_F(HTTPSRequestTest, NoMoreThanAPartOfADocumentIsHeld) {

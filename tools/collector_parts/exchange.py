@@ -4,7 +4,7 @@ import http
 import socket
 import ssl
 
-from collector_parts.faults import answer_with, reset, stand_still
+from collector_parts.faults import answer_with, reset, stand_by, stand_still
 
 LONGEST_HEAD = 1024 * 1024
 
@@ -103,6 +103,8 @@ def end_talking(connection):
 def exchange(connection, behaviour, keep):
     """Serves one request. `keep` is called with it when it is whole."""
     answering = behaviour.snapshot()
+    # What was sent before a reset is to arrive, and not to wait here for an acknowledgement.
+    connection.setsockopt(socket.IPPROTO_TCP, socket.TCP_NODELAY, 1)
     connection = begin_talking(connection, answering)
     if not connection:
         return
@@ -110,6 +112,13 @@ def exchange(connection, behaviour, keep):
         request, begin = read_head(connection)
         if answering.fault == "reset-in-request":
             reset(connection)
+            return
+        if answering.fault == "reads-nothing":
+            stand_by(connection)
+            return
+        if answering.fault == "early-answer":
+            connection.sendall(b"".join(answer_for(request, answering)))
+            stand_by(connection)
             return
         read_body(connection, request, begin)
         # Before it counts as here, so that changes made because it is do not concern it.

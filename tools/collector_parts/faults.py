@@ -1,5 +1,6 @@
 """What can be made to go wrong."""
 
+import select
 import socket
 import struct
 import time
@@ -13,6 +14,8 @@ CONNECTION_FAULTS = {
     "no-handshake": "says nothing at all, no TLS either",
     "garbage-instead-of-tls": "sends a line of text where the handshake should begin",
     "reset-in-request": "resets the connection when the request's headers are there",
+    "reads-nothing": "reads the request's headers and nothing of its body",
+    "early-answer": "answers when the request's headers are there, and reads nothing of its body",
 }
 
 # Instead of the answer, or in it.
@@ -45,6 +48,13 @@ def stand_still(connection):
     """Says nothing until the peer hangs up."""
     while connection.recv(65536):
         pass
+
+
+def stand_by(connection):
+    """Reads nothing until the peer hangs up, which is seen without reading."""
+    hang_up = select.poll()
+    hang_up.register(connection, select.POLLRDHUP)
+    hang_up.poll()
 
 
 def for_ever(connection, block):

@@ -210,6 +210,21 @@ TEST_P(HTTPSessionContract, BodyBeyondTheLimitIsAnError) {
     }
 }
 
+TEST_P(HTTPSessionContract, BodyOfTheAnswerToAPostIsNotKept) {
+    HTTPRequest request = post(fixture().link(), "document");
+    request.maximumAnswerSize = 1;
+    for (const std::size_t size : {0UL, 1UL, 2UL, 2UL * 1024 * 1024}) {
+        SCOPED_TRACE(size);
+        for (const int status : {200, 503}) {
+            fixture().answer(status, std::string(size, 'b'));
+            const HTTPReply reply = fetch(fixture().sessions(), request);
+            EXPECT_EQ(outcomeOf(reply), std::to_string(status));
+            EXPECT_EQ(reply.body, "");
+        }
+    }
+    EXPECT_EQ(fixture().requests().back().body, "document");
+}
+
 TEST_P(HTTPSessionContract, DestructionWaitsForEveryRequest) {
     fixture().hold();
     auto session = fixture().sessions().makeEphemeral({}, {});

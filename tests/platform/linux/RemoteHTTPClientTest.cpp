@@ -91,8 +91,11 @@ class RemoteHTTPClientTest : public testing::Test {
                 EXPECT_EQ(message.type, wire::HTTPMessageType::request);
                 script(connection);
             });
-        RemoteHTTPSessions sessions(
-            {.socket = socket(), .silenceLimit = silenceLimit_, .stop = stop_});
+        RemoteHTTPSessions sessions({.socket = socket(),
+                                     .silenceLimit = silenceLimit_,
+                                     .limits = limits_,
+                                     .grace = 5ms,
+                                     .stop = stop_});
         return fetch(sessions, request, delegate);
     }
 
@@ -108,6 +111,7 @@ class RemoteHTTPClientTest : public testing::Test {
 
     support::TemporaryDirectory directory_;
     std::chrono::milliseconds silenceLimit_ = 10s;
+    platform::HTTPLimits limits_;
     const platform::StopRequest* stop_ = nullptr;
 };
 
@@ -225,6 +229,63 @@ TEST_F(RemoteHTTPClientTest, AnswerBeyondTheLimitIsNotTaken) {
                   (Error{platform::kTransportErrorDomain, platform::kAnswerTooLarge,
                          "answer longer than 3 bytes"}));
     }
+}
+
+TEST_F(RemoteHTTPClientTest, OfTheAnswerToAPostOnlyTheStatusIsTaken) {
+    HTTPRequest request = post(kLink, "body");
+    request.maximumAnswerSize = 3;
+    for (const Bytes& bytes :
+         {response(0), response(3), response(4), response(wire::kHTTPMaxBodySize),
+          joined({response(2), piece("a")}), joined({response(2), piece("abc")}),
+          joined({response(2), bytesOf("HTTP/1.1 200 OK\r\n\r\n")})}) {
+        SCOPED_TRACE(testing::PrintToString(bytes));
+        const HTTPReply reply = replyTo(bytes, request);
+        EXPECT_EQ(outcomeOf(reply), "200");
+        EXPECT_EQ(reply.body, "");
+    }
+    silenceLimit_ = 20ms;
+    EXPECT_EQ(outcomeOf(replyWhen(
+                  [](HTTPConnection& connection) {
+                      static_cast<void>(connection.send(response(2, 503)));
+                      awaitHangUp(connection);
+                  },
+                  request)),
+              "503");
+}
+
+TEST_F(RemoteHTTPClientTest, ClientThatWorksForEverIsGivenUp) {
+    limits_ = {.connecting = 4ms, .fetching = 8ms, .sending = 10ms, .answering = 6ms};
+    const auto workForEver = [](HTTPConnection& connection) {
+        while (connection.send(wire::encodeHTTPWorking()) == State::open) {
+        }
+    };
+    const auto timedOut = [](int limit) {
+        return Error{platform::kTransportErrorDomain, platform::kTimedOut,
+                     base::concat("timed out: the HTTPS client took longer than ", limit, " ms")};
+    };
+    EXPECT_EQ(replyWhen(workForEver).error, timedOut(8 + 5));
+    const std::string document(platform::HTTPLimits::kSendingStep, 'd');
+    for (const auto& [size, limit] : {std::pair(document.size() - 1, 4 + 10 + 6 + 5),
+                                      std::pair(document.size(), 4 + 20 + 6 + 5)}) {
+        EXPECT_EQ(
+            replyWhen(workForEver, post(kLink, std::string_view(document).substr(0, size))).error,
+            timedOut(limit));
+    }
+    EXPECT_EQ(replyWhen([](HTTPConnection& connection) { awaitHangUp(connection); }).error,
+              timedOut(8 + 5))
+        << "silence that is not over yet";
+}
+
+TEST_F(RemoteHTTPClientTest, AnswerThatIsGivenByAndByIsBoundedToo) {
+    limits_.fetching = 10ms;
+    const HTTPReply reply = replyWhen([](HTTPConnection& connection) {
+        State state = connection.send(response(1024UL * 1024));
+        while (state == State::open) {
+            state = connection.send(piece("x"));
+            std::this_thread::yield();
+        }
+    });
+    EXPECT_EQ(outcomeOf(reply), "transport 3");
 }
 
 TEST_F(RemoteHTTPClientTest, ClientThatFallsSilentIsGivenUp) {
