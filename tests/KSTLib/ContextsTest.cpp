@@ -105,7 +105,9 @@ TEST_F(Contexts, CreateRepliesOfTheWrongSize) {
     KSTContextRef created = nullptr;
     for (const std::size_t size : {0U, 16U}) {
         channel.reportedSize = size;
+        channel.scalarCalls.clear();
         EXPECT_EQ(KSTContextCreate(&created), -5);
+        EXPECT_EQ(channel.scalarCalls.size(), 1U);
         expectLogged({failedCheck("outSize == sizeof(KSTHandle) + sizeof(uint8_t)"),
                       returned("KSTContextCreate", -5)});
         EXPECT_EQ(gate.freed.back(), 17U);
@@ -133,6 +135,57 @@ TEST_F(Contexts, AbsentServiceIsNotAskedForTheLevel) {
     KSTContextGetExternalForm(context, block);
     EXPECT_TRUE(block.calls.empty());
     EXPECT_TRUE(channel.scalarCalls.empty());
+}
+
+// The return is shown or not by the level that the failure has brought, not by the one before.
+TEST_F(Contexts, LevelIsAskedForBeforeTheReturnIsWritten) {
+    KSTContextRef created = nullptr;
+    const std::pair<std::function<void()>, std::string> kFailures[] = {
+        {[&] {
+             answers[1].reply.pop_back();
+             EXPECT_EQ(KSTContextCreate(&created), -5);
+             answers[1].reply.push_back(40);
+         },
+         returned("KSTContextCreate", -5)},
+        {[&] { EXPECT_EQ(KSTContextCreate(nullptr), -3); }, returned("KSTContextCreate", -3)},
+        {[&] {
+             answers[18].reply.pop_back();
+             EXPECT_EQ(openContext(), nullptr);
+             answers[18].reply.push_back(40);
+         },
+         returnedReference(nullptr)},
+        {[&] {
+             answers[2].status = -9;
+             EXPECT_EQ(KSTContextDelete(context, true), -9);
+         },
+         returned("KSTContextDelete", -9)},
+        {[&] {
+             answers[19].status = -9;
+             KSTContextGetExternalForm(context, block);
+         },
+         returned("KSTContextGetExternalForm", -9)},
+    };
+    for (const auto& [fail, lastLine] : kFailures) {
+        SCOPED_TRACE(lastLine);
+        channel.scalarCalls.clear();
+        channel.scalars = {29};
+        kst::gLogLevel = 71;
+        log.clear();
+        fail();
+        EXPECT_EQ(channel.scalarCalls.size(), 1U);
+        const Lines lines = logged();
+        ASSERT_GE(lines.size(), 3U);
+        EXPECT_EQ(Lines(lines.end() - 3, lines.end()),
+                  (Lines{"KSTLib: updateLogLevel: log level set to 29.\n",
+                         "KSTLib: updateLogLevel: returning.\n", lastLine}));
+        channel.scalars = {71};
+        kst::gLogLevel = 40;
+        fail();
+        EXPECT_NE(logged().back(), lastLine) << "written before the level was known";
+    }
+    EXPECT_EQ(created, nullptr);
+    EXPECT_TRUE(block.calls.empty());
+    kst::gLogLevel = 40;
 }
 
 TEST_F(Contexts, CreateWithEveryAllocationFailing) {
