@@ -227,6 +227,30 @@ TEST_F(CredentialList, ElementsThatCannotBeWritten) {
     EXPECT_EQ(size, target.size());
 }
 
+TEST_F(CredentialList, FailedWriterLeavesWhatItHadWrittenAndTheSizeAsItWas) {
+    MemoryList given({4, 12, 4});
+    support::putU32(given.records[2], 0, 13);
+    const ExactBuffer target(200);
+    Bytes expected = target.bytes();
+    const Bytes front = listBytes(3, {4, 12});
+    std::copy(front.begin(), front.end(), expected.begin());
+    std::size_t size = target.size();
+    EXPECT_EQ(SerializeCredentialList(given.pointers.data(), 3, target.data(), &size), -3);
+    EXPECT_EQ(target.bytes(), expected);
+    EXPECT_EQ(size, target.size());
+    expectLogged({failedCheck("0"), failedCall(), failedCall()});
+
+    // One byte short for the second: only the count and the first are there.
+    const ExactBuffer narrow(4 + 32 + 39);
+    expected = narrow.bytes();
+    std::copy(front.begin(), front.begin() + 36, expected.begin());
+    size = narrow.size();
+    EXPECT_EQ(SerializeCredentialList(given.pointers.data(), 3, narrow.data(), &size), -3);
+    EXPECT_EQ(narrow.bytes(), expected);
+    EXPECT_EQ(size, narrow.size());
+    expectLogged({failedCheck("credLen <= *outSize"), failedCall()});
+}
+
 TEST_F(CredentialList, NullElementsAreSkippedWhenFreed) {
     ASSERT_EQ(read(listBytes({2, 12, 4})), 0);
     DeallocCredential(list[1]);

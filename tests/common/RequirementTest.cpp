@@ -161,6 +161,25 @@ TEST_F(Requirement, KnownSizes) {
     }
 }
 
+TEST_F(Requirement, DataLengthOfACompositeIsWrittenAsItStands) {
+    Bytes child = leafBytes(2, 4);
+    for (const std::uint32_t type : support::kCompositeTypes) {
+        // Room for three children, of which one is there.
+        Bytes bytes =
+            support::compositeInMemory(type, {support::asRequirement(child), nullptr, nullptr});
+        support::putU32(bytes, type == 7 ? 20 : 16, 1);
+        const std::size_t front = type == 7 ? 24 : 20;
+        Bytes expected(bytes.begin(), bytes.begin() + static_cast<std::ptrdiff_t>(front));
+        support::append(expected, child);
+        std::size_t size = expected.size();
+        const ExactBuffer target(size);
+        EXPECT_EQ(SerializeRequirement(support::asRequirement(bytes), target.data(), &size), 0);
+        EXPECT_EQ(target.bytes(), expected);
+        EXPECT_EQ(target.bytes()[12], type == 7 ? 8 + 3 * 8 : 4 + 3 * 8);
+    }
+    expectLogged({});
+}
+
 TEST_F(Requirement, DataLengthOfACompositeIsNotRead) {
     const Bytes right = compositeBytes(5, {leafBytes(1, 3)});
     for (const std::uint32_t length : {0U, 3U, 11U, 13U, 0x80000000U, 0xffffffffU}) {
