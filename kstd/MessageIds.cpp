@@ -23,6 +23,7 @@ constexpr platform::MessageClass kClasses[] = {
     {kDatabaseNotOpened, "can't get logging JSON because database is not openable"},
     {kDatabaseFailed, "KSTDSQLite: Failed to step "},
     {kDatabaseFailed, "KSTDSQLite: Error executing SQL: "},
+    {kDatabaseFailed, "kstd: Database: "},
     {kServerNotTrusted, "Error in uploading the events to splunk: server not trusted"},
     {kServerNotTrusted, "Unable to fetch splunk endpoint at URL: * -- error: server not trusted"},
     {kUploadFailed, "Error in uploading the events to splunk: "},

@@ -30,9 +30,12 @@ std::shared_ptr<KSTDAnalyticsLogger> KSTDAnalyticsLogger::logger(const platform:
 }
 
 void KSTDAnalyticsLogger::init(const std::string& databasePath) {
-    fields.database = TQAnalyticsLoggerSQLiteStore::storeWithPath(
-        host_.files.locate(databasePath), kEventSchema,
-        {.log = host_.log, .clock = host_.clock, .propertyLists = host_.propertyLists});
+    fields.database =
+        TQAnalyticsLoggerSQLiteStore::storeWithPath(host_.files.locate(databasePath), kEventSchema,
+                                                    {.log = host_.log,
+                                                     .clock = host_.clock,
+                                                     .propertyLists = host_.propertyLists,
+                                                     .warnsOfCauses = true});
     fields.queue = host_.queues.make(kQueueName);
     fields.secondsBetweenUploads = host_.diagnostics.isEnabled(kSubsystem)
                                        ? kSecondsBetweenUploadsOfDevelopers

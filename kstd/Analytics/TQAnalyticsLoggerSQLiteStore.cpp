@@ -131,6 +131,10 @@ void TQAnalyticsLoggerSQLiteStore::setUploadDate(const std::optional<platform::T
     }
 }
 
+void TQAnalyticsLoggerSQLiteStore::logError(std::string_view text) const {
+    environment().log.write(platform::LogLevel::error, text, {});
+}
+
 void TQAnalyticsLoggerSQLiteStore::clearAllData() {
     if (tryToOpenDatabase()) {
         deleteFrom(kEventTable, "id >= 0", {});

@@ -58,6 +58,8 @@ class TQAnalyticsLoggerSQLiteStore final : public KSTDSQLite {
     }
 
   private:
+    void logError(std::string_view text) const;
+
     const std::shared_ptr<const platform::ValueList> failureRecords_;
 };
 

@@ -16,9 +16,12 @@ constexpr std::string_view kClosed = "KSTDSQLite: Database is closed";
 
 KSTDSQLite::KSTDSQLite(std::string path, std::string schema, const DatabaseEnvironment& environment)
     : environment_(environment),
+      causes_(environment.warnsOfCauses ? &environment.log : nullptr, path),
       path_(std::move(path)),
       schema_(std::move(schema)),
-      schemaVersion_(schemaHash(schema_)) {}
+      schemaVersion_(schemaHash(schema_)) {
+    environment_.causes = &causes_;
+}
 
 KSTDSQLite::~KSTDSQLite() {
     close();
@@ -44,7 +47,7 @@ void KSTDSQLite::close() {
     if (openCount_ == 1) {
         removeAllStatements();
         if (sqlite3_close(db_) != SQLITE_OK) {
-            logError("KSTDSQLite: Error closing database");
+            logFailure("KSTDSQLite: Error closing database");
             return;
         }
         db_ = nullptr;
@@ -78,13 +81,14 @@ void KSTDSQLite::vacuum() {
 
 bool KSTDSQLite::executeSQL(std::string_view format, std::span<const FormatArgument> arguments) {
     if (db_ == nullptr) {
-        logError(kClosed);
+        logFailure(kClosed);
         return false;
     }
     const std::string text = formatText(format, arguments);
     const int code = sqlite3_exec(db_, text.c_str(), nullptr, nullptr, nullptr);
     if (code != SQLITE_OK) {
-        logError(base::concat("KSTDSQLite: Error executing SQL: \"", text, "\" (", code, ")"));
+        logFailure(base::concat("KSTDSQLite: Error executing SQL: \"", text, "\" (", code, ")"));
+        causes_.tell(code, db_);
         return false;
     }
     return true;
@@ -92,7 +96,7 @@ bool KSTDSQLite::executeSQL(std::string_view format, std::span<const FormatArgum
 
 std::shared_ptr<KSTDSQLiteStatement> KSTDSQLite::statementForSQL(std::string_view SQL) {
     if (db_ == nullptr) {
-        logError(kClosed);
+        logFailure(kClosed);
         return nullptr;
     }
     if (const auto cached = statementsBySQL_.find(SQL); cached != statementsBySQL_.end()) {
@@ -101,7 +105,8 @@ std::shared_ptr<KSTDSQLiteStatement> KSTDSQLite::statementForSQL(std::string_vie
     std::string text(SQL);
     sqlite3_stmt* handle = nullptr;
     if (sqlite3_prepare_v2(db_, text.c_str(), -1, &handle, nullptr) != SQLITE_OK) {
-        logError(base::concat("Error preparing statement: ", text));
+        logFailure(base::concat("Error preparing statement: ", text));
+        causes_.tell(sqlite3_extended_errcode(db_), db_);
         return nullptr;
     }
     auto statement = std::make_shared<KSTDSQLiteStatement>(this, environment_, text, handle);
@@ -121,7 +126,7 @@ void KSTDSQLite::removeAllStatements() {
 
 std::int64_t KSTDSQLite::lastInsertRowID() const {
     if (db_ == nullptr) {
-        logError(kClosed);
+        logFailure(kClosed);
         return -1;
     }
     return sqlite3_last_insert_rowid(db_);
@@ -129,14 +134,14 @@ std::int64_t KSTDSQLite::lastInsertRowID() const {
 
 std::int32_t KSTDSQLite::changes() const {
     if (db_ == nullptr) {
-        logError(kClosed);
+        logFailure(kClosed);
         return -1;
     }
     return sqlite3_changes(db_);
 }
 
-void KSTDSQLite::logError(std::string_view text) const {
-    environment_.log.write(platform::LogLevel::error, text, {});
+void KSTDSQLite::logFailure(std::string_view text) const {
+    environment_.log.write(platform::LogLevel::notice, text, {});
 }
 
 } // namespace kstd

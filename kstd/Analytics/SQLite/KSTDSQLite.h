@@ -1,5 +1,6 @@
 #pragma once
 
+#include "kstd/Analytics/SQLite/DatabaseCauses.h"
 #include "kstd/Analytics/SQLite/DatabaseEnvironment.h"
 #include "kstd/Analytics/SQLite/DateFormatter.h"
 #include "kstd/Analytics/SQLite/FormatText.h"
@@ -221,7 +222,8 @@ class KSTDSQLite {
 
   protected:
     [[nodiscard]] const DatabaseEnvironment& environment() const { return environment_; }
-    void logError(std::string_view text) const;
+    /// A failure of this class, at the default level.
+    void logFailure(std::string_view text) const;
 
   private:
     /// What an opening has done about the tables.
@@ -242,6 +244,7 @@ class KSTDSQLite {
     void storeCurrentTime(const std::string& key);
 
     DatabaseEnvironment environment_;
+    DatabaseCauses causes_;
     std::shared_ptr<KSTDSQLiteDelegate> delegate_;
     std::string path_;
     std::string schema_;

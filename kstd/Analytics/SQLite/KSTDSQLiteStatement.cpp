@@ -1,6 +1,7 @@
 #include "kstd/Analytics/SQLite/KSTDSQLiteStatement.h"
 
 #include "base/Saturate.h"
+#include "kstd/Analytics/SQLite/DatabaseCauses.h"
 #include "kstd/Analytics/SQLite/DatabaseEnvironment.h"
 #include "kstd/Analytics/SQLite/FormatText.h"
 #include "kstd/Analytics/SQLite/KSTDValueType.h"
@@ -69,10 +70,16 @@ bool KSTDSQLiteStatement::step() {
     case SQLITE_ROW:
         return true;
     case SQLITE_DONE:
+        if (environment_.causes != nullptr && sqlite3_stmt_readonly(handle_) == 0) {
+            environment_.causes->wrote();
+        }
         return false;
     default:
         resetAfterStepError();
-        logError(formatText("KSTDSQLite: Failed to step (%d): \"%@\"", {code, SQL_}));
+        logFailure(formatText("KSTDSQLite: Failed to step (%d): \"%@\"", {code, SQL_}));
+        if (environment_.causes != nullptr) {
+            environment_.causes->tell(code, sqlite3_db_handle(handle_));
+        }
         return false;
     }
 }
@@ -82,11 +89,11 @@ void KSTDSQLiteStatement::reset() {
         return;
     }
     if (sqlite3_reset(handle_) != SQLITE_OK) {
-        logError(formatText("KSTDSQLite: Error resetting prepared statement: \"%@\"", {SQL_}));
+        logFailure(formatText("KSTDSQLite: Error resetting prepared statement: \"%@\"", {SQL_}));
         return;
     }
     if (clearBindings() != SQLITE_OK) {
-        logError(
+        logFailure(
             formatText("KSTDSQLite: Error clearing prepared statement bindings: \"%@\"", {SQL_}));
         return;
     }
@@ -106,11 +113,11 @@ void KSTDSQLiteStatement::resetAfterStepError() {
 
 void KSTDSQLiteStatement::finalizeStatement() {
     if (!reset_) {
-        logError(formatText("KSTDSQLite: Statement not reset after last use: \"%@\"", {SQL_}));
+        logFailure(formatText("KSTDSQLite: Statement not reset after last use: \"%@\"", {SQL_}));
         return;
     }
     if (sqlite3_finalize(std::exchange(handle_, nullptr)) != SQLITE_OK) {
-        logError(formatText("KSTDSQLite: Error finalizing prepared statement: \"%@\"", {SQL_}));
+        logFailure(formatText("KSTDSQLite: Error finalizing prepared statement: \"%@\"", {SQL_}));
     }
 }
 
@@ -161,7 +168,7 @@ void KSTDSQLiteStatement::bindText(const std::string* value, int atIndex) {
 
 void KSTDSQLiteStatement::bindNullAtIndex(int index) {
     if (sqlite3_bind_null(handle_, parameterNumber(index)) != SQLITE_OK) {
-        logError("KSTDSQLite: sqlite3_bind_null error");
+        logFailure("KSTDSQLite: sqlite3_bind_null error");
     }
 }
 
@@ -261,7 +268,7 @@ platform::Value KSTDSQLiteStatement::objectAtIndex(int index) const {
     case SQLITE_NULL:
         return {};
     default:
-        logError(formatText("KSTDSQLite: Unexpected column type: %d", {type}));
+        logFailure(formatText("KSTDSQLite: Unexpected column type: %d", {type}));
         return {};
     }
 }
@@ -289,14 +296,14 @@ platform::ValueMap KSTDSQLiteStatement::allObjectsByColumnName() const {
 
 bool KSTDSQLiteStatement::mayBind() const {
     if (!reset_) {
-        logError(formatText("KSTDSQLite: Statement is not reset: \"%@\"", {SQL_}));
+        logFailure(formatText("KSTDSQLite: Statement is not reset: \"%@\"", {SQL_}));
     }
     return reset_;
 }
 
 void KSTDSQLiteStatement::checkBound(int code, std::string_view kind, int index) const {
     if (code != SQLITE_OK) {
-        logError(formatText("KSTDSQLite: Error binding %s at %ld: \"%@\"", {kind, index, SQL_}));
+        logFailure(formatText("KSTDSQLite: Error binding %s at %ld: \"%@\"", {kind, index, SQL_}));
     }
 }
 
@@ -327,11 +334,11 @@ int KSTDSQLiteStatement::clearBindings() {
 }
 
 void KSTDSQLiteStatement::logUnbindable(const platform::Value& value) const {
-    logError(formatText("KSTDSQLite: Can't bind object of type %@", {kindName(value)}));
+    logFailure(formatText("KSTDSQLite: Can't bind object of type %@", {kindName(value)}));
 }
 
-void KSTDSQLiteStatement::logError(std::string_view text) const {
-    environment_.log.write(platform::LogLevel::error, text, {});
+void KSTDSQLiteStatement::logFailure(std::string_view text) const {
+    environment_.log.write(platform::LogLevel::notice, text, {});
 }
 
 } // namespace kstd

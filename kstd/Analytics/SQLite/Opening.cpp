@@ -83,7 +83,8 @@ bool KSTDSQLite::failToOpen(platform::Error& reason, platform::Error* error) {
 void KSTDSQLite::open() {
     platform::Error error;
     if (!openWithError(&error)) {
-        logError(base::concat("KSTDSQLite: Error opening db at ", path_, ": ", error.description));
+        logFailure(
+            base::concat("KSTDSQLite: Error opening db at ", path_, ": ", error.description));
     }
 }
 
@@ -91,6 +92,7 @@ void KSTDSQLite::open() {
 bool KSTDSQLite::openConnection(platform::Error& reason) {
     if (auto failure = makeParentDirectories(path_)) {
         reason = *std::move(failure);
+        causes_.tellOfDirectory(reason.description);
         return false;
     }
     createDatabaseFile(path_);
@@ -99,6 +101,7 @@ bool KSTDSQLite::openConnection(platform::Error& reason) {
     if (code != SQLITE_OK) {
         reason.description = base::concat("Error opening db at ", path_, ", rc=", code, "(0x",
                                           base::Hex{static_cast<std::uint32_t>(code)}, ")");
+        causes_.tell(code, db_);
         return false;
     }
     return true;

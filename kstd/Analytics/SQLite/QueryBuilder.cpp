@@ -196,8 +196,8 @@ std::string ownClassName(const std::type_info& type) {
 
 std::optional<std::string> KSTDSQLite::tableNameForClassNamed(std::string_view className) const {
     if (!className.starts_with(objectClassPrefix_)) {
-        logError(base::concat("KSTDSQLite: Object class \"", className,
-                              "\" does not have prefix \"", objectClassPrefix_, "\""));
+        logFailure(base::concat("KSTDSQLite: Object class \"", className,
+                                "\" does not have prefix \"", objectClassPrefix_, "\""));
         return std::nullopt;
     }
     return std::string(className.substr(objectClassPrefix_.size()));

@@ -229,7 +229,7 @@ TEST_F(LoggerTest, DatesOfASubclassDoNotOpenTheDatabase) {
     logger().setDateProperty(Timestamp{1234}, "k");
     EXPECT_EQ(logger().datePropertyForKey("k"), std::nullopt);
     EXPECT_FALSE(logger().fields.database->isOpen());
-    EXPECT_EQ(takeLines(), Lines(2, "error: KSTDSQLite: Database is closed"));
+    EXPECT_EQ(takeLines(), Lines(2, "notice: KSTDSQLite: Database is closed"));
 }
 
 struct Age {

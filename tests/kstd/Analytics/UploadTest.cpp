@@ -212,9 +212,12 @@ TEST_F(UploadTest, ClosedStoreGivesNoDocument) {
     static_cast<void>(TestLogger::logger(fake.host()));
     const std::string opening =
         base::concat("Error opening db at ", databaseFile().string(), ", rc=14(0xe)");
-    EXPECT_EQ(takeLines(), Lines{base::concat("error: TQAnalyticsLogger: could not open db at "
-                                              "init, will try again later. Error: ",
-                                              opening)});
+    EXPECT_EQ(takeLines(),
+              (Lines{base::concat("warning: kstd: Database: ", databaseFile().string(),
+                                  ": unable to open database file (14), Is a directory."),
+                     base::concat("error: TQAnalyticsLogger: could not open db at "
+                                  "init, will try again later. Error: ",
+                                  opening)}));
     const auto document = logger().getLoggingJSON();
     ASSERT_FALSE(document);
     EXPECT_EQ(document.error(),

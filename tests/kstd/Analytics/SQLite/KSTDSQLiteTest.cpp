@@ -87,7 +87,7 @@ TEST_F(KSTDSQLiteTest, ClosedDatabaseRefusesEverything) {
     EXPECT_EQ(made->dbUserVersion(), 0);
     EXPECT_EQ(lines(), Texts(4, kClosed));
     for (const platform::FakeSystemLog::Line& line : log.lines()) {
-        EXPECT_EQ(line.level, platform::LogLevel::error);
+        EXPECT_EQ(line.level, platform::LogLevel::notice);
     }
 }
 

@@ -63,7 +63,7 @@ class StatementFixture : public testing::Test {
     void expectLines(const std::vector<std::string>& texts) {
         EXPECT_EQ(log.texts(), texts);
         for (const platform::FakeSystemLog::Line& line : log.lines()) {
-            EXPECT_EQ(line.level, platform::LogLevel::error);
+            EXPECT_EQ(line.level, platform::LogLevel::notice);
         }
         log.clear();
     }
