@@ -100,9 +100,10 @@ TEST_F(UploadDryRunTest, DaemonIsNotDisturbed) {
 TEST_F(UploadDryRunTest, NothingIsLeftBehindWhenTheDaemonHasEnded) {
     startKernel();
     configure({});
-    launch({"--idle-exit", "20"});
+    launch();
     publishEvent();
     kstctl({"events", "list"});
+    daemon->signal(SIGTERM);
     EXPECT_EQ(daemon->awaitEnd(), 0);
     const auto before = files();
     EXPECT_FALSE(before.contains(database() + "-wal"));

@@ -102,7 +102,7 @@ Texts kernelOfAnotherUser() {
                   [&] { return ::setuid(65534) == 0 && ::listen(listener.get(), 1) == 0 ? 0 : 1; }),
               0);
     static_cast<void>(
-        platform::KernelSocketConnection(path, log, std::chrono::seconds(1)).connect());
+        platform::KernelSocketConnection(path, log, std::chrono::seconds(30)).connect());
     return log.texts();
 }
 

@@ -6,7 +6,9 @@
 #include "kstd/Daemon.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"
+#include "platform/linux/StopRequest.h"
 #include "tests/platform/linux/OpenDescriptors.h"
+#include "tests/support/TerminationSignal.h"
 #include "tests/system/SystemFixture.h"
 
 #include <fcntl.h>
@@ -85,10 +87,12 @@ TEST_F(SoakTest, NeitherMemoryNorDescriptorsGrow) {
     Footprint end;
     {
         const QuietStandardError quiet;
+        const support::TerminationSignal undone;
+        const platform::StopRequest stop;
         const platform::Paths paths(root.path().string());
         platform::LinuxHost host({.paths = paths,
                                   .eventSocket = platform::makeEventSocket(paths.eventSocket()),
-                                  .idleTime = std::chrono::milliseconds(500)});
+                                  .stop = &stop});
         const platform::Host interfaces = host.interfaces();
         kst::installPlatform({interfaces.log, interfaces.registry, interfaces.channel});
         const kstd::AnalyticsLifetime analytics;
@@ -97,6 +101,7 @@ TEST_F(SoakTest, NeitherMemoryNorDescriptorsGrow) {
             warm = Footprint();
             publish(kWarmUpRounds, kRounds);
             end = Footprint();
+            support::TerminationSignal::send();
         });
         EXPECT_EQ(kstd::Daemon(interfaces, kstd::makeServices(interfaces)).run(), 0);
         kernelSide.join();

@@ -19,7 +19,7 @@ using Bytes = std::vector<std::uint8_t>;
 
 class HTTPConnectionTest : public testing::Test {
   protected:
-    HTTPConnectionTest() { connect(10s); }
+    HTTPConnectionTest() { connect(30s); }
 
     void connect(std::chrono::milliseconds patience) {
         int ends[2] = {-1, -1};

@@ -121,7 +121,7 @@ class KernelSide:
             else:
                 kept.value, kept.generation = value, self._generation
 
-    def post(self, datagram, timeout=10):
+    def post(self, datagram, timeout=30):
         with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM | socket.SOCK_CLOEXEC) as sender:
             sender.settimeout(timeout)
             sender.sendto(datagram, self.events_path)
@@ -130,12 +130,12 @@ class KernelSide:
         self.set_property(name, record)
         self.post(event(NAME_PREFIX + name))
 
-    def wait_for(self, condition, timeout=10):
+    def wait_for(self, condition, timeout=30):
         """Waits until condition() holds; it is looked at after each request."""
         with self._state:
             return self._state.wait_for(condition, timeout)
 
-    def wait_for_calls(self, count, timeout=10):
+    def wait_for_calls(self, count, timeout=30):
         return self.wait_for(lambda: len(self.calls) >= count, timeout)
 
     # Connections.

@@ -28,7 +28,9 @@ using testing::ElementsAre;
 
 constexpr std::uint8_t kFind = 2;
 constexpr std::uint8_t kOpen = 4;
-constexpr std::chrono::milliseconds kPatient{20000};
+constexpr std::chrono::milliseconds kPatient{30000};
+/// Long enough that the request is sent before it is over.
+constexpr std::chrono::milliseconds kImpatient{300};
 
 class LinuxKernelChannelTest : public testing::Test {
   protected:
@@ -384,7 +386,7 @@ TEST_F(LinuxKernelChannelTest, PostedRequestIsSentBehindTheOneThatWasNotAnswered
         return true;
     });
     ASSERT_EQ(open(), kSuccess);
-    channel.setDeadline(std::chrono::steady_clock::now() + std::chrono::milliseconds(20));
+    channel.setDeadline(std::chrono::steady_clock::now() + kImpatient);
     output.fill(0xAA);
     outputSize = 16;
     EXPECT_EQ(channel.structCall(connection, 0, "A", 1, output.data(), &outputSize),
@@ -428,7 +430,7 @@ TEST_F(LinuxKernelChannelTest, ConnectionWhoseAnswerIsLateEndsWithTheDeadline) {
         return false;
     });
     ASSERT_EQ(open(), kSuccess);
-    channel.setDeadline(std::chrono::steady_clock::now() + std::chrono::milliseconds(20));
+    channel.setDeadline(std::chrono::steady_clock::now() + kImpatient);
     EXPECT_EQ(call(), statusFromErrno(ETIMEDOUT));
     channel.setDeadline(std::nullopt);
     server.reset();
@@ -491,9 +493,21 @@ TEST_F(LinuxKernelChannelTest, ServiceThatHangsUpOnEveryConnectionGivesAPlatform
     expectNextCallWorks();
 }
 
+TEST_F(LinuxKernelChannelTest, OpeningThatIsNotAnsweredIsGivenUp) {
+    server.emplace(path, [](const SeqpacketServer::Peer& peer) {
+        for (Packet request = peer.receive(); !request.empty(); request = peer.receive()) {
+            if (request[5] == kFind) {
+                peer.send(reply(request, 0, 1, "/entry"));
+            }
+        }
+    });
+    const ServiceHandle service = registry.findByClassName("Keystrand");
+    LinuxKernelChannel impatient(path, registry, log, std::chrono::milliseconds(20));
+    EXPECT_EQ(impatient.open(service, 0, &connection), statusFromErrno(ETIMEDOUT));
+}
+
 TEST_F(LinuxKernelChannelTest, LateAnswerIsNotTakenForTheNextOne) {
     std::atomic<bool> firstSeen = false;
-    LinuxKernelChannel impatient(path, registry, log, std::chrono::milliseconds(20));
     serveOneFault([&](const SeqpacketServer::Peer& peer, const Packet& request) {
         // The client hangs up when its patience ends; only then comes the answer.
         firstSeen = true;
@@ -501,16 +515,16 @@ TEST_F(LinuxKernelChannelTest, LateAnswerIsNotTakenForTheNextOne) {
         peer.send(reply(request, 0, 2, "no"));
         return false;
     });
-    const ServiceHandle service = registry.findByClassName("Keystrand");
-    ASSERT_EQ(impatient.open(service, 0, &connection), kSuccess);
+    ASSERT_EQ(open(), kSuccess);
+    channel.setDeadline(std::chrono::steady_clock::now() + kImpatient);
     outputSize = 16;
-    EXPECT_EQ(impatient.structCall(connection, 0, "input", 5, output.data(), &outputSize),
+    EXPECT_EQ(channel.structCall(connection, 0, "input", 5, output.data(), &outputSize),
               statusFromErrno(ETIMEDOUT));
-    EXPECT_TRUE(firstSeen);
     EXPECT_EQ(outputSize, 16U);
-    EXPECT_EQ(impatient.structCall(connection, 0, "input", 5, output.data(), &outputSize),
-              kSuccess);
+    channel.setDeadline(std::nullopt);
+    EXPECT_EQ(channel.structCall(connection, 0, "input", 5, output.data(), &outputSize), kSuccess);
     EXPECT_EQ(std::string(output.begin(), output.begin() + 2), "ok");
+    EXPECT_TRUE(firstSeen);
 }
 
 TEST_F(LinuxKernelChannelTest, RestartedServiceIsReconnectedAndOpenedBeforeTheRequestIsSent) {

@@ -31,7 +31,7 @@ class LinuxServiceRegistryTest : public testing::Test {
     support::TemporaryDirectory directory;
     std::string path = directory.file("service.sock");
     FakeSystemLog log;
-    LinuxServiceRegistry registry{path, log, std::chrono::milliseconds(5000)};
+    LinuxServiceRegistry registry{path, log, std::chrono::seconds(30)};
     std::optional<SeqpacketServer> server;
 };
 

@@ -30,7 +30,7 @@ class LocalConnectionTest : public testing::Test {
     }
 
     [[nodiscard]] int errorOf(const std::string& path, int type = SOCK_STREAM) const {
-        return connectLocally(path, type, 1s).error;
+        return connectLocally(path, type, 30s).error;
     }
 
     [[nodiscard]] std::string path() const { return directory_.file("socket"); }
@@ -41,7 +41,7 @@ class LocalConnectionTest : public testing::Test {
 
 TEST_F(LocalConnectionTest, ConnectsToAServerOfThisUser) {
     ASSERT_TRUE(listen(SOCK_STREAM, 1));
-    const auto connection = connectLocally(path(), SOCK_STREAM, 1s);
+    const auto connection = connectLocally(path(), SOCK_STREAM, 30s);
     EXPECT_EQ(connection.error, 0);
     EXPECT_FALSE(connection.stranger);
     EXPECT_NE(::fcntl(connection.socket.get(), F_GETFD) & FD_CLOEXEC, 0);
@@ -83,7 +83,7 @@ TEST_F(LocalConnectionTest, ServerOfAnotherUserIsRefused) {
                   return ::setuid(kNobody) == 0 && ::listen(listener_.get(), 1) == 0 ? 0 : 1;
               }),
               0);
-    const auto connection = connectLocally(path(), SOCK_STREAM, 1s);
+    const auto connection = connectLocally(path(), SOCK_STREAM, 30s);
     EXPECT_EQ(connection.error, EPERM);
     EXPECT_EQ(connection.stranger, kNobody);
     EXPECT_FALSE(connection.socket.isOpen());

@@ -110,7 +110,7 @@ class RemoteHTTPClientTest : public testing::Test {
     [[nodiscard]] std::string socket() const { return directory_.file("https.sock"); }
 
     support::TemporaryDirectory directory_;
-    std::chrono::milliseconds silenceLimit_ = 10s;
+    std::chrono::milliseconds silenceLimit_ = 30s;
     platform::HTTPLimits limits_;
     const platform::StopRequest* stop_ = nullptr;
 };
