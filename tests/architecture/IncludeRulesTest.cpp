@@ -7,6 +7,7 @@
 #include <iterator>
 #include <map>
 #include <set>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -15,7 +16,7 @@ namespace {
 namespace fs = std::filesystem;
 
 /// The library's public headers: a room of their own in the folder of the library.
-constexpr const char* kPublicHeaders = "KSTLib's public headers";
+constexpr const char* kPublicHeaders = "public headers";
 
 /// Rooms by their folder; a folder inside a room may be one of its own.
 const std::vector<std::string> kRooms = {"platform/shared",
@@ -40,47 +41,68 @@ const std::vector<std::string> kRooms = {"platform/shared",
                                          "bench",
                                          "fuzz"};
 
-const std::map<std::string, std::set<std::string>> kMayInclude = {
-    {kPublicHeaders, {}},
-    {"base", {}},
-    {"wire", {kPublicHeaders, "base"}},
-    {"platform", {"base"}},
-    {"platform/shared", {"platform", "base"}},
-    {"platform/https", {"platform", "platform/shared", "base"}},
-    {"platform/linux", {"platform", "platform/shared", "wire", "base"}},
-    {"platform/fake", {"platform", "platform/shared", "base"}},
-    {"common", {kPublicHeaders, "platform", "base"}},
-    {"KSTLib", {kPublicHeaders, "common", "platform", "base"}},
-    {"kstd/Analytics/SQLite", {"kstd", "common", "platform", "base"}},
-    {"kstd/Analytics", {"kstd/Analytics/SQLite", "kstd", "common", "platform", "base"}},
-    {"kstd/DeviceRestrictedMode",
-     {kPublicHeaders, "kstd/Analytics", "kstd", "KSTLib", "common", "platform", "wire", "base"}},
-    {"kstd",
-     {kPublicHeaders, "kstd/Analytics", "kstd/DeviceRestrictedMode", "KSTLib", "common", "platform",
-      "wire", "base"}},
-    {"keystrand", {kPublicHeaders, "common", "wire", "base"}},
-    {"keystrand-sim", {"keystrand", kPublicHeaders, "common", "wire", "base"}},
-    {"kstd-https", {"platform/https", "platform/shared", "platform", "wire", "base"}},
-    {"kstd-notify", {"platform", "platform/linux", "platform/shared", "wire", "base"}},
-    {"kstctl",
-     {kPublicHeaders, "kstd/Analytics", "kstd/Analytics/SQLite", "kstd/DeviceRestrictedMode",
-      "keystrand", "keystrand-sim", "common", "platform", "platform/linux", "platform/shared",
-      "wire", "base"}},
-    {"tools",
-     {kPublicHeaders, "kstd/Analytics", "kstd", "KSTLib", "common", "platform", "platform/linux",
-      "keystrand-sim", "wire", "base"}},
-    {"bench",
-     {kPublicHeaders, "kstd/Analytics", "kstd/Analytics/SQLite", "kstd/DeviceRestrictedMode",
-      "kstd", "KSTLib", "common", "platform", "platform/linux", "wire", "base"}},
-    {"fuzz", {kPublicHeaders, "KSTLib", "common", "platform", "platform/shared", "wire", "base"}},
+/// Who may include whom: rooms, and files that may more than their room.
+struct Rules {
+    std::map<std::string, std::set<std::string>> rooms;
+    std::map<std::string, std::set<std::string>> files;
 };
 
-/// What a single file may include beyond its room.
-const std::map<std::string, std::set<std::string>> kMayIncludeToo = {
-    {"kstd/main.cpp", {"platform/linux"}},
-    {"KSTLib/shared/DefaultPlatform.cpp", {"platform/linux"}},
-    {"kstctl/status/LastUpload.cpp", {"kstd"}},
-};
+std::string trimmed(const std::string& text) {
+    const std::size_t start = text.find_first_not_of(' ');
+    return start == std::string::npos ? std::string()
+                                      : text.substr(start, text.find_last_not_of(' ') + 1 - start);
+}
+
+void addNames(std::set<std::string>& names, const std::string& list) {
+    std::istringstream stream(list);
+    for (std::string name; std::getline(stream, name, ',');) {
+        if (name = trimmed(name); !name.empty() && name != "nothing") {
+            names.insert(name);
+        }
+    }
+}
+
+/// The lines of the table in the document on the architecture.
+std::vector<std::string> linesOfTable() {
+    std::ifstream document(fs::path(SOURCE_ROOT) / "docs/architecture.md");
+    std::string line;
+    while (std::getline(document, line) && line.rfind("Who may include whom", 0) != 0) {
+    }
+    while (std::getline(document, line) && line != "```") {
+    }
+    std::vector<std::string> lines;
+    while (std::getline(document, line) && line != "```") {
+        lines.push_back(line);
+    }
+    return lines;
+}
+
+/// A name, two blanks or more, and a list, which may go on in the next line.
+Rules readRules() {
+    const std::string also = "also ";
+    Rules rules;
+    std::set<std::string>* names = nullptr;
+    for (const std::string& line : linesOfTable()) {
+        const std::size_t gap = line.find("  ");
+        if (gap == std::string::npos || (gap == 0 && names == nullptr)) {
+            ADD_FAILURE() << "not a line of the table: " << line;
+            continue;
+        }
+        std::string list = trimmed(line.substr(gap));
+        if (gap > 0) {
+            const bool isFile = list.rfind(also, 0) == 0;
+            list = isFile ? list.substr(also.size()) : list;
+            names = &(isFile ? rules.files : rules.rooms)[line.substr(0, gap)];
+        }
+        addNames(*names, list);
+    }
+    return rules;
+}
+
+const Rules& rules() {
+    static const Rules read = readRules();
+    return read;
+}
 
 const std::set<std::string>& publicHeaders() {
     static const std::set<std::string> headers = [] {
@@ -131,9 +153,29 @@ std::vector<Include> includesOfTree() {
 bool isAllowed(const Include& include) {
     const std::string from = roomOf(include.file);
     const std::string to = roomOf(include.target);
-    const auto extra = kMayIncludeToo.find(include.file);
-    return from == to || kMayInclude.at(from).contains(to) ||
-           (extra != kMayIncludeToo.end() && extra->second.contains(to));
+    const auto room = rules().rooms.find(from);
+    const auto extra = rules().files.find(include.file);
+    return from == to || (room != rules().rooms.end() && room->second.contains(to)) ||
+           (extra != rules().files.end() && extra->second.contains(to));
+}
+
+TEST(IncludeRulesTest, TableIsAboutTheRoomsAndTheFilesThatAreThere) {
+    std::set<std::string> rooms(kRooms.begin(), kRooms.end());
+    rooms.insert(kPublicHeaders);
+    std::set<std::string> inTable;
+    for (const auto& [room, names] : rules().rooms) {
+        inTable.insert(room);
+        for (const std::string& name : names) {
+            EXPECT_TRUE(rooms.contains(name)) << room << " may include " << name;
+        }
+    }
+    EXPECT_EQ(inTable, rooms);
+    for (const auto& [file, names] : rules().files) {
+        EXPECT_TRUE(fs::is_regular_file(fs::path(SOURCE_ROOT) / file)) << file;
+        for (const std::string& name : names) {
+            EXPECT_TRUE(rooms.contains(name)) << file << " may include " << name;
+        }
+    }
 }
 
 TEST(IncludeRulesTest, EveryIncludeIsAllowedByTheHouse) {
