@@ -1,16 +1,29 @@
 #include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
 
-#include "kstd/DeviceRestrictedMode/Requests.h"
+#include "KSTLib/KSTLib.h"
+#include "base/Saturate.h"
+#include "common/Allocation.h"
+#include "kstd/Analytics/Analytics.h"
 #include "kstd/DeviceRestrictedMode/StateFilePaths.h"
 #include "kstd/LogLines.h"
 #include "platform/EventStream.h"
+#include "platform/Files.h"
 #include "platform/ManagedSettings.h"
 #include "wire/EventDatagram.h"
+#include "wire/RestrictedMode.h"
 
 #include <algorithm>
 #include <array>
+#include <cstdint>
+#include <span>
 
 namespace kstd {
+
+/// Sends a kernel-control request that has no output. 0 or the status of the kernel side.
+[[nodiscard]] inline KSTStatus sendRequest(wire::rm::ControlCode code,
+                                           std::span<const std::uint8_t> input) {
+    return KSTKernelControl(code, input.data(), input.size(), nullptr);
+}
 
 using namespace wire::rm;
 
@@ -29,6 +42,75 @@ const char* yesOrNo(bool value) {
 
 std::size_t lengthOf(const std::optional<std::vector<std::uint8_t>>& blob) {
     return blob ? blob->size() : 0;
+}
+
+constexpr char kOnKextNotificationArrived[] =
+    "-[DeviceRestrictedModeService onKextNotificationArrivedWithPropertyName:]";
+constexpr char kSendNotificationACK[] =
+    "-[DeviceRestrictedModeService sendNotificationACKWithPropertyName:]";
+
+constexpr char kSaveDataBlob[] = "-[DeviceRestrictedModeService saveDataBlob:data:]";
+constexpr char kLoadDataBlob[] = "-[DeviceRestrictedModeService loadDataBlob:]";
+
+constexpr unsigned kOwnerReadWrite = 0600;
+
+/// Writes the blob through a stream of the file and syncs and closes it. A failure has written its
+/// assertion line.
+bool writeBlob(platform::Files& files, const platform::OpenFile& opened,
+               std::span<const std::uint8_t> data, const kst::AssertionContext& assertions) {
+    const auto file = files.attachStream(opened);
+    if (!file) {
+        kst::fail(assertions, "file", 0, kKSTErrorUnexpected);
+        return false;
+    }
+    bool failed = true;
+    if (file->write(data.data(), 1, data.size()) != data.size()) {
+        kst::fail(assertions, "written == data.length", 0, kKSTErrorUnexpected);
+    } else if (const int syncError = file->fullSync(); syncError != 0) {
+        kst::fail(assertions, "ferr == 0 ", syncError, kKSTErrorUnexpected);
+    } else if (const int closeError = file->close(); closeError != 0) {
+        kst::fail(assertions, "ferr == 0 ", closeError, kKSTErrorUnexpected);
+    } else {
+        failed = false;
+    }
+    if (failed) {
+        // Also after a failed close: the one failure path closes whatever happened before.
+        file->close();
+    }
+    return !failed;
+}
+
+constexpr char kOnKextTimerRestarted[] = "-[DeviceRestrictedModeService onKextTimerRestarted:]";
+constexpr char kOnKextAnalyticsCollected[] =
+    "-[DeviceRestrictedModeService onKextAnalyticsCollected:]";
+constexpr char kOnKextSaveAnalytics[] = "-[DeviceRestrictedModeService onKextSaveAnalytics:]";
+constexpr char kOnKextTimerRestartedAnalyticsCollected[] =
+    "-[DeviceRestrictedModeService onKextTimerRestartedAnalyticsCollected:]";
+constexpr char kScheduleAlarm[] = "-[DeviceRestrictedModeService scheduleAlarm:]";
+constexpr char kUnscheduleAlarm[] = "-[DeviceRestrictedModeService unscheduleAlarm]";
+
+constexpr std::int32_t kPolicyEventVersion = 3;
+constexpr std::int32_t kTimerRestartedEventVersion = 4;
+constexpr std::uint32_t kSecondsPerMinute = 60;
+
+platform::ValueMap policyAttributes(const KSTDRMDeamonNotification& notification) {
+    const bool isPolicyEnabled = notification.policyDisabledByPasscodeNotSet() == 0 &&
+                                 notification.policyDisabledByBootArg() == 0 &&
+                                 notification.policyDisabledByQuorvane() == 0;
+    return {{"eventVersion", kPolicyEventVersion},
+            {"restrictedMode", notification.restrictedMode()},
+            {"restrictedModeDuration", notification.restrictedModeDuration()},
+            {"policyEnabled", std::int32_t{isPolicyEnabled ? 1 : 0}},
+            {"policyDisabledByPasscodeNotSet", notification.policyDisabledByPasscodeNotSet()},
+            {"policyDisabledByBootArg", notification.policyDisabledByBootArg()},
+            {"policyDisabledByQuorvane", notification.policyDisabledByQuorvane()},
+            {"eventPeriodDuration", notification.eventPeriodDuration()}};
+}
+
+platform::ValueMap timerRestartedAttributes(const KSTDRMDeamonNotification& notification) {
+    return {{"eventVersion", kTimerRestartedEventVersion},
+            {"totalRestrictedModeDurationMin",
+             notification.totalRestrictedModeDuration() / kSecondsPerMinute}};
 }
 
 } // namespace
@@ -144,6 +226,163 @@ KSTStatus DeviceRestrictedModeService::onQuorvaneChanged() {
     logLine(host().log, kOnQuorvaneChanged, "returning, err = ", KSTStatus{kKSTErrorUnexpected},
             ".");
     return kKSTErrorUnexpected;
+}
+
+using namespace wire::rm;
+
+void DeviceRestrictedModeService::onKextNotificationArrivedWithPropertyName(
+    std::string_view propertyName) {
+    const auto propertyData = KSTPropertyWithName(propertyName);
+    if (!propertyData || propertyData->empty()) {
+        logLine(host().log, kOnKextNotificationArrived, "XXX Daemon: EMPTY IGNORING ", propertyName,
+                ".");
+        return;
+    }
+    const auto notification = KSTDRMDeamonNotification::fromBytes(*propertyData);
+    KSTStatus status = kKSTErrorUnexpected;
+    if (!notification) {
+        kst::fail(assertions(), "propertyData.length == sizeof(KSTDRMDeamonNotification)", 0,
+                  status);
+    } else {
+        logLine(host().log, kOnKextNotificationArrived, "XXX Daemon: PROCESSING ", propertyName,
+                ".");
+        status = dispatch(*notification);
+        if (status == kKSTErrorSuccess) {
+            sendNotificationACKWithPropertyName(propertyName);
+            return;
+        }
+    }
+    logLine(host().log, kOnKextNotificationArrived, "returning, err = ", status, ".");
+}
+
+/// Hands the record to the handler of its type, whatever property it came from.
+KSTStatus DeviceRestrictedModeService::dispatch(const KSTDRMDeamonNotification& notification) {
+    KSTStatus status = kKSTErrorSuccess;
+    switch (notification.type()) {
+    case kKSTRMNotificationTimerRestarted:
+        status = onKextTimerRestarted(notification);
+        break;
+    case kKSTRMNotificationAnalyticsCollected:
+        status = onKextAnalyticsCollected(notification);
+        break;
+    case kKSTRMNotificationSaveAnalytics:
+        status = onKextSaveAnalytics(notification);
+        break;
+    case kKSTRMNotificationTimerRestartedAnalyticsCollected:
+        status = onKextTimerRestartedAnalyticsCollected(notification);
+        break;
+    default:
+        return kst::fail(assertions(), "0", 0, kKSTErrorBadParameter);
+    }
+    return status == kKSTErrorSuccess ? status : kst::failCall(assertions(), status);
+}
+
+KSTStatus
+DeviceRestrictedModeService::sendNotificationACKWithPropertyName(std::string_view propertyName) {
+    logLine(host().log, kSendNotificationACK, "XXX Daemon: SENDING ACK ", propertyName, ".");
+    std::array<std::uint8_t, kNotificationAckPayloadSize> payload{};
+    std::copy_n(propertyName.begin(), std::min(propertyName.size(), payload.size()),
+                payload.begin());
+    const KSTStatus status = sendRequest(kKSTKernelControlRMNotificationAck, payload);
+    if (status == kKSTErrorSuccess) {
+        return kKSTErrorSuccess;
+    }
+    kst::failCall(assertions(), status);
+    logLine(host().log, kSendNotificationACK, "returning, err = ", KSTStatus{kKSTErrorUnexpected},
+            ".");
+    return kKSTErrorUnexpected;
+}
+
+KSTStatus DeviceRestrictedModeService::saveDataBlob(const std::string& path,
+                                                    std::span<const std::uint8_t> data) {
+    logLine(host().log, kSaveDataBlob, "called, filePath = ", path, ".");
+    const platform::OpenFile opened = host().files.openForWriting(
+        path, platform::ProtectionClass::none, platform::kNoClassOptions, kOwnerReadWrite);
+    if (opened.descriptor < 0) {
+        kst::fail(assertions(), "fd >= 0", 0, kKSTErrorUnexpected);
+    } else if (writeBlob(host().files, opened, data, assertions())) {
+        return kKSTErrorSuccess;
+    }
+    logLine(host().log, kSaveDataBlob, "returning, err = ", KSTStatus{kKSTErrorUnexpected}, ".");
+    return kKSTErrorUnexpected;
+}
+
+std::optional<std::vector<std::uint8_t>>
+DeviceRestrictedModeService::loadDataBlob(const std::string& path) {
+    logLine(host().log, kLoadDataBlob, "called, filePath = ", path, ".");
+    return host().files.load(path);
+}
+
+using namespace wire::rm;
+
+KSTStatus
+DeviceRestrictedModeService::onKextTimerRestarted(const KSTDRMDeamonNotification& notification) {
+    logLine(host().log, kOnKextTimerRestarted, "called, .");
+    logLine(host().log, kOnKextTimerRestarted, "version = ", notification.version(),
+            ", standardModeStartTimestamp = ", notification.standardModeStartTimestamp(),
+            ", lockedInRestrictedMode = ", notification.lockedInRestrictedMode(), ".");
+    const KSTStatus status = saveStateBlob(notification);
+    if (status != kKSTErrorSuccess) {
+        logLine(host().log, kOnKextTimerRestarted, "returning, err = ", status, ".");
+        return status;
+    }
+    if (notification.alarmTimestamp() != 0) {
+        scheduleAlarm(static_cast<double>(notification.alarmTimestamp()));
+    } else {
+        unscheduleAlarm();
+    }
+    return kKSTErrorSuccess;
+}
+
+KSTStatus DeviceRestrictedModeService::saveStateBlob(const KSTDRMDeamonNotification& notification) {
+    const kst::AllocatedMemory stateBlob(kStateBlobSize);
+    if (stateBlob.bytes() == nullptr) {
+        return kst::fail(assertions(), "stateBlob", 0, kKSTErrorUnexpected);
+    }
+    const auto record = notification.stateBlob();
+    std::copy(record.begin(), record.end(), stateBlob.bytes());
+    const KSTStatus status = saveDataBlob(kStateFilePath, {stateBlob.bytes(), stateBlob.size()});
+    return status == kKSTErrorSuccess ? status : kst::failCall(assertions(), status);
+}
+
+KSTStatus DeviceRestrictedModeService::onKextAnalyticsCollected(
+    const KSTDRMDeamonNotification& notification) {
+    logLine(host().log, kOnKextAnalyticsCollected, "called, .");
+    Analytics::logger(host())->logPolicyEventWithAttributes(policyAttributes(notification));
+    return kKSTErrorSuccess;
+}
+
+KSTStatus
+DeviceRestrictedModeService::onKextSaveAnalytics(const KSTDRMDeamonNotification& notification) {
+    logLine(host().log, kOnKextSaveAnalytics, "called, .");
+    const KSTStatus status = saveDataBlob(kAnalyticsFilePath, notification.analyticsBlob());
+    if (status != kKSTErrorSuccess) {
+        kst::failCall(assertions(), status);
+        logLine(host().log, kOnKextSaveAnalytics, "returning, err = ", status, ".");
+    }
+    return status;
+}
+
+KSTStatus DeviceRestrictedModeService::onKextTimerRestartedAnalyticsCollected(
+    const KSTDRMDeamonNotification& notification) {
+    logLine(host().log, kOnKextTimerRestartedAnalyticsCollected, "called, .");
+    Analytics::logger(host())->logTimerRestartedEventWithAttributes(
+        timerRestartedAttributes(notification));
+    return kKSTErrorSuccess;
+}
+
+void DeviceRestrictedModeService::scheduleAlarm(double seconds) {
+    logLine(host().log, kScheduleAlarm,
+            "called, timestamp=", base::saturate<std::uint32_t>(seconds), ".");
+    const platform::Date date{base::saturatingMultiply(base::saturate<std::int64_t>(seconds),
+                                                       platform::kNanosecondsPerSecond)};
+    const platform::EventDictionary dictionary{{platform::kAlarmDateKey, date}};
+    host().alarms.set(wire::kAlarmStream, wire::kAlarmName, &dictionary);
+}
+
+void DeviceRestrictedModeService::unscheduleAlarm() {
+    logLine(host().log, kUnscheduleAlarm, "called, .");
+    host().alarms.set(wire::kAlarmStream, wire::kAlarmName, nullptr);
 }
 
 } // namespace kstd

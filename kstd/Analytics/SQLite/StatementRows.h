@@ -1,13 +1,28 @@
 #pragma once
 
 #include "kstd/Analytics/SQLite/KSTDSQLite.h"
-#include "kstd/Analytics/SQLite/StatementUse.h"
+#include "kstd/Analytics/SQLite/KSTDSQLiteStatement.h"
 
 #include <concepts>
 #include <string_view>
 #include <utility>
 
 namespace kstd {
+
+/// One use of a statement: ends with its reset, also when something is thrown in between.
+class StatementUse {
+  public:
+    explicit StatementUse(KSTDSQLiteStatement& statement) : statement_(statement) {}
+    StatementUse(const StatementUse&) = delete;
+    StatementUse& operator=(const StatementUse&) = delete;
+    ~StatementUse() { statement_.reset(); }
+
+    KSTDSQLiteStatement& operator*() const { return statement_; }
+    KSTDSQLiteStatement* operator->() const { return &statement_; }
+
+  private:
+    KSTDSQLiteStatement& statement_;
+};
 
 /// Runs the statement of that text, bound by `bind`, and calls `takeRow` with it, standing on a
 /// row, for each row until it gives false. Without a statement there are no rows.

@@ -1,4 +1,4 @@
-#include "kstd/Analytics/SQLite/NumberText.h"
+#include "kstd/Analytics/SQLite/FormatText.h"
 
 #include <gtest/gtest.h>
 

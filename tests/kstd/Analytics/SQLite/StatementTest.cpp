@@ -1,4 +1,4 @@
-#include "kstd/Analytics/SQLite/StatementUse.h"
+#include "kstd/Analytics/SQLite/StatementRows.h"
 #include "tests/kstd/Analytics/SQLite/StatementFixture.h"
 
 #include <stdexcept>
