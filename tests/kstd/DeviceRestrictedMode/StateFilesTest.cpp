@@ -64,7 +64,7 @@ TEST_F(StateFilesTest, MissingDirectoryFailsAtTheOpen) {
     EXPECT_THAT(fake.files.calls(), ElementsAre("open /nowhere/file"));
     // The text names what the check belongs to, the fields the source that holds it.
     const auto line = fake.log.lines()[1];
-    EXPECT_EQ(line.file, "kstd/DeviceRestrictedMode/StateFiles.cpp");
+    EXPECT_EQ(line.file, "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.cpp");
     EXPECT_THAT(line.text, testing::EndsWith("  file: kstd/DeviceRestrictedMode/"
                                              "DeviceRestrictedModeService:" +
                                              std::to_string(line.line)));
