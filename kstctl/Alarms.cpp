@@ -3,7 +3,8 @@
 #include "base/Concat.h"
 #include "kstctl/FileError.h"
 #include "kstctl/RecordingLog.h"
-#include "platform/linux/AlarmStore.h"
+#include "platform/linux/alarms/AlarmStore.h"
+#include "wire/EventDatagram.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -48,7 +49,8 @@ bool speaksOf(const std::string& line, const std::string& path) {
 /// Appends the alarms of one stream, as the daemon's own code reads them.
 void append(std::vector<Alarm>& alarms, const std::string& directory, const std::string& stream) {
     RecordingLog log;
-    for (const auto& [event, date] : platform::AlarmStore(directory, log).load(stream)) {
+    for (const auto& [event, date] :
+         platform::AlarmStore(directory, {wire::kAlarmName}, log).load(stream)) {
         Alarm alarm{.stream = stream, .event = event, .date = date, .problem = {}};
         const std::string path = base::concat(directory, '/', stream, '/', event);
         for (const std::string& line : log.lines()) {
@@ -77,7 +79,9 @@ platform::Result<std::vector<Alarm>> registeredAlarms(const platform::Paths& pat
         if (error != 0) {
             return fileError(path, error);
         }
-        append(alarms, directory, stream);
+        if (!files.empty()) {
+            append(alarms, directory, stream);
+        }
     }
     std::sort(alarms.begin(), alarms.end(), [](const Alarm& one, const Alarm& other) {
         return std::tie(one.stream, one.event) < std::tie(other.stream, other.event);

@@ -2,7 +2,7 @@
 
 #include "base/ByteWriter.h"
 #include "platform/ManagedSettings.h"
-#include "platform/linux/AlarmStore.h"
+#include "platform/linux/alarms/AlarmStore.h"
 #include "wire/EventDatagram.h"
 
 #include <algorithm>
@@ -29,7 +29,8 @@ std::vector<Notice> alarmNotices(const platform::Paths& paths, platform::Clock& 
     std::vector<Notice> notices;
     const platform::Date now = clock.now();
     for (const auto& [event, date] :
-         platform::AlarmStore(paths.alarmDirectory(), log).load(wire::kAlarmStream)) {
+         platform::AlarmStore(paths.alarmDirectory(), {wire::kAlarmName}, log)
+             .load(wire::kAlarmStream)) {
         notices.push_back({wire::kAlarmStream, event, bytesOf(std::min(date, now))});
     }
     return notices;

@@ -1,9 +1,12 @@
 #include "kstd-notify/Notify.h"
 
+#include "kstd-notify/AlarmHelper.h"
 #include "kstd-notify/EventSender.h"
 #include "kstd-notify/Notice.h"
+#include "kstd-notify/SystemdAlarmTimer.h"
 #include "platform/SystemLog.h"
 #include "platform/shared/LogText.h"
+#include "wire/EventDatagram.h"
 
 #include <ostream>
 
@@ -11,8 +14,9 @@ namespace notify {
 
 namespace {
 
-constexpr char kUsage[] = "usage: kstd-notify alarm|settings\n"
+constexpr char kUsage[] = "usage: kstd-notify alarm|arm|settings\n"
                           "  alarm     tell the daemon of every registered alarm\n"
+                          "  arm       make the timer of the earliest alarm\n"
                           "  settings  tell the daemon that the managed settings have changed\n";
 
 /// The log of a program whose standard error is in the journal.
@@ -29,10 +33,29 @@ class StreamLog final : public platform::SystemLog {
     std::ostream& stream_;
 };
 
+/// What is wrong with the alarms on disk, the daemon says.
+class SilentLog final : public platform::SystemLog {
+  public:
+    void write(platform::LogLevel /*level*/, std::string_view /*text*/,
+               const platform::CodePlace& /*place*/) override {}
+};
+
+ExitStatus arm(const platform::Paths& paths, platform::Clock& clock, std::ostream& errors) {
+    SilentLog log;
+    platform::AlarmStore store(paths.alarmDirectory(), {wire::kAlarmName}, log);
+    SystemdAlarmTimer unit(paths.systemBus());
+    AlarmTimer timer(unit, clock, AlarmTimer::machineHere());
+    AlarmHelper helper(takeActivatedAlarmSocket(), store, unit, timer, clock, errors);
+    return helper.run() ? kSent : kNotSent;
+}
+
 } // namespace
 
 ExitStatus run(std::span<const std::string_view> arguments, const platform::Paths& paths,
                platform::Clock& clock, std::chrono::milliseconds patience, std::ostream& errors) {
+    if (arguments.size() == 1 && arguments.front() == "arm") {
+        return arm(paths, clock, errors);
+    }
     StreamLog log(errors);
     const auto notices =
         arguments.size() == 1 ? noticesOf(arguments.front(), paths, clock, log) : std::nullopt;

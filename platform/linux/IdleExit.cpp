@@ -16,7 +16,8 @@ IdleExit::IdleExit(LinuxRunLoop& loop, std::chrono::microseconds idleTime, Busy 
 // The timer is not moved at every event: when it fires after an event, it waits another idle time.
 // The process so ends between one and two idle times after the last event.
 void IdleExit::timeIsUp() {
-    if (std::exchange(touched_, false) || busy_()) {
+    const bool isBusy = busy_();
+    if (std::exchange(touched_, false) || isBusy) {
         timer_->fireAfter(idleTime_);
     } else {
         closeStreams_();

@@ -12,6 +12,7 @@ namespace platform {
 /// once, and the run loop is left without sources.
 class IdleExit {
   public:
+    /// Called after each idle time, whatever happened in it.
     using Busy = std::function<bool()>;
     using Close = std::function<void()>;
 

@@ -35,8 +35,8 @@ void LinuxEventStream::deliverOne() {
                    {});
     }
     delivery_->setEnabled(!queue_.empty());
-    if (delivered_) {
-        delivered_(event);
+    for (const Observer& observer : observers_) {
+        observer(event);
     }
 }
 

@@ -8,6 +8,7 @@
 #include <functional>
 #include <memory>
 #include <string_view>
+#include <vector>
 
 namespace platform {
 
@@ -39,8 +40,8 @@ class LinuxEventStream final : public EventStream {
         return queue_.holds(stream, name);
     }
 
-    /// Called after each event's handler has returned.
-    void setDeliveryObserver(Observer observer) { delivered_ = std::move(observer); }
+    /// Each observer is called after each event's handler has returned.
+    void addDeliveryObserver(Observer observer) { observers_.push_back(std::move(observer)); }
 
     /// Called after a stream has got its handler.
     void setHandlerObserver(HandlerObserver observer) { handlerSet_ = std::move(observer); }
@@ -50,7 +51,7 @@ class LinuxEventStream final : public EventStream {
 
     SystemLog& log_;
     EventQueue queue_;
-    Observer delivered_;
+    std::vector<Observer> observers_;
     HandlerObserver handlerSet_;
     std::unique_ptr<RunLoopSource> delivery_;
 };

@@ -3,7 +3,6 @@
 #include "base/Concat.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/IdleExit.h"
-#include "platform/linux/LinuxAlarm.h"
 #include "platform/linux/LinuxClock.h"
 #include "platform/linux/LinuxConfigurationResource.h"
 #include "platform/linux/LinuxEventStream.h"
@@ -20,9 +19,9 @@
 #include "platform/linux/LinuxUserDefaults.h"
 #include "platform/linux/RemoteHTTPSessions.h"
 #include "platform/linux/SettingsWatch.h"
-#include "platform/linux/SystemdAlarmTimer.h"
-#include "platform/linux/SystemdAlarmWaker.h"
-#include "platform/linux/TimerAlarmWaker.h"
+#include "platform/linux/alarms/HelpedAlarmWaker.h"
+#include "platform/linux/alarms/LinuxAlarm.h"
+#include "platform/linux/alarms/TimerAlarmWaker.h"
 #include "platform/shared/JSONCodec.h"
 #include "platform/shared/SerialQueueOfOne.h"
 
@@ -65,11 +64,10 @@ struct LinuxHost::Parts {
           channel(options.paths.kernelSocket(), registry, log),
           runLoop(log),
           events(runLoop, log),
-          timerWaker(runLoop, transactions, [this] { alarm.woke(); }),
-          alarmTimer(options.paths.systemBus()),
-          systemdWaker(alarmTimer, timerWaker, clock, log, SystemdAlarmWaker::machineHere()),
-          alarm(events, AlarmStore(options.paths.alarmDirectory(), log),
-                waker(options.paths.isSystemRoot())) {
+          timerWaker(runLoop, [this] { alarm.woke(); }),
+          waker(options.paths.alarmHelperSocket(), runLoop, timerWaker, log),
+          alarm(events, AlarmStore(options.paths.alarmDirectory(), std::move(options.alarms), log),
+                waker) {
         settingsWatch.emplace(options.paths.managedSettings(), runLoop, log, [this] {
             post(wire::kNotifydMatchingStream, kSettingsChangedEvent);
         });
@@ -86,24 +84,18 @@ struct LinuxHost::Parts {
         }
         if (options.idleTime) {
             idleExit = std::make_unique<IdleExit>(
-                runLoop, *options.idleTime, [this] { return events.busy() || transactions.busy(); },
+                runLoop, *options.idleTime, [this] { return isBusyAfterIdleTime(); },
                 [this] { closeStreams(); });
+            events.addDeliveryObserver([this](const Event&) { idleExit->touch(); });
         }
     }
 
-    /// A timer of the init system launches a daemon that has ended, if it is the init system that
-    /// does so.
-    AlarmWaker& waker(bool isSystemRoot) {
-        if (isSystemRoot && sd_booted() > 0) {
-            return systemdWaker;
-        }
-        return timerWaker;
+    bool isBusyAfterIdleTime() {
+        alarm.tryAgain();
+        return events.busy() || transactions.busy() || alarm.holdsProcess();
     }
 
     void post(std::string_view stream, std::string_view name) {
-        if (idleExit) {
-            idleExit->touch();
-        }
         events.post({std::string(stream), std::string(name)});
     }
 
@@ -147,8 +139,7 @@ struct LinuxHost::Parts {
     LinuxRunLoop runLoop;
     LinuxEventStream events;
     TimerAlarmWaker timerWaker;
-    SystemdAlarmTimer alarmTimer;
-    SystemdAlarmWaker systemdWaker;
+    HelpedAlarmWaker waker;
     LinuxAlarm alarm;
     std::optional<SettingsWatch> settingsWatch;
     std::unique_ptr<EventSocket> eventSocket;

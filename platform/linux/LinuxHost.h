@@ -6,11 +6,14 @@
 #include "platform/linux/Paths.h"
 #include "platform/linux/RemoteHTTPSessions.h"
 #include "platform/linux/StopRequest.h"
+#include "wire/EventDatagram.h"
 
 #include <chrono>
 #include <memory>
 #include <optional>
 #include <span>
+#include <string>
+#include <vector>
 
 namespace platform {
 
@@ -27,6 +30,8 @@ struct LinuxHostOptions {
     /// What asks the process to end; it outlives the host. The host then closes its streams as soon
     /// as the event in hand is handled, and ends every HTTPS request at once.
     const StopRequest* stop = nullptr;
+    /// The names that alarms may have.
+    std::vector<std::string> alarms{wire::kAlarmName};
     /// Where the HTTPS client is; with neither socket nor program, behind paths.httpsSocket().
     RemoteHTTPOptions https{};
 };

@@ -21,6 +21,7 @@ class Paths {
     [[nodiscard]] bool isSystemRoot() const { return prefix_.empty(); }
 
     [[nodiscard]] std::string eventSocket() const { return under("/run/kstd/events.sock"); }
+    [[nodiscard]] std::string alarmHelperSocket() const { return under("/run/kstd/alarms.sock"); }
     [[nodiscard]] std::string httpsSocket() const { return under("/run/kstd/https.sock"); }
     [[nodiscard]] std::string kernelSocket() const { return under(kKernelSocket); }
     [[nodiscard]] std::string managedSettingsDirectory() const { return under("/etc/kstd"); }

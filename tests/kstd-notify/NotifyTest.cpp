@@ -21,6 +21,7 @@ using Texts = std::vector<std::string>;
 
 constexpr std::int64_t kNow = platform::FakeClock::kStart.nanosecondsSince1970;
 constexpr char kAlarms[] = "/var/lib/kstd/alarms/com.zerva.alarm/";
+constexpr char kAlarm[] = "com.zerva.kstd.alarm";
 constexpr std::chrono::milliseconds kShortPatience{5};
 
 class NotifyTest : public testing::Test {
@@ -39,7 +40,7 @@ class NotifyTest : public testing::Test {
         return status;
     }
 
-    void putAlarm(const std::string& event, const std::string& content) {
+    void putAlarm(const std::string& content, const std::string& event = kAlarm) {
         root.put(kAlarms + event, content);
     }
 
@@ -89,24 +90,48 @@ TEST_F(NotifyTest, ChangedSettingsAreOneEvent) {
 
 TEST_F(NotifyTest, AlarmsThatAreDueAreSentWithTheirDatesAndOthersWithThePresentOne) {
     listen();
-    putAlarm("before", line(kNow - 1));
-    putAlarm("due", line(kNow));
-    putAlarm("later", line(kNow + 1));
-    putAlarm("cancelled", "none                \n");
+    const std::string event = "com.zerva.alarm com.zerva.kstd.alarm ";
+    const std::pair<std::string, Texts> cases[] = {
+        {line(kNow - 1), {event + std::to_string(kNow - 1)}},
+        {line(kNow), {event + std::to_string(kNow)}},
+        {line(kNow + 1), {event + std::to_string(kNow)}},
+        {"none                \n", {}},
+    };
+    for (const auto& [content, events] : cases) {
+        putAlarm(content);
+        EXPECT_EQ(run({"alarm"}), kSent);
+        EXPECT_EQ(received(), events);
+        EXPECT_EQ(errors, "");
+    }
+}
+
+TEST_F(NotifyTest, FileThatIsNoAlarmIsNotSent) {
+    listen();
+    putAlarm(line(kNow), std::string(kAlarm) + ".bak");
     EXPECT_EQ(run({"alarm"}), kSent);
-    EXPECT_EQ(received(), (Texts{"com.zerva.alarm before " + std::to_string(kNow - 1),
-                                 "com.zerva.alarm due " + std::to_string(kNow),
-                                 "com.zerva.alarm later " + std::to_string(kNow)}));
-    EXPECT_EQ(errors, "");
+    EXPECT_EQ(received(), Texts{});
+    EXPECT_EQ(errors, "kstd: AlarmStore: no alarm of the daemon, left alone: " +
+                          root.real(std::string(kAlarms) + kAlarm + ".bak") + ".\n");
+}
+
+TEST_F(NotifyTest, DirectoryThatCannotBeReadIsAnAlarmThatIsDue) {
+    listen();
+    std::filesystem::remove(root.real(kAlarms));
+    root.put("/var/lib/kstd/alarms/com.zerva.alarm", std::string("a file"));
+    EXPECT_EQ(run({"alarm"}), kSent);
+    EXPECT_EQ(received(), Texts{"com.zerva.alarm com.zerva.kstd.alarm 0"});
+    EXPECT_EQ(errors, "kstd: AlarmStore: unreadable directory, every alarm taken as due: " +
+                          root.real("/var/lib/kstd/alarms/com.zerva.alarm") +
+                          ": Not a directory.\n");
 }
 
 TEST_F(NotifyTest, AlarmThatCannotBeReadIsDue) {
     listen();
-    putAlarm("torn", "0170000");
+    putAlarm("0170000");
     EXPECT_EQ(run({"alarm"}), kSent);
-    EXPECT_EQ(received(), Texts{"com.zerva.alarm torn 0"});
+    EXPECT_EQ(received(), Texts{"com.zerva.alarm com.zerva.kstd.alarm 0"});
     EXPECT_EQ(errors, "kstd: AlarmStore: unreadable alarm, taken as due: " +
-                          root.real(std::string(kAlarms) + "torn") + ".\n");
+                          root.real(std::string(kAlarms) + kAlarm) + ".\n");
 }
 
 TEST_F(NotifyTest, WithoutAlarmsNothingIsSentAndNobodyNeedsToListen) {
@@ -142,14 +167,17 @@ TEST_F(NotifyTest, FullQueueIsAFailureAfterAWhile) {
     EXPECT_EQ(run({"settings"}), kSent);
 }
 
-TEST_F(NotifyTest, EveryAlarmThatIsNotSentIsNamed) {
-    putAlarm("a", line(kNow));
-    putAlarm("b", line(kNow));
+TEST_F(NotifyTest, AlarmThatIsNotSentIsNamed) {
+    putAlarm(line(kNow));
     EXPECT_EQ(run({"alarm"}), kNotSent);
-    for (const char* const event : {"a", "b"}) {
-        EXPECT_NE(errors.find(cannotSend(event, "No such file or directory")), std::string::npos)
-            << errors;
-    }
+    EXPECT_EQ(errors, cannotSend(kAlarm, "No such file or directory"));
+}
+
+TEST_F(NotifyTest, HelperWithoutABusIsAFailureWhenNobodyAsked) {
+    EXPECT_EQ(run({"arm"}), kSent) << "there is no alarm";
+    putAlarm(line(kNow + 1));
+    EXPECT_EQ(run({"arm"}), kNotSent);
+    EXPECT_EQ(errors, "kstd-notify: no timer for the alarm: No such file or directory\n");
 }
 
 TEST_F(NotifyTest, OtherArgumentsGiveTheUsage) {
@@ -158,7 +186,7 @@ TEST_F(NotifyTest, OtherArgumentsGiveTheUsage) {
         {}, {"boot"}, {""}, {"alarm", "alarm"}, {"--help"}};
     for (const auto& arguments : cases) {
         EXPECT_EQ(run(arguments), kWrongUsage);
-        EXPECT_EQ(errors.substr(0, 35), "usage: kstd-notify alarm|settings\n ");
+        EXPECT_EQ(errors.substr(0, 39), "usage: kstd-notify alarm|arm|settings\n ");
     }
     EXPECT_EQ(received(), Texts{});
 }

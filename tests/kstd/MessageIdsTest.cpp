@@ -4,7 +4,6 @@
 
 #include "base/UnixAddress.h"
 #include "kstd/Daemon.h"
-#include "platform/linux/AlarmStore.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/KernelSocketConnection.h"
 #include "platform/linux/LinuxConfigurationResource.h"
@@ -14,14 +13,15 @@
 #include "platform/linux/LinuxPropertyLists.h"
 #include "platform/linux/LinuxUserDefaults.h"
 #include "platform/linux/SettingsWatch.h"
-#include "platform/linux/SystemdAlarmTimer.h"
-#include "platform/linux/SystemdAlarmWaker.h"
+#include "platform/linux/alarms/AlarmStore.h"
+#include "platform/linux/alarms/HelpedAlarmWaker.h"
+#include "platform/linux/alarms/TimerAlarmWaker.h"
 #include "platform/shared/MessageClasses.h"
 #include "tests/kstd/Analytics/LoggerFixture.h"
 #include "tests/kstd/DaemonFixture.h"
-#include "tests/platform/linux/FakeAlarmWaker.h"
 #include "tests/platform/linux/RootDirectory.h"
 #include "tests/platform/linux/StandardErrorCapture.h"
+#include "tests/platform/linux/alarms/FakeAlarmHelper.h"
 #include "tests/support/ChildProcess.h"
 
 #include <gtest/gtest.h>
@@ -304,39 +304,40 @@ Texts configurationThatIsNotUsed() {
 
 Texts alarmThatIsNotKept() {
     platform::FakeSystemLog log;
-    platform::AlarmStore("/proc/nowhere", log).save("stream", "event", {1});
+    EXPECT_FALSE(
+        platform::AlarmStore("/proc/nowhere", {"event"}, log).save("stream", "event", {1}));
     return log.texts();
 }
 
-struct TimerUnitThatDoesNotWake final : platform::AlarmTimerUnit {
-    platform::Result<std::optional<Time>> elapses() override { return waits; }
-    std::optional<platform::Error> start(Time time, Wakes /*wakes*/) override {
-        waits = time;
-        return std::nullopt;
-    }
-    std::optional<platform::Error> stop() override { return std::nullopt; }
-
-    std::optional<Time> waits;
-};
-
-Texts alarmWith(platform::AlarmTimerUnit& timer) {
+/// An alarm whose helper answers so, or is not there.
+Texts alarmWith(const std::optional<wire::AlarmAnswer>& answer) {
+    const support::TemporaryDirectory directory;
+    const std::string path = directory.file("socket");
     platform::FakeSystemLog log;
-    platform::FakeClock clock;
-    platform::FakeAlarmWaker fallback;
-    platform::SystemdAlarmWaker waker(timer, fallback, clock, log,
-                                      platform::SystemdAlarmWaker::Machine::cannotBeWoken);
-    EXPECT_TRUE(waker.arm(platform::kDistantFuture));
+    platform::LinuxRunLoop loop(log);
+    platform::TimerAlarmWaker inProcess(loop, [] {});
+    platform::HelpedAlarmWaker waker(path, loop, inProcess, log, std::chrono::microseconds(1));
+    std::optional<platform::FakeAlarmHelper> helper;
+    if (answer) {
+        helper.emplace(path);
+    }
+    waker.arm(platform::kDistantFuture);
+    if (answer) {
+        helper->question().value().answer(*answer);
+    }
+    while (inProcess.holdsProcess() && log.texts().empty() &&
+           loop.runOnce(platform::kDistantFuture)) {
+    }
     return log.texts();
 }
 
-Texts alarmWithoutABus() {
-    platform::SystemdAlarmTimer timer("/nowhere");
-    return alarmWith(timer);
+Texts alarmWithoutAHelper() {
+    return alarmWith(std::nullopt);
 }
 
 Texts alarmThatDoesNotWake() {
-    TimerUnitThatDoesNotWake timer;
-    return alarmWith(timer);
+    return alarmWith(wire::AlarmAnswer{
+        wire::AlarmAnswer::Timer::waits, false, platform::kDistantFuture.nanosecondsSince1970, {}});
 }
 
 struct Example {
@@ -368,7 +369,7 @@ const std::vector<Example> kExamples = {
     {"settingsThatAreNotWatched", message::kSettingsNotWatched, settingsThatAreNotWatched},
     {"configurationThatIsNotUsed", message::kConfigurationNotUsed, configurationThatIsNotUsed},
     {"alarmThatIsNotKept", message::kAlarmNotKept, alarmThatIsNotKept},
-    {"alarmWithoutABus", message::kAlarmWithoutInitSystem, alarmWithoutABus},
+    {"alarmWithoutAHelper", message::kAlarmWithoutInitSystem, alarmWithoutAHelper},
     {"alarmThatDoesNotWake", message::kAlarmDoesNotWake, alarmThatDoesNotWake},
 };
 

@@ -53,10 +53,11 @@ TEST_F(IdleExitTest, NothingIsClosedWhileSomethingIsInHand) {
 TEST_F(IdleExitTest, AnEventStartsTheIdleTimeAnew) {
     int turns = 0;
     IdleExit idleExit(
-        loop, kShort, [] { return false; }, [this] { closeStreams(); });
+        loop, kShort, [this] { return ++busyQuestions < 0; }, [this] { closeStreams(); });
     idleExit.touch();
     EXPECT_TRUE(loop.runOnce(kDistantFuture));
     EXPECT_EQ(closed, 0);
+    EXPECT_EQ(busyQuestions, 1) << "each idle time is an opportunity to try again";
     while (loop.runOnce(kDistantFuture)) {
         ++turns;
     }

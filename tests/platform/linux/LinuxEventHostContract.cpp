@@ -65,7 +65,9 @@ class LinuxEventHostFixture final : public EventHostFixture {
     void start() {
         host_ = std::make_unique<platform::LinuxHost>(platform::LinuxHostOptions{
             .paths = root_.paths(),
-            .eventSocket = platform::makeEventSocket(root_.paths().eventSocket())});
+            .eventSocket = platform::makeEventSocket(root_.paths().eventSocket()),
+            .alarms = {"alarm", "later", "sooner", "far", "near", "cancelled", "kept", "one", "two",
+                       "never registered"}});
     }
 
     support::RootDirectory root_;

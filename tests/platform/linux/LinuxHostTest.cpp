@@ -8,6 +8,7 @@
 #include "platform/linux/RealTime.h"
 #include "tests/platform/linux/RootDirectory.h"
 #include "tests/platform/linux/StandardErrorCapture.h"
+#include "tests/platform/linux/alarms/FakeAlarmHelper.h"
 #include "tests/support/TerminationSignal.h"
 #include "wire/EventDatagram.h"
 
@@ -15,6 +16,7 @@
 
 #include <cstdlib>
 #include <fcntl.h>
+#include <filesystem>
 #include <memory>
 #include <string>
 #include <sys/socket.h>
@@ -46,7 +48,8 @@ class LinuxHostTest : public testing::Test {
         host = std::make_unique<LinuxHost>(LinuxHostOptions{.paths = root.paths(),
                                                             .eventSocket = std::move(eventSocket),
                                                             .idleTime = idleTime,
-                                                            .stop = stop});
+                                                            .stop = stop,
+                                                            .alarms = {"alarm"}});
         for (const char* const stream : {"com.zerva.notifyd.matching", kAlarms}) {
             interfaces().events.setHandler(stream, [this](const Event& event) {
                 delivered.push_back(event.name);
@@ -79,6 +82,19 @@ class LinuxHostTest : public testing::Test {
         const EventDictionary dictionary{{kAlarmDateKey, {date}}};
         interfaces().alarms.set(kAlarms, "alarm", &dictionary);
     }
+
+    /// The helper says that the timer waits for the date.
+    static void confirm(const FakeAlarmHelper& helper, std::int64_t date) {
+        const auto asked = helper.question();
+        ASSERT_TRUE(asked);
+        asked->answer(wire::AlarmAnswer{wire::AlarmAnswer::Timer::waits, true, date, {}});
+    }
+
+    void breakAlarms() const {
+        std::filesystem::remove_all(root.paths().alarmDirectory());
+        root.put("/var/lib/kstd/alarms", std::string("a file"));
+    }
+    void mendAlarms() const { std::filesystem::remove(root.paths().alarmDirectory()); }
 
     static std::vector<std::uint8_t> dateBytes(std::int64_t date) {
         std::vector<std::uint8_t> bytes(8);
@@ -114,6 +130,54 @@ TEST_F(LinuxHostTest, HostWithSomethingInHandDoesNotEnd) {
     transaction.reset();
     while (interfaces().runLoop.runOnce(kDistantFuture)) {
     }
+}
+
+TEST_F(LinuxHostTest, AlarmForWhichNobodyElseWaitsKeepsTheProcess) {
+    const FakeAlarmHelper helper(root.paths().alarmHelperSocket());
+    start(std::chrono::milliseconds(1));
+    setAlarm(kFarAway);
+    for (int idleTimes = 0; idleTimes < 5; ++idleTimes) {
+        EXPECT_TRUE(interfaces().runLoop.runOnce(kDistantFuture));
+    }
+    confirm(helper, kFarAway);
+    while (interfaces().runLoop.runOnce(kDistantFuture)) {
+    }
+}
+
+TEST_F(LinuxHostTest, AlarmThatIsNotOnDiskKeepsTheProcessUntilItIs) {
+    const FakeAlarmHelper helper(root.paths().alarmHelperSocket());
+    start(std::chrono::milliseconds(1));
+    breakAlarms();
+    setAlarm(kFarAway);
+    confirm(helper, kFarAway);
+    for (int idleTimes = 0; idleTimes < 5; ++idleTimes) {
+        EXPECT_TRUE(interfaces().runLoop.runOnce(kDistantFuture));
+    }
+    mendAlarms();
+    while (!helper.question()) {
+        ASSERT_TRUE(interfaces().runLoop.runOnce(kDistantFuture));
+    }
+    EXPECT_TRUE(root.bytesOf("/var/lib/kstd/alarms/com.zerva.alarm/alarm"));
+    // The answer comes with the next registration only: this helper has lost the question.
+    setAlarm(kFarAway);
+    confirm(helper, kFarAway);
+    while (interfaces().runLoop.runOnce(kDistantFuture)) {
+    }
+}
+
+TEST_F(LinuxHostTest, ProcessStaysForAnIdleTimeAfterAnEventOfItsOwn) {
+    constexpr std::int64_t kIdleTime = 100'000'000;
+    start(std::chrono::milliseconds(kIdleTime / 1'000'000));
+    setAlarm(realTimeNow().nanosecondsSince1970 + kIdleTime / 2);
+    Date handled{};
+    while (interfaces().runLoop.runOnce(kDistantFuture)) {
+        if (!delivered.empty() && handled == Date{}) {
+            handled = realTimeNow();
+        }
+    }
+    EXPECT_THAT(delivered, ElementsAre("alarm"));
+    EXPECT_GE(realTimeNow().nanosecondsSince1970 - handled.nanosecondsSince1970,
+              kIdleTime - 1'000'000);
 }
 
 TEST_F(LinuxHostTest, EventThatArrivesAfterTheEndStaysInTheSocketForTheNextProcess) {
@@ -177,6 +241,30 @@ TEST_F(StoppedHostTest, WaitingForAnAlarmEnds) {
     support::TerminationSignal::send();
     runToTheEnd();
     EXPECT_THAT(delivered, ElementsAre());
+}
+
+TEST_F(StoppedHostTest, AlarmThatIsNotOnDiskIsTriedOnceMore) {
+    start(std::chrono::hours(1));
+    breakAlarms();
+    setAlarm(kFarAway);
+    mendAlarms();
+    const support::StandardErrorCapture standardError;
+    support::TerminationSignal::send();
+    runToTheEnd();
+    EXPECT_TRUE(root.bytesOf("/var/lib/kstd/alarms/com.zerva.alarm/alarm"));
+    EXPECT_EQ(standardError.text(), "");
+}
+
+TEST_F(StoppedHostTest, AlarmThatDoesNotGetOntoDiskIsLostWithALine) {
+    start(std::chrono::hours(1));
+    breakAlarms();
+    setAlarm(kFarAway);
+    const support::StandardErrorCapture standardError;
+    support::TerminationSignal::send();
+    runToTheEnd();
+    EXPECT_EQ(standardError.text(),
+              "kstd: AlarmStore: the alarm is lost until the kernel side sends it again: " +
+                  root.real("/var/lib/kstd/alarms/com.zerva.alarm/alarm") + ": Not a directory.\n");
 }
 
 TEST_F(StoppedHostTest, AStopBeforeTheFirstTurnIsSeenAndSaidOnce) {

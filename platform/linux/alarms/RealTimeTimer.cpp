@@ -1,4 +1,4 @@
-#include "platform/linux/RealTimeTimer.h"
+#include "platform/linux/alarms/RealTimeTimer.h"
 
 #include <algorithm>
 #include <cerrno>

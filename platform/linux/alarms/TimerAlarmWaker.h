@@ -1,40 +1,38 @@
 #pragma once
 
-#include "platform/ProcessTransaction.h"
-#include "platform/linux/AlarmWaker.h"
 #include "platform/linux/LinuxRunLoop.h"
-#include "platform/linux/RealTimeTimer.h"
+#include "platform/linux/alarms/AlarmWaker.h"
+#include "platform/linux/alarms/RealTimeTimer.h"
 
 #include <functional>
 #include <memory>
-#include <optional>
 
 namespace platform {
 
 /// AlarmWaker with a timer in this process. It cannot launch a process that is gone, so while it is
-/// armed a transaction keeps this one from ending for being idle.
+/// armed it holds this one.
 class TimerAlarmWaker final : public AlarmWaker {
   public:
     using Woke = std::function<void()>;
 
     /// `woke` is called when the date has come and when the clock was set; it arms again what is to
-    /// be armed. Loop and transactions must outlive the waker.
-    TimerAlarmWaker(LinuxRunLoop& loop, ProcessTransactions& transactions, Woke woke);
+    /// be armed. The loop must outlive the waker.
+    TimerAlarmWaker(LinuxRunLoop& loop, Woke woke);
 
-    /// Always true: a date that is past wakes at once.
-    [[nodiscard]] bool arm(Date date) override;
+    void arm(Date date) override;
     void disarm() override;
+    [[nodiscard]] bool holdsProcess() const override { return isArmed_; }
+    void tryAgain() override {}
     /// From then on nothing is armed.
     void close() override;
 
   private:
     void timerIsReadable();
 
-    ProcessTransactions& transactions_;
     Woke woke_;
     RealTimeTimer timer_;
     std::unique_ptr<RunLoopSource> source_;
-    std::optional<ProcessTransaction> armed_;
+    bool isArmed_ = false;
 };
 
 } // namespace platform

@@ -1,4 +1,4 @@
-#include "platform/linux/LinuxAlarm.h"
+#include "platform/linux/alarms/LinuxAlarm.h"
 
 #include "base/ByteReader.h"
 #include "platform/linux/RealTime.h"
@@ -8,7 +8,7 @@ namespace platform {
 LinuxAlarm::LinuxAlarm(LinuxEventStream& events, AlarmStore store, AlarmWaker& waker)
     : events_(events), store_(std::move(store)), waker_(waker) {
     events_.setHandlerObserver([this](std::string_view stream) { restore(stream); });
-    events_.setDeliveryObserver([this](const Event& event) { delivered(event); });
+    events_.addDeliveryObserver([this](const Event& event) { delivered(event); });
 }
 
 void LinuxAlarm::set(std::string_view stream, std::string_view event,
@@ -17,7 +17,7 @@ void LinuxAlarm::set(std::string_view stream, std::string_view event,
     restore(stream);
     events_.drop(stream, event);
     if (const auto date = alarmDateIn(dictionary)) {
-        store_.save(stream, event, *date);
+        save(name, *date);
         registrations_.put(name, *date);
     } else {
         cancel(name);
@@ -25,8 +25,44 @@ void LinuxAlarm::set(std::string_view stream, std::string_view event,
     fireDueAndArm();
 }
 
+void LinuxAlarm::save(const Name& name, Date date) {
+    if (store_.save(name.first, name.second, date)) {
+        unsaved_.erase(name);
+        return;
+    }
+    unsaved_.insert_or_assign(name, date);
+    if (isClosed_) {
+        store_.reportLost(name.first, name.second);
+    }
+}
+
+void LinuxAlarm::saveUnsaved() {
+    for (const auto& [name, date] : std::map(unsaved_)) {
+        save(name, date);
+    }
+}
+
+void LinuxAlarm::tryAgain() {
+    const std::size_t unsaved = unsaved_.size();
+    saveUnsaved();
+    if (unsaved_.size() == unsaved) {
+        waker_.tryAgain();
+        return;
+    }
+    // What the waker looks at may have been the earlier state of the disk.
+    knowsWhatIsArmed_ = false;
+    fireDueAndArm();
+}
+
+void LinuxAlarm::close() {
+    isClosed_ = true;
+    saveUnsaved();
+    waker_.close();
+}
+
 void LinuxAlarm::cancel(const Name& name) {
     store_.clear(name.first, name.second);
+    unsaved_.erase(name);
     registrations_.erase(name);
 }
 
@@ -68,29 +104,21 @@ void LinuxAlarm::delivered(const Event& event) {
 }
 
 void LinuxAlarm::fireDueAndArm() {
-    do {
-        for (const auto& [stream, event] : registrations_.takeDue(realTimeNow())) {
-            events_.post({stream, event});
-        }
-    } while (!armForNext());
-}
-
-/// False when the next alarm became due before it was armed.
-bool LinuxAlarm::armForNext() {
+    for (const auto& [stream, event] : registrations_.takeDue(realTimeNow())) {
+        events_.post({stream, event});
+    }
     const std::optional<Date> next = registrations_.next();
-    if (knowsWhatIsArmed_ && armedFor_ == next) {
-        return true;
-    }
-    knowsWhatIsArmed_ = false;
-    if (next && !waker_.arm(*next)) {
-        return false;
-    }
-    if (!next) {
-        waker_.disarm();
+    // A process that waits itself would rather not: whatever happens is an opportunity.
+    if (knowsWhatIsArmed_ && armedFor_ == next && !waker_.holdsProcess()) {
+        return;
     }
     armedFor_ = next;
     knowsWhatIsArmed_ = true;
-    return true;
+    if (next) {
+        waker_.arm(*next);
+    } else {
+        waker_.disarm();
+    }
 }
 
 } // namespace platform

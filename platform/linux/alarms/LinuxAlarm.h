@@ -1,12 +1,13 @@
 #pragma once
 
 #include "platform/EventStream.h"
-#include "platform/linux/AlarmStore.h"
-#include "platform/linux/AlarmWaker.h"
 #include "platform/linux/LinuxEventStream.h"
+#include "platform/linux/alarms/AlarmStore.h"
+#include "platform/linux/alarms/AlarmWaker.h"
 #include "platform/shared/AlarmRegistrations.h"
 
 #include <cstdint>
+#include <map>
 #include <optional>
 #include <set>
 #include <span>
@@ -37,17 +38,26 @@ class LinuxAlarm final : public AlarmEvent {
     /// The waker woke this process: what is due fires, and the rest is armed again.
     void woke();
 
-    /// This process is woken no more; the registrations stay.
-    void close() { waker_.close(); }
+    /// Whether an alarm is lost, or late, to a process that ends now: the date is not on disk, or
+    /// nothing but this process waits for it.
+    [[nodiscard]] bool holdsProcess() const { return !unsaved_.empty() || waker_.holdsProcess(); }
+
+    /// An idle time has passed: what has failed is tried again.
+    void tryAgain();
+
+    /// This process is woken no more; the registrations stay. An alarm that does not get onto disk
+    /// now, or that is set afterwards and does not, is lost, with a line.
+    void close();
 
   private:
     using Name = AlarmRegistrations::Name;
 
     void restore(std::string_view stream);
+    void save(const Name& name, Date date);
+    void saveUnsaved();
     void delivered(const Event& event);
     void cancel(const Name& name);
     void fireDueAndArm();
-    [[nodiscard]] bool armForNext();
 
     LinuxEventStream& events_;
     AlarmStore store_;
@@ -55,9 +65,12 @@ class LinuxAlarm final : public AlarmEvent {
     AlarmRegistrations registrations_;
     /// The streams whose registrations were read back.
     std::set<std::string, std::less<>> restored_;
+    /// What is not on disk.
+    std::map<Name, Date> unsaved_;
     /// What the waker waits for, as far as this process knows.
     std::optional<Date> armedFor_;
     bool knowsWhatIsArmed_ = true;
+    bool isClosed_ = false;
 };
 
 } // namespace platform

@@ -1,38 +1,28 @@
-#include "platform/linux/TimerAlarmWaker.h"
+#include "platform/linux/alarms/TimerAlarmWaker.h"
 
 #include <utility>
 
 namespace platform {
 
-namespace {
-
-constexpr char kArmedLabel[] = "alarm armed";
-
-} // namespace
-
-TimerAlarmWaker::TimerAlarmWaker(LinuxRunLoop& loop, ProcessTransactions& transactions, Woke woke)
-    : transactions_(transactions),
-      woke_(std::move(woke)),
+TimerAlarmWaker::TimerAlarmWaker(LinuxRunLoop& loop, Woke woke)
+    : woke_(std::move(woke)),
       source_(loop.addReadable(timer_.descriptor(), [this] { timerIsReadable(); })) {
     source_->setEnabled(false);
 }
 
-bool TimerAlarmWaker::arm(Date date) {
+void TimerAlarmWaker::arm(Date date) {
     if (source_) {
         timer_.arm(date);
         source_->setEnabled(true);
-        if (!armed_) {
-            armed_.emplace(transactions_, kArmedLabel);
-        }
+        isArmed_ = true;
     }
-    return true;
 }
 
 void TimerAlarmWaker::disarm() {
-    if (armed_) {
+    if (isArmed_) {
         timer_.disarm();
         source_->setEnabled(false);
-        armed_.reset();
+        isArmed_ = false;
     }
 }
 

@@ -1,4 +1,4 @@
-#include "platform/linux/SystemdBus.h"
+#include "kstd-notify/SystemdBus.h"
 
 #include "base/Concat.h"
 
@@ -7,7 +7,7 @@
 #include <cerrno>
 #include <system_error>
 
-namespace platform {
+namespace notify {
 
 namespace {
 
@@ -33,13 +33,13 @@ int connect(sd_bus** bus, const std::string& socket) {
 }
 
 /// The error of a call: the bus's own words, or the system's where it has none.
-Error errorOf(int result, const sd_bus_error& error) {
+platform::Error errorOf(int result, const sd_bus_error& error) {
     const std::string text =
         error.message != nullptr ? error.message : std::generic_category().message(-result);
-    return {error.name != nullptr ? error.name : kSystemErrorDomain, -result, text};
+    return {error.name != nullptr ? error.name : platform::kSystemErrorDomain, -result, text};
 }
 
-Error systemError(int result) {
+platform::Error systemError(int result) {
     return errorOf(result, sd_bus_error{});
 }
 
@@ -65,8 +65,8 @@ SystemdBus::~SystemdBus() {
     sd_bus_close_unref(bus_);
 }
 
-Result<std::uint64_t> SystemdBus::unsignedProperty(const char* path, const char* interface,
-                                                   const char* name) {
+platform::Result<std::uint64_t>
+SystemdBus::unsignedProperty(const char* path, const char* interface, const char* name) {
     if (failure_ != 0) {
         return systemError(failure_);
     }
@@ -75,14 +75,14 @@ Result<std::uint64_t> SystemdBus::unsignedProperty(const char* path, const char*
     const int result = sd_bus_get_property_trivial(bus_, kSystemd, path, interface, name, &error,
                                                    SD_BUS_TYPE_UINT64, &value);
     if (result < 0) {
-        const Error failed = errorOf(result, error);
+        const platform::Error failed = errorOf(result, error);
         sd_bus_error_free(&error);
         return failed;
     }
     return value;
 }
 
-std::optional<Error> SystemdBus::runJob(const char* method, const Arguments& arguments) {
+std::optional<platform::Error> SystemdBus::runJob(const char* method, const Arguments& arguments) {
     if (failure_ != 0) {
         return systemError(failure_);
     }
@@ -103,14 +103,14 @@ std::optional<Error> SystemdBus::runJob(const char* method, const Arguments& arg
                          then(arguments(call)) &&
                          then(sd_bus_call(bus_, call, kPatienceMicroseconds, &error, &reply)) &&
                          then(sd_bus_message_read(reply, "o", &job));
-    std::optional<Error> failed = isBegun ? awaitRemoval(job) : errorOf(result, error);
+    std::optional<platform::Error> failed = isBegun ? awaitRemoval(job) : errorOf(result, error);
     sd_bus_error_free(&error);
     sd_bus_message_unref(reply);
     sd_bus_message_unref(call);
     return failed;
 }
 
-std::optional<Error> SystemdBus::awaitRemoval(const std::string& job) {
+std::optional<platform::Error> SystemdBus::awaitRemoval(const std::string& job) {
     const auto deadline = std::chrono::steady_clock::now() + kPatience;
     while (removedJob_ != job) {
         const int processed = sd_bus_process(bus_, nullptr);
@@ -133,4 +133,4 @@ std::optional<Error> SystemdBus::awaitRemoval(const std::string& job) {
     return std::nullopt;
 }
 
-} // namespace platform
+} // namespace notify

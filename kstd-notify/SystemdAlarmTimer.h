@@ -1,10 +1,10 @@
 #pragma once
 
-#include "platform/linux/AlarmTimerUnit.h"
+#include "kstd-notify/AlarmTimerUnit.h"
 
 #include <string>
 
-namespace platform {
+namespace notify {
 
 /// AlarmTimerUnit as systemd's transient unit kstd-alarm.timer, asked for over the system's message
 /// bus. It starts kstd-alarm.service, which is installed.
@@ -16,9 +16,10 @@ class SystemdAlarmTimer final : public AlarmTimerUnit {
     /// `busSocket` is the file of the bus's socket.
     explicit SystemdAlarmTimer(std::string busSocket) : busSocket_(std::move(busSocket)) {}
 
-    [[nodiscard]] Result<std::optional<Time>> elapses() override;
-    [[nodiscard]] std::optional<Error> start(Time time, Wakes wakes) override;
-    [[nodiscard]] std::optional<Error> stop() override;
+    [[nodiscard]] platform::Result<std::optional<Time>> elapses() override;
+    [[nodiscard]] std::optional<platform::Error> start(Time time, Wakes wakes) override;
+    [[nodiscard]] std::optional<platform::Error> elapseNow() override;
+    [[nodiscard]] std::optional<platform::Error> stop() override;
 
   private:
     std::string busSocket_;
@@ -27,4 +28,4 @@ class SystemdAlarmTimer final : public AlarmTimerUnit {
 /// The time as systemd's calendar writes it.
 [[nodiscard]] std::string calendarText(AlarmTimerUnit::Time time);
 
-} // namespace platform
+} // namespace notify

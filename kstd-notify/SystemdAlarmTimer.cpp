@@ -1,6 +1,6 @@
-#include "platform/linux/SystemdAlarmTimer.h"
+#include "kstd-notify/SystemdAlarmTimer.h"
 
-#include "platform/linux/SystemdBus.h"
+#include "kstd-notify/SystemdBus.h"
 
 #include <systemd/sd-bus.h>
 
@@ -9,11 +9,12 @@
 #include <limits>
 #include <time.h>
 
-namespace platform {
+namespace notify {
 
 namespace {
 
 constexpr char kUnit[] = "kstd-alarm.timer";
+constexpr char kService[] = "kstd-alarm.service";
 constexpr char kUnitPath[] = "/org/freedesktop/systemd1/unit/kstd_2dalarm_2etimer";
 constexpr char kTimer[] = "org.freedesktop.systemd1.Timer";
 /// What is queued for the unit gives way to the new job.
@@ -52,7 +53,7 @@ int appendUnit(sd_bus_message* call, AlarmTimerUnit::Time time, AlarmTimerUnit::
 
 } // namespace
 
-Result<std::optional<AlarmTimerUnit::Time>> SystemdAlarmTimer::elapses() {
+platform::Result<std::optional<AlarmTimerUnit::Time>> SystemdAlarmTimer::elapses() {
     const auto next =
         SystemdBus(busSocket_).unsignedProperty(kUnitPath, kTimer, "NextElapseUSecRealtime");
     if (!next) {
@@ -65,13 +66,19 @@ Result<std::optional<AlarmTimerUnit::Time>> SystemdAlarmTimer::elapses() {
     return std::optional(static_cast<Time>(next.value()));
 }
 
-std::optional<Error> SystemdAlarmTimer::start(Time time, Wakes wakes) {
+std::optional<platform::Error> SystemdAlarmTimer::start(Time time, Wakes wakes) {
     return SystemdBus(busSocket_).runJob("StartTransientUnit", [&](sd_bus_message* call) {
         return appendUnit(call, time, wakes);
     });
 }
 
-std::optional<Error> SystemdAlarmTimer::stop() {
+std::optional<platform::Error> SystemdAlarmTimer::elapseNow() {
+    return SystemdBus(busSocket_).runJob("StartUnit", [](sd_bus_message* call) {
+        return sd_bus_message_append(call, "ss", kService, kReplace);
+    });
+}
+
+std::optional<platform::Error> SystemdAlarmTimer::stop() {
     auto error = SystemdBus(busSocket_).runJob("StopUnit", [](sd_bus_message* call) {
         return sd_bus_message_append(call, "ss", kUnit, kReplace);
     });
@@ -90,4 +97,4 @@ std::string calendarText(AlarmTimerUnit::Time time) {
     return text;
 }
 
-} // namespace platform
+} // namespace notify

@@ -1,4 +1,4 @@
-#include "platform/linux/SystemdAlarmTimer.h"
+#include "kstd-notify/SystemdAlarmTimer.h"
 
 #include "base/FileDescriptor.h"
 #include "base/UnixAddress.h"
@@ -12,7 +12,7 @@
 #include <utility>
 #include <vector>
 
-namespace platform {
+namespace notify {
 namespace {
 
 TEST(SystemdAlarmTimerTest, CalendarTextHasEveryMicrosecond) {
@@ -28,18 +28,19 @@ TEST(SystemdAlarmTimerTest, CalendarTextHasEveryMicrosecond) {
     }
 }
 
-void expectEveryCallFails(SystemdAlarmTimer timer, const Error& error) {
+void expectEveryCallFails(SystemdAlarmTimer timer, const platform::Error& error) {
     const auto elapses = timer.elapses();
     ASSERT_FALSE(elapses);
     EXPECT_EQ(elapses.error(), error);
     EXPECT_EQ(timer.start(1, AlarmTimerUnit::Wakes::nothing), error);
+    EXPECT_EQ(timer.elapseNow(), error);
     EXPECT_EQ(timer.stop(), error);
 }
 
 TEST(SystemdAlarmTimerTest, BusThatIsNotThereIsAnError) {
     const support::TemporaryDirectory directory;
     expectEveryCallFails(SystemdAlarmTimer(directory.file("bus")),
-                         {kSystemErrorDomain, ENOENT, "No such file or directory"});
+                         {platform::kSystemErrorDomain, ENOENT, "No such file or directory"});
 }
 
 TEST(SystemdAlarmTimerTest, BusThatDoesNotListenIsAnError) {
@@ -48,8 +49,8 @@ TEST(SystemdAlarmTimerTest, BusThatDoesNotListenIsAnError) {
     const auto address = base::UnixAddress::of(directory.file("bus")).value();
     ASSERT_EQ(::bind(socket.get(), address.get(), address.size()), 0);
     expectEveryCallFails(SystemdAlarmTimer(directory.file("bus")),
-                         {kSystemErrorDomain, ECONNREFUSED, "Connection refused"});
+                         {platform::kSystemErrorDomain, ECONNREFUSED, "Connection refused"});
 }
 
 } // namespace
-} // namespace platform
+} // namespace notify

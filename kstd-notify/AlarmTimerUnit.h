@@ -6,7 +6,7 @@
 #include <cstdint>
 #include <optional>
 
-namespace platform {
+namespace notify {
 
 /// The init system's timer that starts the sender of due alarms. There is one, and it outlives this
 /// process. A call has taken effect when it returns.
@@ -26,15 +26,18 @@ class AlarmTimerUnit {
     virtual ~AlarmTimerUnit() = default;
 
     /// When the timer elapses; none when there is no timer, or none that will.
-    [[nodiscard]] virtual Result<std::optional<Time>> elapses() = 0;
+    [[nodiscard]] virtual platform::Result<std::optional<Time>> elapses() = 0;
 
     /// Starts the timer, from 0 to kLatest. There must be none. A time that is past makes one that
     /// never elapses. Gives the error when the init system refuses; that it did not still leaves it
     /// to `elapses` to tell whether the timer waits.
-    [[nodiscard]] virtual std::optional<Error> start(Time time, Wakes wakes) = 0;
+    [[nodiscard]] virtual std::optional<platform::Error> start(Time time, Wakes wakes) = 0;
+
+    /// Starts at once what the timer would start when it elapses.
+    [[nodiscard]] virtual std::optional<platform::Error> elapseNow() = 0;
 
     /// Takes the timer away; that there is none is fine.
-    [[nodiscard]] virtual std::optional<Error> stop() = 0;
+    [[nodiscard]] virtual std::optional<platform::Error> stop() = 0;
 };
 
-} // namespace platform
+} // namespace notify

@@ -12,7 +12,7 @@
 struct sd_bus;
 struct sd_bus_message;
 
-namespace platform {
+namespace notify {
 
 /// A connection to systemd's manager over the system's message bus, for a few calls in a row.
 ///
@@ -27,21 +27,22 @@ class SystemdBus {
     SystemdBus& operator=(const SystemdBus&) = delete;
     ~SystemdBus();
 
-    [[nodiscard]] Result<std::uint64_t> unsignedProperty(const char* path, const char* interface,
-                                                         const char* name);
+    [[nodiscard]] platform::Result<std::uint64_t>
+    unsignedProperty(const char* path, const char* interface, const char* name);
 
     /// Adds the arguments of a call to its message; negative when that failed.
     using Arguments = std::function<int(sd_bus_message* call)>;
 
     /// Calls a method of the manager that begins a job, and waits until the job has ended, however
     /// it did.
-    [[nodiscard]] std::optional<Error> runJob(const char* method, const Arguments& arguments);
+    [[nodiscard]] std::optional<platform::Error> runJob(const char* method,
+                                                        const Arguments& arguments);
 
     /// The name of the bus's error for a unit that is not there.
     static constexpr char kNoSuchUnit[] = "org.freedesktop.systemd1.NoSuchUnit";
 
   private:
-    [[nodiscard]] std::optional<Error> awaitRemoval(const std::string& job);
+    [[nodiscard]] std::optional<platform::Error> awaitRemoval(const std::string& job);
 
     sd_bus* bus_ = nullptr;
     /// Why there is no connection; 0 when there is one.
@@ -50,4 +51,4 @@ class SystemdBus {
     std::string removedJob_;
 };
 
-} // namespace platform
+} // namespace notify

@@ -1,10 +1,9 @@
-#include "platform/linux/LinuxAlarm.h"
+#include "platform/linux/alarms/LinuxAlarm.h"
 
-#include "platform/fake/FakeProcessTransactions.h"
 #include "platform/fake/FakeSystemLog.h"
 #include "platform/linux/RealTime.h"
-#include "platform/linux/TimerAlarmWaker.h"
-#include "tests/platform/linux/FakeAlarmWaker.h"
+#include "platform/linux/alarms/TimerAlarmWaker.h"
+#include "tests/platform/linux/alarms/FakeAlarmWaker.h"
 #include "tests/support/TemporaryDirectory.h"
 
 #include <gmock/gmock.h>
@@ -26,10 +25,12 @@ using testing::Pair;
 constexpr std::int64_t kMillisecond = 1'000'000;
 constexpr std::int64_t kFarAway = 4'102'444'800'000'000'000;
 
+const std::vector<std::string> kNames = {"a", "b", "c", "sooner", "later"};
+
 /// One process's alarms on a directory.
 struct AlarmProcess {
     explicit AlarmProcess(const std::string& directory)
-        : alarm(events, AlarmStore(directory, log), waker) {}
+        : alarm(events, AlarmStore(directory, kNames, log), waker) {}
 
     void subscribe() {
         events.setHandler("stream",
@@ -44,8 +45,7 @@ struct AlarmProcess {
     FakeSystemLog log;
     LinuxRunLoop loop{log};
     LinuxEventStream events{loop, log};
-    FakeProcessTransactions transactions;
-    TimerAlarmWaker waker{loop, transactions, [this] {
+    TimerAlarmWaker waker{loop, [this] {
                               alarm.woke();
                           }};
     LinuxAlarm alarm;
@@ -71,7 +71,7 @@ class LinuxAlarmTest : public testing::Test {
     }
 
     [[nodiscard]] std::vector<std::pair<std::string, Date>> registered() {
-        return AlarmStore(path, process->log).load("stream");
+        return AlarmStore(path, kNames, process->log).load("stream");
     }
 
     support::TemporaryDirectory directory;
@@ -79,17 +79,18 @@ class LinuxAlarmTest : public testing::Test {
     std::unique_ptr<AlarmProcess> process;
 };
 
-TEST_F(LinuxAlarmTest, ArmedAlarmHoldsATransactionAndKeepsTheLoopRunning) {
+TEST_F(LinuxAlarmTest, ArmedAlarmHoldsTheProcessAndKeepsTheLoopRunning) {
+    EXPECT_FALSE(process->alarm.holdsProcess());
     EXPECT_FALSE(process->loop.runOnce({0}));
     process->set("a", kFarAway);
-    EXPECT_THAT(process->transactions.open(), ElementsAre("alarm armed"));
+    EXPECT_TRUE(process->alarm.holdsProcess());
     EXPECT_TRUE(process->loop.runOnce({0}));
     process->set("b", kFarAway);
-    EXPECT_EQ(process->transactions.count(), 1U);
+    EXPECT_TRUE(process->alarm.holdsProcess());
     process->alarm.set("stream", "a", nullptr);
-    EXPECT_EQ(process->transactions.count(), 1U);
+    EXPECT_TRUE(process->alarm.holdsProcess());
     process->alarm.set("stream", "b", nullptr);
-    EXPECT_EQ(process->transactions.count(), 0U);
+    EXPECT_FALSE(process->alarm.holdsProcess());
     EXPECT_FALSE(process->loop.runOnce({0}));
 }
 
@@ -100,7 +101,7 @@ TEST_F(LinuxAlarmTest, TimerWakesTheLoopAtTheDateAndNotBefore) {
     }
     EXPECT_THAT(process->delivered, ElementsAre("a"));
     EXPECT_GE(realTimeNow(), date);
-    EXPECT_EQ(process->transactions.count(), 0U);
+    EXPECT_FALSE(process->alarm.holdsProcess());
     EXPECT_THAT(registered(), ElementsAre());
 }
 
@@ -176,7 +177,7 @@ TEST_F(LinuxAlarmTest, AlarmSetAnewByItsOwnHandlerStays) {
     process->set("a", 1);
     EXPECT_TRUE(process->loop.runOnce(kDistantFuture));
     EXPECT_THAT(registered(), ElementsAre(Pair("a", Date{kFarAway})));
-    EXPECT_EQ(process->transactions.count(), 1U);
+    EXPECT_TRUE(process->alarm.holdsProcess());
 }
 
 TEST_F(LinuxAlarmTest, ArrivedAlarmCountsForThePresentRegistrationOnly) {
@@ -234,7 +235,7 @@ TEST_F(LinuxAlarmTest, AfterCloseRegistrationsAreStillKept) {
     process->alarm.close();
     process->set("a", kFarAway);
     EXPECT_THAT(registered(), ElementsAre(Pair("a", Date{kFarAway})));
-    EXPECT_EQ(process->transactions.count(), 0U);
+    EXPECT_FALSE(process->alarm.holdsProcess());
 }
 
 /// Alarms with a waker that only notes what it is asked for.
@@ -249,7 +250,7 @@ class AlarmsWaker : public testing::Test {
     void cancel(const std::string& event) { alarm.set("stream", event, nullptr); }
 
     /// What another process finds that has no alarm of its own.
-    [[nodiscard]] AlarmStore store() { return {directory.file("alarms"), log}; }
+    [[nodiscard]] AlarmStore store() { return {directory.file("alarms"), {"a", "b", "c"}, log}; }
 
     static std::string armed(std::int64_t date) { return "arm " + std::to_string(date); }
 
@@ -280,7 +281,7 @@ TEST_F(AlarmsWaker, IsLeftAloneWhileNothingIsRegistered) {
 }
 
 TEST_F(AlarmsWaker, IsArmedForWhatALaterProcessFinds) {
-    store().save("stream", "a", {kFarAway});
+    EXPECT_TRUE(store().save("stream", "a", {kFarAway}));
     events.setHandler("stream", [](const Event&) {});
     events.setHandler("other", [](const Event&) {});
     EXPECT_EQ(waker.takeCalls(), Calls{armed(kFarAway)});
@@ -307,23 +308,140 @@ TEST_F(AlarmsWaker, IsArmedAgainWhenItWoke) {
     EXPECT_EQ(waker.takeCalls(), Calls{armed(kFarAway)});
 }
 
-TEST_F(AlarmsWaker, MayFindThatTheDateHasPassed) {
-    events.setHandler("stream", [](const Event&) {});
-    waker.whileArming = [](Date date) {
-        while (realTimeNow() < date) {
-        }
-        return false;
-    };
-    // Long enough for a slow disk, on which the alarm is put first.
-    const std::int64_t date = realTimeNow().nanosecondsSince1970 + 300 * kMillisecond;
-    set("a", date);
-    EXPECT_TRUE(events.holds("stream", "a"));
-    EXPECT_EQ(waker.takeCalls(), (Calls{armed(date), "disarm"}));
+TEST_F(AlarmsWaker, IsAskedAgainAtEachRegistrationWhileItHoldsTheProcess) {
+    set("a", kFarAway);
+    set("a", kFarAway);
+    EXPECT_EQ(waker.takeCalls(), Calls{armed(kFarAway)});
+    waker.holds = true;
+    set("a", kFarAway);
+    set("a", kFarAway);
+    EXPECT_EQ(waker.takeCalls(), (Calls{armed(kFarAway), armed(kFarAway)}));
+    EXPECT_TRUE(alarm.holdsProcess());
+    waker.holds = false;
+    set("a", kFarAway);
+    EXPECT_EQ(waker.takeCalls(), Calls{});
+    EXPECT_FALSE(alarm.holdsProcess());
+}
+
+TEST_F(AlarmsWaker, TriesAgainAfterAnIdleTime) {
+    set("a", kFarAway);
+    waker.takeCalls();
+    alarm.tryAgain();
+    EXPECT_EQ(waker.takeCalls(), Calls{"try again"});
 }
 
 TEST_F(AlarmsWaker, IsClosedWithTheAlarms) {
     alarm.close();
     EXPECT_EQ(waker.takeCalls(), Calls{"close"});
+    EXPECT_EQ(log.texts(), Calls{});
+}
+
+/// Alarms for which a file stands in the place of their directory, since it was read.
+class UnsavedAlarmTest : public AlarmsWaker {
+  protected:
+    UnsavedAlarmTest() {
+        events.setHandler("stream",
+                          [this](const Event& event) { delivered.push_back(event.name); });
+        breakDisk();
+    }
+
+    void breakDisk() { std::ofstream(directory.file("alarms")) << "a file"; }
+    void mendDisk() { std::filesystem::remove(directory.file("alarms")); }
+
+    [[nodiscard]] std::string file(const std::string& event) const {
+        return directory.file("alarms/stream/" + event);
+    }
+    [[nodiscard]] std::string notKept(const std::string& event) const {
+        return "kstd: AlarmStore: cannot keep the alarm on disk: " + file(event) +
+               ": Not a directory.";
+    }
+    [[nodiscard]] std::string lost(const std::string& event) const {
+        return "kstd: AlarmStore: the alarm is lost until the kernel side sends it again: " +
+               file(event) + ": Not a directory.";
+    }
+
+    std::vector<std::string> delivered;
+};
+
+TEST_F(UnsavedAlarmTest, HoldsTheProcessUntilItIsOnDisk) {
+    set("a", kFarAway);
+    EXPECT_TRUE(alarm.holdsProcess());
+    for (int idleTimes = 0; idleTimes < 3; ++idleTimes) {
+        alarm.tryAgain();
+        EXPECT_TRUE(alarm.holdsProcess());
+    }
+    EXPECT_EQ(log.texts(), Calls{notKept("a")});
+    EXPECT_EQ(waker.takeCalls(), (Calls{armed(kFarAway), "try again", "try again", "try again"}));
+    mendDisk();
+    alarm.tryAgain();
+    EXPECT_FALSE(alarm.holdsProcess());
+    EXPECT_THAT(store().load("stream"), ElementsAre(Pair("a", Date{kFarAway})));
+    EXPECT_EQ(waker.takeCalls(), Calls{armed(kFarAway)}) << "who makes the timer reads the disk";
+}
+
+TEST_F(UnsavedAlarmTest, HoldsTheProcessThoughAnEarlierOneIsOnDisk) {
+    mendDisk();
+    set("a", kFarAway);
+    std::filesystem::create_directory(file("b"));
+    set("b", kFarAway + 1);
+    EXPECT_TRUE(alarm.holdsProcess());
+    std::filesystem::remove(file("b"));
+    alarm.tryAgain();
+    EXPECT_FALSE(alarm.holdsProcess());
+}
+
+TEST_F(UnsavedAlarmTest, IsReplacedByTheNextRegistration) {
+    set("a", kFarAway);
+    mendDisk();
+    set("a", kFarAway + 1);
+    EXPECT_FALSE(alarm.holdsProcess());
+    alarm.tryAgain();
+    EXPECT_THAT(store().load("stream"), ElementsAre(Pair("a", Date{kFarAway + 1})));
+}
+
+TEST_F(UnsavedAlarmTest, CanBeCancelled) {
+    set("a", kFarAway);
+    cancel("a");
+    EXPECT_FALSE(alarm.holdsProcess());
+    mendDisk();
+    alarm.tryAgain();
+    EXPECT_THAT(store().load("stream"), ElementsAre());
+}
+
+TEST_F(UnsavedAlarmTest, FiresAllTheSame) {
+    set("a", 1);
+    EXPECT_TRUE(alarm.holdsProcess());
+    EXPECT_TRUE(loop.runOnce(kDistantFuture));
+    EXPECT_THAT(delivered, ElementsAre("a"));
+    EXPECT_FALSE(alarm.holdsProcess());
+}
+
+TEST_F(UnsavedAlarmTest, IsTriedOnceMoreAtTheEnd) {
+    set("a", kFarAway);
+    log.clear();
+    mendDisk();
+    alarm.close();
+    EXPECT_THAT(store().load("stream"), ElementsAre(Pair("a", Date{kFarAway})));
+    EXPECT_EQ(log.texts(), Calls{});
+}
+
+TEST_F(UnsavedAlarmTest, IsLostAtTheEndWithALine) {
+    set("a", kFarAway);
+    set("b", kFarAway);
+    alarm.close();
+    EXPECT_EQ(log.texts(), (Calls{notKept("a"), notKept("b"), lost("a"), lost("b")}));
+    log.clear();
+    set("c", kFarAway);
+    EXPECT_EQ(log.texts(), (Calls{notKept("c"), lost("c")}));
+}
+
+TEST_F(AlarmsWaker, LeavesADirectoryThatCannotBeReadToFireEveryAlarm) {
+    std::ofstream(directory.file("alarms")) << "a file";
+    std::vector<std::string> delivered;
+    events.setHandler("stream", [&](const Event& event) { delivered.push_back(event.name); });
+    while (events.busy() && loop.runOnce(kDistantFuture)) {
+    }
+    EXPECT_THAT(delivered, ElementsAre("a", "b", "c"));
 }
 
 } // namespace
