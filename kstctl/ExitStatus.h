@@ -20,6 +20,8 @@ enum class ExitStatus : int {
     unreadable = 4,
     /// It is there and is not what it must be.
     malformed = 5,
+    /// An upload setting is there that cannot be used, or not safely.
+    misconfigured = 6,
 };
 
 /// An error whose code is the status that the program ends with.

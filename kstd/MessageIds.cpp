@@ -42,6 +42,7 @@ constexpr platform::MessageClass kClasses[] = {
     {kSettingsNotWatched, "kstd: SettingsWatch: cannot watch "},
     {kConfigurationNotUsed, "kstd: UserDefaults: "},
     {kConfigurationNotUsed, "kstd: ConfigurationResource: "},
+    {kUploadSettingInDoubt, "kstd: AnalyticsConfiguration: "},
     {kAlarmNotKept, "kstd: AlarmStore: "},
     {kAlarmWithoutInitSystem, "kstd: AlarmWaker: no timer of the init system"},
     {kAlarmDoesNotWake, "kstd: AlarmWaker: this machine cannot be woken from sleep"},

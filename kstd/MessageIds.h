@@ -26,6 +26,7 @@ inline constexpr char kNoEventSocket[] = "d51a48700d914fe2834a619ff49b188a";
 inline constexpr char kSettingsNotUsed[] = "1699858cf330423f849effe5cc5b3d83";
 inline constexpr char kSettingsNotWatched[] = "c440e14511aa4cbe9493c86b771de725";
 inline constexpr char kConfigurationNotUsed[] = "cbb56232475f452eaa4c55d725479c81";
+inline constexpr char kUploadSettingInDoubt[] = "05779f7538d34662ba69ab4773d00966";
 inline constexpr char kAlarmNotKept[] = "28956f503d6840c6b95823e4541c8c11";
 inline constexpr char kAlarmWithoutInitSystem[] = "105f14b0574c4d4ea79747e7cfe9333b";
 inline constexpr char kAlarmDoesNotWake[] = "285fb5ce60d749ddb2a777dc495019ae";

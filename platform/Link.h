@@ -18,6 +18,21 @@ struct Link {
         return {all.begin(), std::find(all.begin(), all.end(), ':')};
     }
 
+    /// What stands between the "//" behind the scheme and the path: the host, with what surrounds
+    /// it. Empty when there is none.
+    [[nodiscard]] std::string_view authority() const { return authorityIn(text); }
+
+    /// The same of a text of unknown worth.
+    [[nodiscard]] static std::string_view authorityIn(std::string_view text) {
+        constexpr std::string_view kBefore = "://";
+        const std::size_t begin = text.find(kBefore);
+        if (begin == std::string_view::npos) {
+            return {};
+        }
+        const std::string_view rest = text.substr(begin + kBefore.size());
+        return rest.substr(0, rest.find_first_of("/?#"));
+    }
+
     friend bool operator==(const Link&, const Link&) = default;
 };
 
@@ -63,6 +78,12 @@ namespace link_text {
 }
 
 } // namespace link_text
+
+/// Whether a user or a password stands in the text of a link. They are nobody else's business, and
+/// never sent.
+[[nodiscard]] inline bool namesUser(std::string_view link) {
+    return Link::authorityIn(link).find('@') != std::string_view::npos;
+}
 
 /// The absolute link that `text` is in full (RFC 3986: a scheme, a colon, and only characters that
 /// a link may hold), or none. Whether anything can be reached there is not looked at.

@@ -2,12 +2,11 @@
 
 #include "platform/Value.h"
 
-#include <optional>
 #include <string_view>
 
 namespace platform {
 
-/// What the administrator of this machine has set, by domain and key.
+/// What the administrator of this machine has set, by domain.
 class UserDefaults {
   public:
     UserDefaults() = default;
@@ -15,9 +14,9 @@ class UserDefaults {
     UserDefaults& operator=(const UserDefaults&) = delete;
     virtual ~UserDefaults() = default;
 
-    /// The value, or none when nothing is set. Read anew on every call.
-    [[nodiscard]] virtual std::optional<Value> value(std::string_view domain,
-                                                     std::string_view key) = 0;
+    /// All that is set in the domain; empty when nothing is. Read anew on every call, as one state
+    /// of it.
+    [[nodiscard]] virtual ValueMap load(std::string_view domain) = 0;
 };
 
 } // namespace platform

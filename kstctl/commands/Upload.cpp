@@ -129,8 +129,7 @@ ExitStatus showDocument(const UploadCommand& command, const Environment& environ
     for (const std::string& remark : configuration.remarks) {
         Output::complain(remark);
     }
-    return output.finish(configuration.remarks.empty() ? ExitStatus::success
-                                                       : ExitStatus::malformed);
+    return output.finish(configuration.status);
 }
 
 /// The daemon uploads when the date has passed, not in its very second.

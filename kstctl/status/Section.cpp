@@ -7,10 +7,12 @@ namespace {
 int badness(ExitStatus status) {
     switch (status) {
     case ExitStatus::missing:
-        return 4;
+        return 5;
     case ExitStatus::unreadable:
-        return 3;
+        return 4;
     case ExitStatus::malformed:
+        return 3;
+    case ExitStatus::misconfigured:
         return 2;
     case ExitStatus::failed:
     case ExitStatus::usage:

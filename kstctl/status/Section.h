@@ -17,7 +17,8 @@ struct Section {
     Report report;
     std::optional<platform::Error> worst;
 
-    /// Keeps the worse of two faults. From the worst on: missing, unreadable, malformed, failed.
+    /// Keeps the worse of two faults. From the worst on: missing, unreadable, malformed,
+    /// misconfigured, failed.
     void note(const platform::Error& fault);
 
     /// Adds a value that could not be found out.

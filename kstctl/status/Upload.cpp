@@ -55,20 +55,20 @@ UploadConfiguration UploadConfiguration::read(const platform::Paths& paths) {
     platform::LinuxPropertyLists propertyLists;
     platform::LinuxConfigurationResource resources(paths, propertyLists, log);
     platform::LinuxUserDefaults defaults(paths, propertyLists, log);
-    UploadConfiguration configuration{
-        .analytics = kstd::AnalyticsConfiguration::read(resources, defaults), .remarks = {}};
-    for (const std::string& line : log.lines()) {
-        auto& remarks = configuration.remarks;
-        // The defaults are read anew for each setting.
-        if (std::find(remarks.begin(), remarks.end(), line) == remarks.end()) {
-            remarks.push_back(line);
-        }
+    UploadConfiguration configuration{.analytics =
+                                          kstd::AnalyticsConfiguration::read(resources, defaults)};
+    if (!log.lines().empty()) {
+        configuration.status = ExitStatus::malformed;
+    } else if (!configuration.analytics.problems.empty()) {
+        configuration.status = ExitStatus::misconfigured;
     }
+    configuration.analytics.report(log);
+    configuration.remarks = log.lines();
     return configuration;
 }
 
 Section uploadSection(const Environment& environment) {
-    const auto [analytics, remarks] = UploadConfiguration::read(environment.paths);
+    const auto [analytics, remarks, status] = UploadConfiguration::read(environment.paths);
     const bool isConfigured = analytics.splunkUploadURL || analytics.splunkBagURL;
     Section section;
     section.report
@@ -83,7 +83,7 @@ Section uploadSection(const Environment& environment) {
     addLastUpload(section, environment);
     if (!remarks.empty()) {
         section.report.add("problems", Data(remarks.begin(), remarks.end()));
-        section.note(failure(ExitStatus::malformed, remarks.front()));
+        section.note(failure(status, remarks.front()));
     }
     return section;
 }

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "kstctl/ExitStatus.h"
 #include "kstd/Analytics/AnalyticsConfiguration.h"
 #include "platform/linux/Paths.h"
 
@@ -11,8 +12,11 @@ namespace kstctl {
 /// Where events go, as the next daemon will read it.
 struct UploadConfiguration {
     kstd::AnalyticsConfiguration analytics;
-    /// What is wrong with the files; a file that is wrong counts for nothing.
-    std::vector<std::string> remarks;
+    /// What is wrong with the files, which then count for nothing, and with the settings: the lines
+    /// of the daemon.
+    std::vector<std::string> remarks = {};
+    /// What they come to: success when there are none.
+    ExitStatus status = ExitStatus::success;
 
     [[nodiscard]] static UploadConfiguration read(const platform::Paths& paths);
 };

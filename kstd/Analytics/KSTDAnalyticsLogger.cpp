@@ -45,6 +45,7 @@ void KSTDAnalyticsLogger::init(const std::string& databasePath) {
 
 void KSTDAnalyticsLogger::readConfiguration() {
     auto configuration = AnalyticsConfiguration::read(host_.resources, host_.defaults);
+    configuration.report(host_.log);
     fields.splunkTopicName = std::move(configuration.splunkTopicName);
     fields.splunkUploadURL = std::move(configuration.splunkUploadURL);
     fields.splunkBagURL = std::move(configuration.splunkBagURL);

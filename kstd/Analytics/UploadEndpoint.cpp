@@ -63,6 +63,9 @@ std::optional<Link> KSTDAnalyticsLogger::takeOverMetrics(const EndpointBag& bag)
     if (!bag.metricsUrl) {
         return std::nullopt;
     }
+    if (platform::namesUser(*bag.metricsUrl)) {
+        return std::nullopt;
+    }
     const std::string text =
         base::concat(*bag.metricsUrl, "/2/", fields.splunkTopicName.value_or("(null)"));
     host_.log.write(LogLevel::info, base::concat("got metrics endpoint: ", text), {});

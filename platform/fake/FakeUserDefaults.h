@@ -2,9 +2,10 @@
 
 #include "platform/UserDefaults.h"
 
+#include <functional>
 #include <map>
 #include <string>
-#include <utility>
+#include <string_view>
 
 namespace platform {
 
@@ -14,14 +15,12 @@ class FakeUserDefaults final : public UserDefaults {
     FakeUserDefaults();
     ~FakeUserDefaults() override;
 
-    [[nodiscard]] std::optional<Value> value(std::string_view domain,
-                                             std::string_view key) override;
+    [[nodiscard]] ValueMap load(std::string_view domain) override;
     void set(std::string_view domain, std::string_view key, Value value);
     void remove(std::string_view domain, std::string_view key);
 
   private:
-    /// By domain and key.
-    std::map<std::pair<std::string, std::string>, Value> values_;
+    std::map<std::string, ValueMap, std::less<>> domains_;
 };
 
 } // namespace platform

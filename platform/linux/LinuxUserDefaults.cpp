@@ -9,16 +9,11 @@ namespace platform {
 LinuxUserDefaults::LinuxUserDefaults(Paths paths, PropertyLists& propertyLists, SystemLog& log)
     : paths_(std::move(paths)), file_("UserDefaults", propertyLists, log) {}
 
-std::optional<Value> LinuxUserDefaults::value(std::string_view domain, std::string_view key) {
+ValueMap LinuxUserDefaults::load(std::string_view domain) {
     if (!isPlainFileName(domain)) {
-        return std::nullopt;
+        return {};
     }
-    const std::optional<ValueMap> map = file_.load(paths_.userDefaults(domain));
-    if (!map) {
-        return std::nullopt;
-    }
-    const auto entry = map->find(key);
-    return entry == map->end() ? std::nullopt : std::optional(entry->second);
+    return file_.load(paths_.userDefaults(domain)).value_or(ValueMap());
 }
 
 } // namespace platform

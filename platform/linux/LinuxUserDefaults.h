@@ -13,8 +13,7 @@ class LinuxUserDefaults final : public UserDefaults {
     /// `propertyLists` and `log` must outlive it.
     LinuxUserDefaults(Paths paths, PropertyLists& propertyLists, SystemLog& log);
 
-    [[nodiscard]] std::optional<Value> value(std::string_view domain,
-                                             std::string_view key) override;
+    [[nodiscard]] ValueMap load(std::string_view domain) override;
 
   private:
     Paths paths_;

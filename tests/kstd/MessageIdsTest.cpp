@@ -3,6 +3,7 @@
 #include "kstd/MessageIds.h"
 
 #include "base/UnixAddress.h"
+#include "kstd/Analytics/AnalyticsConfiguration.h"
 #include "kstd/Daemon.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/KernelSocketConnection.h"
@@ -295,10 +296,20 @@ Texts configurationThatIsNotUsed() {
         root.makeDirectory(directory);
         root.put(std::string(directory) + "/d.plist", "no property list");
     }
-    static_cast<void>(
-        platform::LinuxUserDefaults(root.paths(), propertyLists, log).value("d", "key"));
+    static_cast<void>(platform::LinuxUserDefaults(root.paths(), propertyLists, log).load("d"));
     static_cast<void>(
         platform::LinuxConfigurationResource(root.paths(), propertyLists, log).load("c", "d"));
+    return log.texts();
+}
+
+Texts uploadSettingsThatAreInDoubt() {
+    platform::FakeSystemLog log;
+    platform::FakeConfigurationResource resources;
+    platform::FakeUserDefaults defaults;
+    for (const char* const link : {"no link", "https://user@x.example/", "http://x.example/"}) {
+        defaults.set("com.zerva.keystrand.analytics", "splunk_uploadURL", link);
+        AnalyticsConfiguration::read(resources, defaults).report(log);
+    }
     return log.texts();
 }
 
@@ -368,6 +379,7 @@ const std::vector<Example> kExamples = {
     {"settingsThatAreNotUsed", message::kSettingsNotUsed, settingsThatAreNotUsed},
     {"settingsThatAreNotWatched", message::kSettingsNotWatched, settingsThatAreNotWatched},
     {"configurationThatIsNotUsed", message::kConfigurationNotUsed, configurationThatIsNotUsed},
+    {"uploadSettingsThatAreInDoubt", message::kUploadSettingInDoubt, uploadSettingsThatAreInDoubt},
     {"alarmThatIsNotKept", message::kAlarmNotKept, alarmThatIsNotKept},
     {"alarmWithoutAHelper", message::kAlarmWithoutInitSystem, alarmWithoutAHelper},
     {"alarmThatDoesNotWake", message::kAlarmDoesNotWake, alarmThatDoesNotWake},
@@ -439,7 +451,7 @@ TEST(MessageIdsTest, IdentifiersAreThoseOfTheCatalog) {
         }
     }
     EXPECT_EQ(known, explained);
-    EXPECT_EQ(known.size(), 19U);
+    EXPECT_EQ(known.size(), 20U);
 }
 
 } // namespace

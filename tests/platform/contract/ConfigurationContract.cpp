@@ -14,28 +14,25 @@ constexpr char kDomain[] = "com.zerva.keystrand.analytics";
 constexpr char kComponent[] = "Keystrand";
 constexpr char kResource[] = "KSTDAnalyticsLogging";
 
-TEST_P(UserDefaultsContract, NothingSetIsNone) {
-    EXPECT_EQ(fixture().defaults().value(kDomain, "topic"), std::nullopt);
+TEST_P(UserDefaultsContract, NothingSetIsEmpty) {
+    EXPECT_EQ(fixture().defaults().load(kDomain), ValueMap());
 }
 
-TEST_P(UserDefaultsContract, ValuesAreFoundByDomainAndKey) {
-    fixture().put(kDomain, {{"topic", "kst"}, {"insecure", true}});
+TEST_P(UserDefaultsContract, DomainIsLoadedWhole) {
+    const ValueMap content = {{"topic", "kst"}, {"insecure", true}};
+    fixture().put(kDomain, content);
     fixture().put("com.zerva.other", {{"topic", "other"}});
-    EXPECT_EQ(fixture().defaults().value(kDomain, "topic"), Value("kst"));
-    EXPECT_EQ(fixture().defaults().value(kDomain, "insecure"), Value(true));
-    EXPECT_EQ(fixture().defaults().value("com.zerva.other", "topic"), Value("other"));
-    EXPECT_EQ(fixture().defaults().value(kDomain, "Topic"), std::nullopt);
-    EXPECT_EQ(fixture().defaults().value(kDomain, ""), std::nullopt);
-    EXPECT_EQ(fixture().defaults().value("com.zerva.third", "topic"), std::nullopt);
+    EXPECT_EQ(fixture().defaults().load(kDomain), content);
+    EXPECT_EQ(fixture().defaults().load("com.zerva.other"), (ValueMap{{"topic", "other"}}));
+    EXPECT_EQ(fixture().defaults().load("com.zerva.third"), ValueMap());
+    EXPECT_EQ(fixture().defaults().load(""), ValueMap());
 }
 
 TEST_P(UserDefaultsContract, EveryCallReadsAnew) {
-    fixture().put(kDomain, {{"topic", "one"}});
-    EXPECT_EQ(fixture().defaults().value(kDomain, "topic"), Value("one"));
-    fixture().put(kDomain, {{"topic", "two"}});
-    EXPECT_EQ(fixture().defaults().value(kDomain, "topic"), Value("two"));
-    fixture().put(kDomain, {});
-    EXPECT_EQ(fixture().defaults().value(kDomain, "topic"), std::nullopt);
+    for (const ValueMap& content : {ValueMap{{"topic", "one"}}, {{"topic", "two"}}, {}}) {
+        fixture().put(kDomain, content);
+        EXPECT_EQ(fixture().defaults().load(kDomain), content);
+    }
 }
 
 TEST_P(ConfigurationResourceContract, MissingResourceIsNone) {

@@ -32,7 +32,13 @@ class LinuxConfigurationTest : public testing::Test {
         root_.makeDirectory("/usr/share/keystrand");
     }
 
-    std::optional<Value> topic() { return defaults_.value(kDomain, "topic"); }
+    std::optional<Value> topic() { return valueIn(kDomain, "topic"); }
+
+    std::optional<Value> valueIn(std::string_view domain, std::string_view key) {
+        const ValueMap map = defaults_.load(domain);
+        const auto found = map.find(key);
+        return found != map.end() ? std::optional(found->second) : std::nullopt;
+    }
 
     std::optional<ValueMap> resource() {
         return resources_.load("Keystrand", "KSTDAnalyticsLogging");
@@ -156,7 +162,7 @@ TEST_F(LinuxConfigurationTest, NamesDoNotLeadOutOfTheDirectory) {
          {std::string_view("../outside"), std::string_view("/etc/outside"),
           std::string_view("below/x"), std::string_view("./below/x"), std::string_view(".."),
           std::string_view("."), std::string_view(""), std::string_view("x\0y", 3)}) {
-        EXPECT_EQ(defaults_.value(name, "topic"), std::nullopt) << name;
+        EXPECT_EQ(valueIn(name, "topic"), std::nullopt) << name;
         EXPECT_EQ(resources_.load(name, "x"), std::nullopt) << name;
         EXPECT_EQ(resources_.load("keystrand", name), std::nullopt) << name;
     }
