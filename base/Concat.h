@@ -1,7 +1,9 @@
 #pragma once
 
+#include <array>
 #include <charconv>
 #include <concepts>
+#include <cstddef>
 #include <cstdint>
 #include <iterator>
 #include <string>
@@ -15,29 +17,46 @@ struct Hex {
     std::uint64_t value;
 };
 
-inline void append(std::string& text, std::string_view part) {
+/// A text in place that takes as many characters as it has room for, and drops the others.
+template <std::size_t room>
+class BoundedText {
+  public:
+    void append(std::string_view part) { size_ += part.copy(&text_[size_], room - size_); }
+    void push_back(char part) { append({&part, 1}); }
+
+    [[nodiscard]] std::string_view view() const { return {text_.data(), size_}; }
+
+  private:
+    // One more than is used, so that there is a place behind a full text.
+    std::array<char, room + 1> text_;
+    std::size_t size_ = 0;
+};
+
+template <typename Text>
+void append(Text& text, std::string_view part) {
     text.append(part);
 }
 
 // Only char itself: a plain char parameter would also take booleans, floating-point numbers and
 // enumerators, and append them as one character.
-template <std::same_as<char> Character>
-void append(std::string& text, Character part) {
+template <typename Text, std::same_as<char> Character>
+void append(Text& text, Character part) {
     text.push_back(part);
 }
 
-template <std::integral Number>
-requires(!std::same_as<Number, char> && !std::same_as<Number, bool>) void append(std::string& text,
+template <typename Text, std::integral Number>
+requires(!std::same_as<Number, char> && !std::same_as<Number, bool>) void append(Text& text,
                                                                                  Number part) {
     char digits[24];
     const auto end = std::to_chars(std::begin(digits), std::end(digits), part);
-    text.append(digits, end.ptr);
+    text.append(std::string_view(digits, static_cast<std::size_t>(end.ptr - digits)));
 }
 
-inline void append(std::string& text, Hex part) {
+template <typename Text>
+void append(Text& text, Hex part) {
     char digits[16];
     const auto end = std::to_chars(std::begin(digits), std::end(digits), part.value, 16);
-    text.append(digits, end.ptr);
+    text.append(std::string_view(digits, static_cast<std::size_t>(end.ptr - digits)));
 }
 
 /// Joins texts, characters and integers (decimal) into one string, independent of the locale.

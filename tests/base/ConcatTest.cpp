@@ -58,3 +58,18 @@ TEST(Concat, WhatIsNoTextAndNoIntegerDoesNotCompile) {
     EXPECT_TRUE(CanBeAppended<std::uint8_t>);
     EXPECT_EQ(concat(static_cast<int>(kMinusThree)), "-3");
 }
+
+TEST(BoundedText, TakesWhatItHasRoomFor) {
+    base::BoundedText<6> text;
+    EXPECT_EQ(text.view(), "");
+    base::append(text, "ab");
+    base::append(text, 12);
+    base::append(text, 'c');
+    EXPECT_EQ(text.view(), "ab12c");
+    base::append(text, "de");
+    EXPECT_EQ(text.view(), "ab12cd");
+    base::append(text, 'e');
+    base::append(text, Hex{255});
+    base::append(text, "");
+    EXPECT_EQ(text.view(), "ab12cd");
+}
