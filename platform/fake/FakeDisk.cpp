@@ -1,6 +1,6 @@
 #include "platform/fake/FakeDisk.h"
 
-#include "platform/fake/TestError.h"
+#include "platform/fake/FakeFormats.h"
 
 #include <algorithm>
 

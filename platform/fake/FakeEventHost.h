@@ -5,7 +5,6 @@
 #include "platform/fake/FakeClock.h"
 #include "platform/fake/FakeEventStream.h"
 #include "platform/fake/FakeMainRunLoop.h"
-#include "platform/fake/FakeProcessTransactions.h"
 #include "platform/shared/EventQueue.h"
 
 #include <string>

@@ -1,12 +1,14 @@
 #pragma once
 
 #include "platform/HTTPSession.h"
+#include "platform/shared/RequestThreads.h"
 
 #include <condition_variable>
 #include <cstddef>
 #include <cstdint>
 #include <deque>
 #include <map>
+#include <memory>
 #include <mutex>
 #include <optional>
 #include <string>
@@ -111,6 +113,28 @@ class FakeHTTPSessions final : public HTTPSessions {
     std::vector<std::pair<HTTPCompletion, HTTPReply>> kept_;
     std::size_t sessionCount_ = 0;
     bool released_ = false;
+};
+
+/// A session of FakeHTTPSessions.
+class FakeHTTPSession final : public HTTPSession {
+  public:
+    FakeHTTPSession(FakeHTTPSessions& script, std::map<std::string, std::string> headers,
+                    std::weak_ptr<HTTPSessionDelegate> delegate);
+
+    void start(const HTTPRequest& request, HTTPCompletion completion) override;
+
+  private:
+    void run(const HTTPRequest& request, const FakeHTTPSessions::Taken& taken,
+             const HTTPCompletion& completion);
+    [[nodiscard]] HTTPReply replyTo(const HTTPRequest& request,
+                                    const FakeHTTPSessions::Taken& taken);
+    [[nodiscard]] bool passes(const FakeHTTPChallenge& challenge, const Link& link) const;
+
+    FakeHTTPSessions& script_;
+    std::map<std::string, std::string> headers_;
+    std::weak_ptr<HTTPSessionDelegate> delegate_;
+    /// Last, because its threads use the rest until they end.
+    RequestThreads threads_;
 };
 
 } // namespace platform

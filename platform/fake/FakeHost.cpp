@@ -4,6 +4,12 @@
 
 namespace platform {
 
+FakeMachine::FakeMachine() {
+    disk.makeDirectory("/var/root");
+}
+
+FakeMachine::~FakeMachine() = default;
+
 namespace {
 
 /// The stream on which a change of the managed settings is announced.

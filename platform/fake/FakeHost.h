@@ -1,23 +1,37 @@
 #pragma once
 
 #include "platform/Host.h"
-#include "platform/fake/FakeConfigurationResource.h"
+#include "platform/fake/FakeAlarmStore.h"
+#include "platform/fake/FakeClock.h"
+#include "platform/fake/FakeConfiguration.h"
+#include "platform/fake/FakeDisk.h"
 #include "platform/fake/FakeEventHost.h"
 #include "platform/fake/FakeFiles.h"
+#include "platform/fake/FakeFormats.h"
 #include "platform/fake/FakeHTTPSessions.h"
-#include "platform/fake/FakeInternalDiagnostics.h"
-#include "platform/fake/FakeJSON.h"
-#include "platform/fake/FakeKernelChannel.h"
-#include "platform/fake/FakeMachine.h"
-#include "platform/fake/FakeManagedSettings.h"
-#include "platform/fake/FakePropertyLists.h"
+#include "platform/fake/FakeKernel.h"
 #include "platform/fake/FakeSerialQueues.h"
-#include "platform/fake/FakeServiceRegistry.h"
 #include "platform/fake/FakeSystemLog.h"
-#include "platform/fake/FakeSystemVersion.h"
 #include "platform/fake/FakeUserDefaults.h"
 
+#include <string>
+
 namespace platform {
+
+/// What outlives a process. It begins with an empty state directory, as an installed system does.
+struct FakeMachine {
+    FakeMachine();
+    FakeMachine(const FakeMachine&) = delete;
+    FakeMachine& operator=(const FakeMachine&) = delete;
+    ~FakeMachine();
+
+    FakeClock clock;
+    FakeAlarmStore alarms;
+    FakeDisk disk;
+    /// The real directory under which libraries find their files; without one they find nothing.
+    std::string realRoot = FakeFiles::kNoRealRoot;
+    FakeKernel kernel;
+};
 
 /// All that one process sees of a FakeMachine. A second FakeHost on the same machine is a process
 /// started later: it finds the files, the alarms and the kernel side as the first one left them.

@@ -11,6 +11,7 @@
 #include <map>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 namespace platform {
@@ -80,6 +81,65 @@ class FakeKernel {
 
     [[nodiscard]] FakeStructAnswer answer(const FakeStructCall& call);
     [[nodiscard]] FakeScalarAnswer answer(const FakeScalarCall& call);
+};
+
+/// The registry of a FakeKernel as one process sees it. Handles are counted.
+class FakeServiceRegistry final : public ServiceRegistry {
+  public:
+    explicit FakeServiceRegistry(FakeKernel& kernel) : kernel_(kernel) {}
+
+    [[nodiscard]] ServiceHandle findByPath(std::string_view path) override;
+    [[nodiscard]] ServiceHandle findByClassName(std::string_view name) override;
+    [[nodiscard]] std::optional<std::vector<std::uint8_t>>
+    copyProperty(ServiceHandle entry, std::string_view name) override;
+    void release(ServiceHandle entry) override;
+
+    /// How many references the process holds.
+    [[nodiscard]] std::size_t liveReferences() const;
+
+    /// The registry path of an entry that is held, or an empty text.
+    [[nodiscard]] std::string pathOf(ServiceHandle entry) const;
+
+  private:
+    struct Entry {
+        std::string path;
+        std::size_t references = 0;
+    };
+
+    [[nodiscard]] ServiceHandle hold();
+
+    FakeKernel& kernel_;
+    std::map<ServiceHandle, Entry> entries_;
+    ServiceHandle lastHandle_ = kNoService;
+};
+
+/// The channel of one process to a FakeKernel. The registry, which knows what the service handles
+/// stand for, outlives it.
+class FakeKernelChannel final : public KernelChannel {
+  public:
+    /// What the channel can carry, as on the real one.
+    static constexpr std::size_t kMaxStructInput = 131072 - 24;
+    static constexpr std::uint32_t kMaxScalars = 16;
+
+    FakeKernelChannel(FakeKernel& kernel, const FakeServiceRegistry& registry)
+        : kernel_(kernel), registry_(registry) {}
+
+    [[nodiscard]] Status open(ServiceHandle service, std::uint32_t connectionType,
+                              ConnectionHandle* connection) override;
+    [[nodiscard]] Status structCall(ConnectionHandle connection, std::uint32_t selector,
+                                    const void* input, std::size_t inputSize, void* output,
+                                    std::size_t* outputSize) override;
+    [[nodiscard]] Status scalarCall(ConnectionHandle connection, std::uint32_t selector,
+                                    const std::uint64_t* inputs, std::uint32_t inputCount,
+                                    std::uint64_t* outputs, std::uint32_t* outputCount) override;
+
+  private:
+    /// Why a call on the connection cannot reach the kernel side, or 0.
+    [[nodiscard]] Status reach(ConnectionHandle connection) const;
+
+    FakeKernel& kernel_;
+    const FakeServiceRegistry& registry_;
+    ConnectionHandle lastConnection_ = kNoConnection;
 };
 
 } // namespace platform

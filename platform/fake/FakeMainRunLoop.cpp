@@ -1,10 +1,24 @@
 #include "platform/fake/FakeMainRunLoop.h"
 
-#include "platform/fake/TestError.h"
+#include "base/Concat.h"
+#include "platform/fake/FakeFormats.h"
 
 #include <algorithm>
 
 namespace platform {
+
+void FakeProcessTransactions::begin(std::string_view label) {
+    open_.emplace_back(label);
+    begun_.emplace_back(label);
+}
+
+void FakeProcessTransactions::end(std::string_view label) {
+    const auto found = std::find(open_.begin(), open_.end(), label);
+    if (found == open_.end()) {
+        testError(base::concat("the transaction \"", label, "\" was ended and never begun"));
+    }
+    open_.erase(found);
+}
 
 FakeMainRunLoop::FakeMainRunLoop(EventQueue& queue, FakeAlarmEvent& alarms, FakeClock& clock)
     : queue_(queue), alarms_(alarms), clock_(clock) {}

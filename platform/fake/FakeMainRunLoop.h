@@ -1,14 +1,39 @@
 #pragma once
 
 #include "platform/MainRunLoop.h"
+#include "platform/ProcessTransaction.h"
 #include "platform/fake/FakeAlarmEvent.h"
 #include "platform/fake/FakeClock.h"
 #include "platform/shared/EventQueue.h"
 
+#include <cstddef>
 #include <functional>
+#include <string>
+#include <string_view>
 #include <utility>
+#include <vector>
 
 namespace platform {
+
+/// Transactions that are counted and remembered. Ending one that was not begun is an error in the
+/// test or in what it tests.
+class FakeProcessTransactions final : public ProcessTransactions {
+  public:
+    void begin(std::string_view label) override;
+    void end(std::string_view label) override;
+
+    [[nodiscard]] std::size_t count() const { return open_.size(); }
+
+    /// The labels of those that have begun and not ended, in the order of their beginning.
+    [[nodiscard]] const std::vector<std::string>& open() const { return open_; }
+
+    /// The labels of all that ever began.
+    [[nodiscard]] const std::vector<std::string>& begun() const { return begun_; }
+
+  private:
+    std::vector<std::string> open_;
+    std::vector<std::string> begun_;
+};
 
 /// A run loop that delivers one queued event a turn and, with none queued, lets the clock jump to
 /// the next alarm or the deadline, whichever comes first.

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "platform/fake/FakeMachine.h"
+#include "platform/fake/FakeHost.h"
 #include "tests/support/TemporaryDirectory.h"
 
 namespace kstd {

@@ -1,7 +1,7 @@
 #include "kstd/Analytics/EndpointBag.h"
 
 #include "base/Concat.h"
-#include "platform/fake/FakeJSON.h"
+#include "platform/fake/FakeFormats.h"
 
 #include <gtest/gtest.h>
 

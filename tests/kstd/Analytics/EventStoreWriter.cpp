@@ -1,6 +1,6 @@
 #include "kstd/Analytics/TQAnalyticsLoggerSQLiteStore.h"
 #include "platform/fake/FakeClock.h"
-#include "platform/fake/FakePropertyLists.h"
+#include "platform/fake/FakeFormats.h"
 #include "platform/fake/FakeSystemLog.h"
 
 #include <cstdint>

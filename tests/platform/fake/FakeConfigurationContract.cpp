@@ -1,6 +1,4 @@
-#include "platform/fake/FakeConfigurationResource.h"
-#include "platform/fake/FakeInternalDiagnostics.h"
-#include "platform/fake/FakeSystemVersion.h"
+#include "platform/fake/FakeConfiguration.h"
 #include "platform/fake/FakeUserDefaults.h"
 #include "tests/platform/contract/ConfigurationContract.h"
 

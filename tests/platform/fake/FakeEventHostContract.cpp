@@ -1,5 +1,4 @@
 #include "platform/fake/FakeHost.h"
-#include "platform/fake/FakeMachine.h"
 #include "tests/platform/contract/EventHostContract.h"
 
 #include <memory>

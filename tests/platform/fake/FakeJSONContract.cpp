@@ -1,4 +1,4 @@
-#include "platform/fake/FakeJSON.h"
+#include "platform/fake/FakeFormats.h"
 #include "tests/platform/contract/JSONContract.h"
 
 namespace contract {

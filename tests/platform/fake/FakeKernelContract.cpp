@@ -1,6 +1,4 @@
 #include "platform/fake/FakeKernel.h"
-#include "platform/fake/FakeKernelChannel.h"
-#include "platform/fake/FakeServiceRegistry.h"
 #include "tests/platform/contract/KernelContract.h"
 
 #include <algorithm>

@@ -1,8 +1,5 @@
 #include "platform/fake/FakeKernel.h"
 
-#include "platform/fake/FakeKernelChannel.h"
-#include "platform/fake/FakeServiceRegistry.h"
-
 #include <gmock/gmock.h>
 
 #include <array>

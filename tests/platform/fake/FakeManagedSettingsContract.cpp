@@ -1,4 +1,4 @@
-#include "platform/fake/FakeManagedSettings.h"
+#include "platform/fake/FakeConfiguration.h"
 #include "tests/platform/contract/ManagedSettingsContract.h"
 
 namespace contract {

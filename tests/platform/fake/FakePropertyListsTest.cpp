@@ -1,4 +1,4 @@
-#include "platform/fake/FakePropertyLists.h"
+#include "platform/fake/FakeFormats.h"
 
 #include <gtest/gtest.h>
 

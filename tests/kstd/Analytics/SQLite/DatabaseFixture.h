@@ -2,7 +2,7 @@
 
 #include "kstd/Analytics/SQLite/KSTDSQLite.h"
 #include "platform/fake/FakeClock.h"
-#include "platform/fake/FakePropertyLists.h"
+#include "platform/fake/FakeFormats.h"
 #include "platform/fake/FakeSystemLog.h"
 #include "tests/kstd/Analytics/SQLite/OtherConnection.h"
 #include "tests/support/TemporaryDirectory.h"

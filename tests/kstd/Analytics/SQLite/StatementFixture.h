@@ -3,7 +3,7 @@
 #include "kstd/Analytics/SQLite/DatabaseEnvironment.h"
 #include "kstd/Analytics/SQLite/KSTDSQLiteStatement.h"
 #include "platform/fake/FakeClock.h"
-#include "platform/fake/FakePropertyLists.h"
+#include "platform/fake/FakeFormats.h"
 #include "platform/fake/FakeSystemLog.h"
 #include "tests/support/TemporaryDirectory.h"
 

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "platform/JSON.h"
+#include "platform/PropertyLists.h"
 
 #include <memory>
 #include <mutex>
@@ -8,6 +9,28 @@
 #include <string_view>
 
 namespace platform {
+
+/// Ends the process with a message: a test has asked a double for something that has no sensible
+/// answer, such as to wait for ever.
+[[noreturn]] void testError(std::string_view message);
+
+/// Property lists in the binary form only; one that is not is refused like any other bytes.
+class FakePropertyLists final : public PropertyLists {
+  public:
+    [[nodiscard]] Result<Bytes> binary(const Value& value) override;
+    [[nodiscard]] bool read(std::span<const std::uint8_t> data, ValueSink& sink) override;
+
+    /// The next `binary` fails with this error, whatever it is given.
+    void failNextBinary(Error error);
+
+    /// The next `read` fails, whatever it is given; its sink takes nothing.
+    void failNextRead();
+
+  private:
+    std::mutex mutex_;
+    std::optional<Error> nextBinaryError_;
+    bool nextReadFails_ = false;
+};
 
 /// Reads and writes JSON, and fails when it is told to. Outlives its texts.
 class FakeJSON final : public JSON {

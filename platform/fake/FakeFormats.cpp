@@ -1,11 +1,50 @@
-#include "platform/fake/FakeJSON.h"
+#include "platform/fake/FakeFormats.h"
 
+#include "platform/shared/BinaryPropertyList.h"
 #include "platform/shared/JSONReader.h"
 #include "platform/shared/JSONWriter.h"
 
+#include <cstdio>
+#include <cstdlib>
 #include <utility>
 
 namespace platform {
+
+void testError(std::string_view message) {
+    std::fprintf(stderr, "error in the test: %.*s\n", static_cast<int>(message.size()),
+                 message.data());
+    std::abort();
+}
+
+Result<Bytes> FakePropertyLists::binary(const Value& value) {
+    {
+        const std::lock_guard lock(mutex_);
+        if (nextBinaryError_) {
+            return *std::exchange(nextBinaryError_, std::nullopt);
+        }
+    }
+    return writeBinaryPropertyList(value);
+}
+
+bool FakePropertyLists::read(std::span<const std::uint8_t> data, ValueSink& sink) {
+    {
+        const std::lock_guard lock(mutex_);
+        if (std::exchange(nextReadFails_, false)) {
+            return false;
+        }
+    }
+    return readBinaryPropertyList(data, sink);
+}
+
+void FakePropertyLists::failNextBinary(Error error) {
+    const std::lock_guard lock(mutex_);
+    nextBinaryError_ = std::move(error);
+}
+
+void FakePropertyLists::failNextRead() {
+    const std::lock_guard lock(mutex_);
+    nextReadFails_ = true;
+}
 
 class FakeJSON::Text final : public JSONWriter {
   public:

@@ -1,4 +1,4 @@
-#include "platform/fake/FakeConfigurationResource.h"
+#include "platform/fake/FakeConfiguration.h"
 
 namespace platform {
 
