@@ -11,8 +11,13 @@
 
 namespace platform {
 
-/// One JSON text in the making: compact, in UTF-8. A map's keys come out in the order in which they
-/// come in.
+struct JSONWritingOptions {
+    /// A line for each entry of a map or list, two blanks deeper than what holds it, and a blank
+    /// behind each key's colon. Otherwise the text is compact.
+    bool isPretty = false;
+};
+
+/// One JSON text in the making, in UTF-8. A map's keys come out in the order in which they come in.
 ///
 /// Reals always have a fraction (1700000000000.0). What JSON cannot express (bytes, a date, an
 /// identifier, a link, an error, a number that is not finite, a text or key that is not UTF-8) is
@@ -43,7 +48,8 @@ class JSON {
     JSON& operator=(const JSON&) = delete;
     virtual ~JSON() = default;
 
-    [[nodiscard]] virtual std::unique_ptr<JSONText> makeText() = 0;
+    [[nodiscard]] virtual std::unique_ptr<JSONText>
+    makeText(const JSONWritingOptions& options = {}) = 0;
 
     /// The value that the whole text is. Strict: no comments, no trailing commas, nothing behind
     /// the value, valid UTF-8, numbers in the range of a double (one too small to be told from zero

@@ -4,6 +4,7 @@
 #include "kstd/Analytics/LoggerInstances.h"
 #include "platform/HTTPSession.h"
 #include "platform/Host.h"
+#include "platform/JSON.h"
 #include "platform/Link.h"
 #include "platform/Result.h"
 #include "platform/SerialQueue.h"
@@ -87,8 +88,10 @@ class KSTDAnalyticsLogger : public platform::HTTPSessionDelegate,
     /// says why the document could not be made; it stays unchanged when the server is the reason.
     bool forceUploadWithError(std::optional<platform::Error>* error = nullptr);
 
-    /// All events and the summary as one JSON text.
-    [[nodiscard]] platform::Result<base::TextBuffer> getLoggingJSON();
+    /// All events and the summary as one JSON text, as an upload sends it when no options are
+    /// given.
+    [[nodiscard]] platform::Result<base::TextBuffer>
+    getLoggingJSON(const platform::JSONWritingOptions& options = {});
 
     /// Sends the text to where uploads go and waits for the answer. Called on the queue.
     [[nodiscard]] bool onQueuePostJSON(std::string_view JSON);
@@ -172,7 +175,8 @@ class KSTDAnalyticsLogger : public platform::HTTPSessionDelegate,
     void setNextUploadDate();
 
     [[nodiscard]] platform::Result<base::TextBuffer>
-    makeDocument(const platform::ValueMap& extraValues);
+    makeDocument(const platform::ValueMap& extraValues,
+                 const platform::JSONWritingOptions& options);
     [[nodiscard]] bool uploadDocument(std::string_view document);
     [[nodiscard]] bool isAccepted(const platform::HTTPReply& reply, const platform::Link& link);
 

@@ -49,15 +49,17 @@ bool KSTDAnalyticsLogger::uploadDocument(std::string_view document) {
     return true;
 }
 
-platform::Result<base::TextBuffer> KSTDAnalyticsLogger::getLoggingJSON() {
+platform::Result<base::TextBuffer>
+KSTDAnalyticsLogger::getLoggingJSON(const platform::JSONWritingOptions& options) {
     const platform::ValueMap extraValues = extraValuesToUploadToServer();
     std::optional<platform::Result<base::TextBuffer>> document;
-    fields.queue->sync([&] { document = makeDocument(extraValues); });
+    fields.queue->sync([&] { document = makeDocument(extraValues, options); });
     return std::move(*document);
 }
 
 platform::Result<base::TextBuffer>
-KSTDAnalyticsLogger::makeDocument(const platform::ValueMap& extraValues) {
+KSTDAnalyticsLogger::makeDocument(const platform::ValueMap& extraValues,
+                                  const platform::JSONWritingOptions& options) {
     if (!fields.database->tryToOpenDatabase()) {
         host_.log.write(LogLevel::error, "can't get logging JSON because database is not openable",
                         {});
@@ -69,7 +71,8 @@ KSTDAnalyticsLogger::makeDocument(const platform::ValueMap& extraValues) {
     return makeUploadDocument(
         host_.json, host_.propertyLists,
         [this](const auto& visitor) { fields.database->visitEvents(visitor); },
-        uploadSummary(extraValues, fields.splunkTopicName, host_.version, postTime), postTime);
+        uploadSummary(extraValues, fields.splunkTopicName, host_.version, postTime), postTime,
+        options);
 }
 
 bool KSTDAnalyticsLogger::onQueuePostJSON(std::string_view JSON) {

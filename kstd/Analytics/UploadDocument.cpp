@@ -19,8 +19,9 @@ platform::ValueMap uploadSummary(platform::ValueMap extraValues,
 
 platform::Result<base::TextBuffer>
 makeUploadDocument(platform::JSON& json, platform::PropertyLists& propertyLists,
-                   const StoredEvents& events, const platform::ValueMap& summary, double postTime) {
-    const auto text = json.makeText();
+                   const StoredEvents& events, const platform::ValueMap& summary, double postTime,
+                   const platform::JSONWritingOptions& options) {
+    const auto text = json.makeText(options);
     text->beginMap();
     text->key("events");
     text->beginList();

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/TextBuffer.h"
+#include "platform/JSON.h"
 #include "platform/Result.h"
 #include "platform/Value.h"
 
@@ -9,7 +10,6 @@
 #include <string>
 
 namespace platform {
-class JSON;
 class PropertyLists;
 class SystemVersion;
 } // namespace platform
@@ -34,6 +34,7 @@ using StoredEvents =
 /// queue of the store.
 [[nodiscard]] platform::Result<base::TextBuffer>
 makeUploadDocument(platform::JSON& json, platform::PropertyLists& propertyLists,
-                   const StoredEvents& events, const platform::ValueMap& summary, double postTime);
+                   const StoredEvents& events, const platform::ValueMap& summary, double postTime,
+                   const platform::JSONWritingOptions& options = {});
 
 } // namespace kstd

@@ -48,7 +48,7 @@ void FakePropertyLists::failNextRead() {
 
 class FakeJSON::Text final : public JSONWriter {
   public:
-    explicit Text(FakeJSON& json) : json_(json) {}
+    Text(FakeJSON& json, const JSONWritingOptions& options) : JSONWriter(options), json_(json) {}
 
     [[nodiscard]] Result<base::TextBuffer> finish() override {
         if (auto error = json_.take(json_.finishError_)) {
@@ -61,8 +61,8 @@ class FakeJSON::Text final : public JSONWriter {
     FakeJSON& json_;
 };
 
-std::unique_ptr<JSONText> FakeJSON::makeText() {
-    return std::make_unique<Text>(*this);
+std::unique_ptr<JSONText> FakeJSON::makeText(const JSONWritingOptions& options) {
+    return std::make_unique<Text>(*this, options);
 }
 
 Result<Value> FakeJSON::read(std::string_view text) {

@@ -35,7 +35,8 @@ class FakePropertyLists final : public PropertyLists {
 /// Reads and writes JSON, and fails when it is told to. Outlives its texts.
 class FakeJSON final : public JSON {
   public:
-    [[nodiscard]] std::unique_ptr<JSONText> makeText() override;
+    [[nodiscard]] std::unique_ptr<JSONText>
+    makeText(const JSONWritingOptions& options = {}) override;
     [[nodiscard]] Result<Value> read(std::string_view text) override;
 
     /// The next text to be read, whatever it is, fails with this error.

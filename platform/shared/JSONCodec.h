@@ -10,8 +10,9 @@ namespace platform {
 
 class JSONCodec final : public JSON {
   public:
-    [[nodiscard]] std::unique_ptr<JSONText> makeText() override {
-        return std::make_unique<JSONWriter>();
+    [[nodiscard]] std::unique_ptr<JSONText>
+    makeText(const JSONWritingOptions& options = {}) override {
+        return std::make_unique<JSONWriter>(options);
     }
 
     [[nodiscard]] Result<Value> read(std::string_view text) override { return readJSON(text); }

@@ -142,7 +142,7 @@ void JSONWriter::key(std::string_view key) {
     }
     beginEntry();
     if (appendQuoted(text_, key)) {
-        text_.append(':');
+        text_.append(isPretty_ ? ": " : ":");
         hasKey_ = true;
     } else {
         text_.truncate(entryStart_);
@@ -218,8 +218,11 @@ void JSONWriter::end(char bracket) {
     if (depthLeftOut_ > 0) {
         --depthLeftOut_;
     } else {
-        text_.append(bracket);
         --depth_;
+        if (!isFirst_) {
+            breakLine(depth_);
+        }
+        text_.append(bracket);
         isFirst_ = false;
     }
 }
@@ -259,6 +262,18 @@ void JSONWriter::beginEntry() {
     entryStart_ = text_.size();
     if (!isFirst_) {
         text_.append(',');
+    }
+    if (depth_ > 0) {
+        breakLine(depth_);
+    }
+}
+
+void JSONWriter::breakLine(std::size_t depth) {
+    if (isPretty_) {
+        text_.append('\n');
+        for (std::size_t i = 0; i < depth; ++i) {
+            text_.append("  ");
+        }
     }
 }
 

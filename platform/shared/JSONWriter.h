@@ -12,6 +12,8 @@ namespace platform {
 /// Writes into one growing block and allocates nothing else.
 class JSONWriter : public JSONText {
   public:
+    explicit JSONWriter(const JSONWritingOptions& options = {}) : isPretty_(options.isPretty) {}
+
     void beginMap() override { begin('{'); }
     void key(std::string_view key) override;
     void endMap() override { end('}'); }
@@ -43,7 +45,10 @@ class JSONWriter : public JSONText {
     /// Keeps the value that was written, or takes it away again together with its key.
     void closeValue(bool isExpressed);
     void beginEntry();
+    /// Where a pretty text goes on in a line of its own.
+    void breakLine(std::size_t depth);
 
+    const bool isPretty_;
     base::TextBuffer text_;
     /// Where the entry began that is being written: before its comma.
     std::size_t entryStart_ = 0;

@@ -197,6 +197,24 @@ TEST_F(UploadTest, RowThatBreaksInTheMiddleLeavesNoTrace) {
     EXPECT_EQ(document.value().view(), kEmptyDocument);
 }
 
+TEST_F(UploadTest, DocumentWithWritingOptions) {
+    answerUploads(FakeHTTPAnswer::status(200));
+    const auto document = logger().getLoggingJSON({.isPretty = true});
+    ASSERT_TRUE(document);
+    EXPECT_EQ(document.value().view(), R"({
+  "events": [
+    {
+      "eventTime": 1700000000000.0,
+      "eventType": "accumulatedPolicyStats",
+      "topic": null
+    }
+  ],
+  "postTime": 1700000000000.0
+})");
+    EXPECT_TRUE(upload());
+    EXPECT_EQ(fake.https.requests().back().body, kEmptyDocument) << "uploads are compact";
+}
+
 TEST_F(UploadTest, DocumentThatCannotBeFinished) {
     logger();
     fake.json.failNextFinish({"d", 7, "no text"});

@@ -455,4 +455,25 @@ TEST_P(JSONContract, RewoundWithinWhatIsLeftOut) {
     EXPECT_EQ(finish(*text), R"({"a":1})");
 }
 
+TEST_P(JSONContract, PrettyTextHasALineForEachEntry) {
+    const auto pretty = [this](const Value& value) {
+        const auto text = fixture().json().makeText({.isPretty = true});
+        platform::describe(value, *text);
+        return finish(*text);
+    };
+    EXPECT_EQ(pretty(true), "true");
+    EXPECT_EQ(pretty(ValueList()), "[]");
+    EXPECT_EQ(pretty(ValueMap()), "{}");
+    EXPECT_EQ(pretty(ValueList{ValueList(), ValueMap{{"a", "b,:{"}}, 1.5}),
+              "[\n  [],\n  {\n    \"a\": \"b,:{\"\n  },\n  1.5\n]");
+    // What is left out leaves no line.
+    EXPECT_EQ(pretty(ValueMap{{"a", Bytes{1}}}), "{}");
+    EXPECT_EQ(pretty(ValueList{Bytes{1}, true, Bytes{2}}), "[\n  true\n]");
+    EXPECT_EQ(pretty(ValueMap{{"a", true}, {"b", Bytes{1}}, {"c", ValueList{Bytes{1}}}}),
+              "{\n  \"a\": true,\n  \"c\": []\n}");
+    const auto parsed = read(pretty(document()));
+    ASSERT_TRUE(parsed);
+    EXPECT_EQ(write(parsed.value()), kGolden);
+}
+
 } // namespace contract
