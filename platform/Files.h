@@ -53,6 +53,9 @@ class FileStream {
 };
 
 /// Files by absolute path. Called on the main thread only.
+///
+/// What fails, but for a file that is missing when it is loaded, leaves a line in the log with the
+/// reason: once for each reason until the same works again.
 class Files {
   public:
     Files() = default;
@@ -70,8 +73,8 @@ class Files {
     /// failed: the descriptor stays open and the caller's. Attaching does not truncate.
     [[nodiscard]] virtual std::unique_ptr<FileStream> attachStream(const OpenFile& file) = 0;
 
-    /// All bytes of the file; an empty buffer when it is empty, none when it is missing, not a
-    /// regular file, larger than kMaxLoadSize or unreadable.
+    /// The file's first kMaxLoadSize bytes, or all when it has fewer; an empty buffer when it is
+    /// empty, none when it is missing, not a regular file or unreadable.
     [[nodiscard]] virtual std::optional<std::vector<std::uint8_t>>
     load(const std::string& path) = 0;
 

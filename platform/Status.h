@@ -16,4 +16,11 @@ inline constexpr Status kPlatformStatusBase = -1000;
     return kPlatformStatusBase - error;
 }
 
+/// The error of a failure that the platform itself found; 0 for any other status.
+[[nodiscard]] constexpr int errnoFromStatus(Status status) {
+    constexpr int kLastError = 4095;
+    const int error = kPlatformStatusBase - status;
+    return status < kPlatformStatusBase && error <= kLastError ? error : 0;
+}
+
 } // namespace platform

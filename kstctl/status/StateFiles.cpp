@@ -18,9 +18,6 @@ std::string problemOf(const std::string& path, const platform::RegularFile& file
     if (file.failure == platform::ReadFailure::notRegular) {
         return base::concat(path, ": not a regular file");
     }
-    if (file.failure == platform::ReadFailure::tooLarge) {
-        return base::concat(path, ": larger than ", platform::kMaxLoadSize, " bytes");
-    }
     return file.bytes.size() < leastSize
                ? base::concat(path, ": shorter than ", leastSize, " bytes")
                : std::string();
@@ -29,7 +26,8 @@ std::string problemOf(const std::string& path, const platform::RegularFile& file
 Section fileSection(const Environment& environment, const char* path, std::size_t leastSize,
                     void (*addFields)(Report& report, decode::Bytes bytes)) {
     const std::string real = environment.paths.under(path);
-    const platform::RegularFile file = platform::readRegularFile(real, platform::kMaxLoadSize);
+    const platform::RegularFile file = platform::readRegularFile(
+        real, platform::kMaxLoadSize, {.takesBeginning = true, .followsLink = false});
     Section section;
     section.report.add("path", real);
     if (file.failure == platform::ReadFailure::missing) {

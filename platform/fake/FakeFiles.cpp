@@ -94,9 +94,10 @@ std::unique_ptr<FileStream> FakeFiles::attachStream(const OpenFile& file) {
 std::optional<std::vector<std::uint8_t>> FakeFiles::load(const std::string& path) {
     calls_.push_back(base::concat("load ", path));
     std::optional<FakeBytes> bytes = disk_.read(path);
-    if (std::exchange(failures.load, false) || !bytes || bytes->size() > kMaxLoadSize) {
+    if (std::exchange(failures.load, false) || !bytes) {
         return std::nullopt;
     }
+    bytes->resize(std::min(bytes->size(), kMaxLoadSize));
     return bytes;
 }
 

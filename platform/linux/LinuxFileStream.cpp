@@ -9,6 +9,14 @@
 
 namespace platform {
 
+namespace {
+
+constexpr std::string_view kWrite = "write";
+constexpr std::string_view kSync = "sync";
+constexpr std::string_view kClose = "close";
+
+} // namespace
+
 LinuxFileStream::LinuxFileStream(LinuxFiles& files, base::FileDescriptor descriptor,
                                  std::string path)
     : files_(files), descriptor_(std::move(descriptor)), path_(std::move(path)) {}
@@ -27,11 +35,14 @@ std::size_t LinuxFileStream::write(const void* data, std::size_t elementSize, st
             continue;
         }
         if (written <= 0) {
-            break;
+            // Taking nothing without a reason is an error of the device.
+            files_.tell(kWrite, path_, written < 0 ? errno : EIO);
+            return done / elementSize;
         }
         done += static_cast<std::size_t>(written);
         position_ += written;
     }
+    files_.worked(kWrite, path_);
     return done / elementSize;
 }
 
@@ -39,10 +50,16 @@ int LinuxFileStream::fullSync() {
     if (!descriptor_.isOpen()) {
         return EBADF;
     }
-    if (const int error = syncDescriptor(descriptor_.get()); error != 0) {
-        return error;
+    int error = syncDescriptor(descriptor_.get());
+    if (error == 0) {
+        error = files_.syncNameOnce(path_);
     }
-    return files_.syncNameOnce(path_);
+    if (error == 0) {
+        files_.worked(kSync, path_);
+    } else {
+        files_.tell(kSync, path_, error);
+    }
+    return error;
 }
 
 int LinuxFileStream::close() {
@@ -52,7 +69,13 @@ int LinuxFileStream::close() {
     // Linux gives the number free whatever close answers, so it is never closed again. Interrupted
     // is no failure: the number is free all the same.
     const int result = ::close(descriptor_.release());
-    return result == 0 || errno == EINTR ? 0 : errno;
+    const int error = result == 0 || errno == EINTR ? 0 : errno;
+    if (error == 0) {
+        files_.worked(kClose, path_);
+    } else {
+        files_.tell(kClose, path_, error);
+    }
+    return error;
 }
 
 } // namespace platform

@@ -1,5 +1,6 @@
 #include "platform/linux/LinuxFiles.h"
 
+#include "base/Concat.h"
 #include "base/FileDescriptor.h"
 #include "platform/linux/LinuxFileStream.h"
 #include "platform/linux/RegularFile.h"
@@ -8,12 +9,18 @@
 #include <cerrno>
 #include <fcntl.h>
 #include <sys/stat.h>
+#include <system_error>
 #include <unistd.h>
 #include <utility>
 
 namespace platform {
 
 namespace {
+
+// What is done with a file, as its failure is called.
+constexpr std::string_view kOpen = "open";
+constexpr std::string_view kAttach = "write to";
+constexpr std::string_view kLoad = "load";
 
 constexpr int kOpenFlags = O_RDWR | O_CLOEXEC | O_NOCTTY | O_NOFOLLOW;
 
@@ -25,9 +32,10 @@ constexpr int kOpenAttempts = 8;
 base::FileDescriptor makeFile(const std::string& path, mode_t mode) {
     base::FileDescriptor descriptor(::open(path.c_str(), kOpenFlags | O_CREAT | O_EXCL, mode));
     if (descriptor.isOpen() && ::fchmod(descriptor.get(), mode) != 0) {
+        const int error = errno;
         descriptor.reset();
         ::unlink(path.c_str());
-        errno = EPERM;
+        errno = error;
     }
     return descriptor;
 }
@@ -48,6 +56,7 @@ Opened openOrMake(const std::string& path, mode_t mode) {
             return {std::move(made), true};
         }
     }
+    errno = EAGAIN;
     return {};
 }
 
@@ -67,11 +76,33 @@ std::string directoryOf(const std::string& path) {
 
 } // namespace
 
-LinuxFiles::LinuxFiles(Paths paths) : paths_(std::move(paths)) {}
+LinuxFiles::LinuxFiles(Paths paths, SystemLog& log) : paths_(std::move(paths)), log_(log) {}
+
+void LinuxFiles::tell(std::string_view what, const std::string& path, std::string reason) {
+    std::string& told = told_[{what, path}];
+    if (told != reason) {
+        told = std::move(reason);
+        log_.write(LogLevel::warning,
+                   base::concat("kstd: Files: cannot ", what, ' ', path, ": ", told, ".\n"), {});
+    }
+}
+
+void LinuxFiles::tell(std::string_view what, const std::string& path, int error) {
+    tell(what, path, std::generic_category().message(error));
+}
+
+void LinuxFiles::worked(std::string_view what, const std::string& path) {
+    told_.erase({what, path});
+}
 
 OpenFile LinuxFiles::openForWriting(const std::string& path, ProtectionClass /*protection*/,
                                     int /*classOptions*/, unsigned mode) {
     Opened opened = openOrMake(paths_.under(path), static_cast<mode_t>(mode));
+    if (opened.descriptor.isOpen()) {
+        worked(kOpen, path);
+    } else {
+        tell(kOpen, path, errno);
+    }
     if (opened.descriptor.isOpen() && opened.isNew) {
         syncedNames_.erase(path);
     }
@@ -80,18 +111,31 @@ OpenFile LinuxFiles::openForWriting(const std::string& path, ProtectionClass /*p
 
 std::unique_ptr<FileStream> LinuxFiles::attachStream(const OpenFile& file) {
     if (!isWritable(file.descriptor)) {
+        tell(kAttach, file.path, EBADF);
         return nullptr;
     }
+    worked(kAttach, file.path);
     return std::make_unique<LinuxFileStream>(*this, base::FileDescriptor(file.descriptor),
                                              file.path);
 }
 
 std::optional<std::vector<std::uint8_t>> LinuxFiles::load(const std::string& path) {
-    RegularFile file = readRegularFile(paths_.under(path), kMaxLoadSize);
-    if (file.failure != ReadFailure::none) {
-        return std::nullopt;
+    RegularFile file = readRegularFile(paths_.under(path), kMaxLoadSize,
+                                       {.takesBeginning = true, .followsLink = false});
+    switch (file.failure) {
+    case ReadFailure::none:
+        worked(kLoad, path);
+        return std::move(file.bytes);
+    case ReadFailure::missing:
+        worked(kLoad, path);
+        break;
+    case ReadFailure::notRegular:
+        tell(kLoad, path, "not a regular file");
+        break;
+    default:
+        tell(kLoad, path, file.error);
     }
-    return std::move(file.bytes);
+    return std::nullopt;
 }
 
 int LinuxFiles::syncNameOnce(const std::string& path) {

@@ -1,10 +1,14 @@
 #pragma once
 
 #include "platform/Files.h"
+#include "platform/SystemLog.h"
 #include "platform/linux/Paths.h"
 
+#include <map>
 #include <set>
 #include <string>
+#include <string_view>
+#include <utility>
 
 namespace platform {
 
@@ -14,13 +18,14 @@ namespace platform {
 /// added here and nowhere else. Protection classes have no meaning on Linux and are ignored.
 /// Directories are never made: a file in a missing one cannot be opened.
 ///
-/// A symbolic link in the place of the file itself is not followed for writing. The daemon's own
-/// files are never links, and a link there could aim root's writing at any other file.
+/// A symbolic link in the place of the file itself is not followed, neither for writing nor for
+/// loading. The daemon's own files are never links, and a link there could aim root's writing at
+/// any other file.
 ///
 /// The streams must not outlive the LinuxFiles that they come from.
 class LinuxFiles final : public Files {
   public:
-    explicit LinuxFiles(Paths paths);
+    LinuxFiles(Paths paths, SystemLog& log);
 
     [[nodiscard]] OpenFile openForWriting(const std::string& path, ProtectionClass protection,
                                           int classOptions, unsigned mode) override;
@@ -37,7 +42,16 @@ class LinuxFiles final : public Files {
     /// the error's number.
     [[nodiscard]] int syncNameOnce(const std::string& path);
 
+    /// Writes why `what` cannot be done with the file, unless it was the last that was said.
+    void tell(std::string_view what, const std::string& path, std::string reason);
+    void tell(std::string_view what, const std::string& path, int error);
+    /// A failure of it is news again.
+    void worked(std::string_view what, const std::string& path);
+
     Paths paths_;
+    SystemLog& log_;
+    /// By what was to be done and with which file. The former is constant text.
+    std::map<std::pair<std::string_view, std::string>, std::string> told_;
     /// Files whose names are on permanent storage as far as this process has seen to it. A file
     /// that was there before it may have been made by a process that was killed before its sync,
     /// so existing files are not in here from the start.

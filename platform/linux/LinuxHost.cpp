@@ -53,7 +53,7 @@ RemoteHTTPOptions httpsOptions(const LinuxHostOptions& options) {
 struct LinuxHost::Parts {
     explicit Parts(LinuxHostOptions options)
         : log(options.paths, options.messageClasses, kIdentifier),
-          files(options.paths),
+          files(options.paths, log),
           settings(options.paths, log),
           defaults(options.paths, propertyLists, log),
           resources(options.paths, propertyLists, log),

@@ -2,6 +2,12 @@
 
 #include "platform/linux/AsBytes.h"
 
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <utility>
+
 namespace platform {
 
 std::optional<RegistryPath> RegistryPath::of(std::string_view text) {
@@ -15,7 +21,7 @@ std::optional<RegistryPath> RegistryPath::of(std::string_view text) {
 
 LinuxServiceRegistry::LinuxServiceRegistry(std::string_view socketPath, SystemLog& log,
                                            std::chrono::milliseconds timeout)
-    : connection_(socketPath, log, timeout) {}
+    : log_(log), connection_(socketPath, log, timeout) {}
 
 ServiceHandle LinuxServiceRegistry::findByPath(std::string_view path) {
     return path.size() > wire::kKernelMaxPathLength ? kNoService
@@ -30,17 +36,24 @@ ServiceHandle LinuxServiceRegistry::findByClassName(std::string_view name) {
 
 ServiceHandle LinuxServiceRegistry::find(wire::KernelOperation operation, std::string_view key) {
     KernelSocketConnection::Reply reply;
-    if (connection_.exchange(operation, {asBytes(key)}, reply) != kSuccess ||
-        reply.status != kSuccess || reply.reported == 0) {
-        return kNoService;
+    Outcome outcome = connection_.exchange(operation, {asBytes(key)}, reply);
+    if (outcome == kSuccess) {
+        outcome = reply.status;
     }
-    const auto path =
-        RegistryPath::of({reinterpret_cast<const char*>(reply.body.data()), reply.body.size()});
-    if (!path) {
-        connection_.disconnect();
-        return kNoService;
+    if (outcome == kSuccess && reply.reported == 0) {
+        outcome = kNoEntry;
     }
-    return hold(*path);
+    std::optional<RegistryPath> path;
+    if (outcome == kSuccess) {
+        path =
+            RegistryPath::of({reinterpret_cast<const char*>(reply.body.data()), reply.body.size()});
+        if (!path) {
+            connection_.disconnect();
+            outcome = statusFromErrno(EPROTO);
+        }
+    }
+    tell("find", key, outcome, lastFind_);
+    return path ? hold(*path) : kNoService;
 }
 
 ServiceHandle LinuxServiceRegistry::hold(const RegistryPath& path) {
@@ -68,12 +81,40 @@ std::optional<std::vector<std::uint8_t>> LinuxServiceRegistry::copyProperty(Serv
     }
     const auto prefix = wire::encodeKernelPropertyPrefix(path.size());
     KernelSocketConnection::Reply reply;
-    if (connection_.exchange(wire::KernelOperation::copyProperty,
-                             {prefix, asBytes(path), asBytes(name)}, reply) != kSuccess ||
-        reply.status != kSuccess || reply.reported == 0) {
+    Outcome outcome = connection_.exchange(wire::KernelOperation::copyProperty,
+                                           {prefix, asBytes(path), asBytes(name)}, reply);
+    if (outcome == kSuccess) {
+        outcome = reply.status;
+    }
+    tell("copy", name, outcome, lastCopy_);
+    if (outcome != kSuccess || reply.reported == 0) {
         return std::nullopt;
     }
     return std::vector<std::uint8_t>(reply.body.begin(), reply.body.end());
+}
+
+/// The line is made on the stack: a client may have no memory left.
+void LinuxServiceRegistry::tell(const char* what, std::string_view name, Outcome outcome,
+                                Outcome& last) {
+    if (outcome == std::exchange(last, outcome) || outcome == kSuccess) {
+        return;
+    }
+    std::array<char, 32> number{};
+    const char* reason = number.data();
+    if (outcome == kNoEntry) {
+        reason = "there is none";
+    } else if (const int error = errnoFromStatus(outcome); error != 0) {
+        reason = ::strerrordesc_np(error);
+    } else {
+        static_cast<void>(
+            std::snprintf(number.data(), number.size(), "refused with status %d", outcome));
+    }
+    constexpr std::size_t kMaxNameLength = wire::kKernelMaxNameLength;
+    std::array<char, kMaxNameLength + 128> line;
+    const int length = std::snprintf(
+        line.data(), line.size(), "kstd: ServiceRegistry: cannot %s %.*s: %s.\n", what,
+        static_cast<int>(std::min(name.size(), kMaxNameLength)), name.data(), reason);
+    log_.write(LogLevel::warning, {line.data(), static_cast<std::size_t>(length)}, {});
 }
 
 void LinuxServiceRegistry::release(ServiceHandle entry) {

@@ -28,6 +28,10 @@ class RegistryPath {
 };
 
 /// ServiceRegistry over the kernel service's socket. Only a property is allocated.
+///
+/// What cannot be found or copied leaves a warning with the reason: what the system says when the
+/// kernel service is not reached or does not answer, or what the service says. A reason is told
+/// once, until the same works again. That there is no such property is no failure.
 class LinuxServiceRegistry final : public ServiceRegistry {
   public:
     /// How many entries are held at the same time. One more is not found.
@@ -59,7 +63,17 @@ class LinuxServiceRegistry final : public ServiceRegistry {
     [[nodiscard]] ServiceHandle find(wire::KernelOperation operation, std::string_view key);
     [[nodiscard]] ServiceHandle hold(const RegistryPath& path);
 
+    /// How a request ended: as a status, or with no entry of that name.
+    using Outcome = Status;
+    static constexpr Outcome kNoEntry = kPlatformStatusBase;
+
+    /// Tells of a failure that is not the last one of its kind.
+    void tell(const char* what, std::string_view name, Outcome outcome, Outcome& last);
+
+    SystemLog& log_;
     KernelSocketConnection connection_;
+    Outcome lastFind_ = kSuccess;
+    Outcome lastCopy_ = kSuccess;
     std::array<std::optional<Entry>, kMaxEntries> entries_;
     ServiceHandle lastHandle_ = kNoService;
 };

@@ -54,10 +54,11 @@ bool readAll(int descriptor, std::size_t limit, RegularFile& file) {
 
 } // namespace
 
-RegularFile readRegularFile(const std::string& path, std::size_t limit) {
+RegularFile readRegularFile(const std::string& path, std::size_t limit, const ReadingRules& rules) {
     // Not blocking, because opening a pipe would wait for its writer.
+    const int flags = O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY;
     const base::FileDescriptor descriptor(
-        ::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
+        ::open(path.c_str(), rules.followsLink ? flags : flags | O_NOFOLLOW));
     if (!descriptor.isOpen()) {
         return failed(errno == ENOENT ? ReadFailure::missing : ReadFailure::unreadable, errno);
     }
@@ -72,7 +73,10 @@ RegularFile readRegularFile(const std::string& path, std::size_t limit) {
         return failed(ReadFailure::unreadable, errno);
     }
     if (file.bytes.size() > limit) {
-        return failed(ReadFailure::tooLarge);
+        if (!rules.takesBeginning) {
+            return failed(ReadFailure::tooLarge);
+        }
+        file.bytes.resize(limit);
     }
     return file;
 }

@@ -16,14 +16,23 @@ struct RegularFile {
     ReadFailure failure = ReadFailure::none;
     /// The error's number when the failure is `missing` or `unreadable`.
     int error = 0;
-    /// All of its bytes when there was no failure, else empty.
+    /// Its bytes when there was no failure, else empty.
     std::vector<std::uint8_t> bytes;
     /// Owner, mode and so on of the very file that was read. Only without a failure.
     struct stat status {};
 };
 
+/// What else than a file of the size that is read is taken.
+struct ReadingRules {
+    /// Of a larger file its first bytes, which is no failure then.
+    bool takesBeginning = false;
+    /// What a symbolic link at the path leads to; else a link is unreadable (ELOOP).
+    bool followsLink = true;
+};
+
 /// Reads the whole file at `path`, at most `limit` bytes of it: a larger file is a failure, also
 /// one that grows while it is read. Never waits, whatever stands at the path.
-[[nodiscard]] RegularFile readRegularFile(const std::string& path, std::size_t limit);
+[[nodiscard]] RegularFile readRegularFile(const std::string& path, std::size_t limit,
+                                          const ReadingRules& rules = {});
 
 } // namespace platform

@@ -145,6 +145,8 @@ TEST_F(RunSequenceTest, KernelAbsentAtTheStartAndPresentLater) {
                             "kstd: -[DeviceRestrictedModeService start]: called, .",
                             "kstd: -[DeviceRestrictedModeService loadDataBlob:]: called, filePath "
                             "= /var/root/.usbrestrictedmode_analytics.",
+                            "kstd: ServiceRegistry: cannot find Keystrand: No such file or "
+                            "directory.",
                             "KSTLib: AssertMacros: service (value: 0x0),  file: KSTLib/KSTLib:<n>",
                             "KST: AssertMacros: err == 0  (value: 0xfffffffffffffffb),  file: "
                             "common/LibCallBlock:<n>",

@@ -1,3 +1,4 @@
+#include "platform/fake/FakeSystemLog.h"
 #include "platform/linux/LinuxFiles.h"
 #include "tests/platform/contract/FilesContract.h"
 #include "tests/platform/linux/OpenDescriptors.h"
@@ -28,7 +29,8 @@ class LinuxFilesFixture final : public FilesFixture {
 
   private:
     support::RootDirectory root_;
-    platform::LinuxFiles files_{root_.paths()};
+    platform::FakeSystemLog log_;
+    platform::LinuxFiles files_{root_.paths(), log_};
     std::size_t descriptorsBefore_ = support::countOpenDescriptors();
 };
 

@@ -1,3 +1,4 @@
+#include "platform/fake/FakeSystemLog.h"
 #include "platform/linux/LinuxFiles.h"
 #include "tests/platform/linux/OpenDescriptors.h"
 #include "tests/platform/linux/RootDirectory.h"
@@ -50,7 +51,8 @@ class LinuxFilesSystemCallsTest : public testing::Test {
     }
 
     support::RootDirectory root_;
-    LinuxFiles files_{root_.paths()};
+    platform::FakeSystemLog log_;
+    LinuxFiles files_{root_.paths(), log_};
     support::SystemCalls calls_;
 };
 
@@ -72,7 +74,7 @@ TEST_F(LinuxFilesSystemCallsTest, LaterSavesOfTheProcessLeaveTheDirectoryAlone) 
 TEST_F(LinuxFilesSystemCallsTest, NextProcessSyncsTheDirectoryOfAnExistingFileOnce) {
     // The first process may have been killed between making the file and syncing its directory.
     root_.put(kPath, Bytes{1});
-    LinuxFiles next{root_.paths()};
+    LinuxFiles next{root_.paths(), log_};
     save(next);
     EXPECT_THAT(calls_.calls,
                 ElementsAre("pwrite /var/root/state 13", "fsync /var/root/state", "fsync /var/root",
@@ -213,6 +215,31 @@ TEST_F(LinuxFilesSystemCallsTest, FailedAttachClosesNothing) {
     EXPECT_EQ(files_.attachStream({-1, kPath}), nullptr);
     EXPECT_THAT(calls_.calls, IsEmpty());
     EXPECT_NE(files_.attachStream({descriptor, kPath}), nullptr);
+}
+
+TEST_F(LinuxFilesSystemCallsTest, WhatFailsIsToldOnceForEachReasonUntilItWorks) {
+    const auto saveWith = [this](std::deque<int> sync, std::deque<int> close) {
+        const auto stream = this->stream(files_);
+        calls_.fsyncErrors = std::move(sync);
+        calls_.closeErrors = std::move(close);
+        static_cast<void>(stream->fullSync());
+        static_cast<void>(stream->close());
+        std::vector<std::string> texts = log_.texts();
+        log_.clear();
+        return texts;
+    };
+    const std::string name = " /var/root/state: ";
+    EXPECT_THAT(saveWith({EIO}, {}),
+                ElementsAre("kstd: Files: cannot sync" + name + "Input/output error."));
+    EXPECT_THAT(saveWith({EIO}, {}), IsEmpty());
+    EXPECT_THAT(saveWith({ENOSPC}, {EIO}),
+                ElementsAre("kstd: Files: cannot sync" + name + "No space left on device.",
+                            "kstd: Files: cannot close" + name + "Input/output error."));
+    // The name's own sync.
+    EXPECT_THAT(saveWith({0, EIO}, {}),
+                ElementsAre("kstd: Files: cannot sync" + name + "Input/output error."));
+    EXPECT_THAT(saveWith({}, {}), IsEmpty());
+    EXPECT_THAT(saveWith({EIO}, {EIO}).size(), 2U);
 }
 
 } // namespace

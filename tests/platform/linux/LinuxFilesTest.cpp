@@ -1,5 +1,6 @@
 #include "platform/linux/LinuxFiles.h"
 
+#include "platform/fake/FakeSystemLog.h"
 #include "tests/platform/linux/OpenDescriptors.h"
 #include "tests/platform/linux/RootDirectory.h"
 
@@ -17,6 +18,8 @@ namespace {
 
 using platform::FileStream;
 using platform::OpenFile;
+using testing::ElementsAre;
+using testing::IsEmpty;
 using testing::Optional;
 
 using Bytes = std::vector<std::uint8_t>;
@@ -44,8 +47,19 @@ class LinuxFilesTest : public testing::Test {
                                      platform::kNoClassOptions, mode);
     }
 
+    /// The lines since the last call.
+    std::vector<std::string> warnings() {
+        for (const auto& line : log_.lines()) {
+            EXPECT_EQ(line.level, platform::LogLevel::warning);
+        }
+        std::vector<std::string> texts = log_.texts();
+        log_.clear();
+        return texts;
+    }
+
     support::RootDirectory root_;
-    platform::LinuxFiles files_{root_.paths()};
+    platform::FakeSystemLog log_;
+    platform::LinuxFiles files_{root_.paths(), log_};
 };
 
 TEST_F(LinuxFilesTest, ModeIsExactUnderEveryUmask) {
@@ -92,6 +106,67 @@ TEST_F(LinuxFilesTest, LinkToNothingMakesNoFile) {
     EXPECT_FALSE(std::filesystem::exists(root_.real("/var/root/target")));
 }
 
+TEST_F(LinuxFilesTest, LinkIsNotFollowedForLoading) {
+    root_.put("/var/root/target", Bytes{1});
+    std::filesystem::create_symlink("target", root_.real(kPath));
+    EXPECT_EQ(files_.load(kPath), std::nullopt);
+    EXPECT_THAT(warnings(), ElementsAre("kstd: Files: cannot load /var/root/state: Too many levels "
+                                        "of symbolic links."));
+}
+
+TEST_F(LinuxFilesTest, MissingFileIsNoFailureToLoad) {
+    EXPECT_EQ(files_.load(kPath), std::nullopt);
+    EXPECT_EQ(files_.load("/nowhere/at/all"), std::nullopt);
+    EXPECT_THAT(warnings(), IsEmpty());
+}
+
+TEST_F(LinuxFilesTest, EachReasonIsToldOnceUntilItWorks) {
+    const std::string toLoad = "kstd: Files: cannot load /var/root/state: ";
+    const auto load = [this] {
+        static_cast<void>(files_.load(kPath));
+        return warnings();
+    };
+    for (int round = 0; round < 2; ++round) {
+        root_.makeDirectory(kPath);
+        EXPECT_THAT(load(), ElementsAre(toLoad + "not a regular file.")) << round;
+        EXPECT_THAT(load(), IsEmpty());
+        std::filesystem::remove(root_.real(kPath));
+        std::filesystem::create_symlink("target", root_.real(kPath));
+        EXPECT_THAT(load(), ElementsAre(toLoad + "Too many levels of symbolic links."));
+        EXPECT_THAT(load(), IsEmpty());
+        std::filesystem::remove(root_.real(kPath));
+        root_.put(kPath, Bytes{1});
+        EXPECT_THAT(load(), IsEmpty());
+        std::filesystem::remove(root_.real(kPath));
+    }
+}
+
+TEST_F(LinuxFilesTest, WhatCannotBeOpenedIsToldWithTheReason) {
+    EXPECT_LT(open("/nowhere/state").descriptor, 0);
+    EXPECT_LT(open("/nowhere/state").descriptor, 0);
+    EXPECT_LT(open("/nowhere/other").descriptor, 0);
+    std::filesystem::create_symlink("target", root_.real(kPath));
+    EXPECT_LT(open(kPath).descriptor, 0);
+    EXPECT_THAT(
+        warnings(),
+        ElementsAre(
+            "kstd: Files: cannot open /nowhere/state: No such file or directory.",
+            "kstd: Files: cannot open /nowhere/other: No such file or directory.",
+            "kstd: Files: cannot open /var/root/state: Too many levels of symbolic links."));
+}
+
+TEST_F(LinuxFilesTest, WritingToAFullDeviceIsTold) {
+    platform::LinuxFiles files{platform::Paths("/"), log_};
+    for (int round = 0; round < 2; ++round) {
+        const auto stream = files.attachStream(files.openForWriting(
+            "/dev/full", platform::ProtectionClass::none, platform::kNoClassOptions, 0600));
+        ASSERT_NE(stream, nullptr);
+        EXPECT_EQ(stream->write("x", 1, 1), 0U);
+    }
+    EXPECT_THAT(warnings(),
+                ElementsAre("kstd: Files: cannot write /dev/full: No space left on device."));
+}
+
 TEST_F(LinuxFilesTest, StreamBeginsAtTheStartWhereverTheDescriptorStands) {
     root_.put(kPath, Bytes{1, 2, 3, 4});
     const OpenFile file = open(kPath);
@@ -112,7 +187,7 @@ TEST_F(LinuxFilesTest, FullDeviceFailsAtTheWrite) {
 }
 
 TEST_F(LinuxFilesTest, FullDeviceOpensUnderItsPath) {
-    platform::LinuxFiles files{platform::Paths("/")};
+    platform::LinuxFiles files{platform::Paths("/"), log_};
     const auto stream = files.attachStream(files.openForWriting(
         "/dev/full", platform::ProtectionClass::none, platform::kNoClassOptions, 0600));
     ASSERT_NE(stream, nullptr);
@@ -183,18 +258,18 @@ TEST_F(LinuxFilesTest, PipeFailsAtTheWrite) {
 }
 
 TEST_F(LinuxFilesTest, DeviceLoadsAsNone) {
-    platform::LinuxFiles files{platform::Paths("/")};
+    platform::LinuxFiles files{platform::Paths("/"), log_};
     EXPECT_EQ(files.load("/dev/zero"), std::nullopt);
 }
 
-TEST_F(LinuxFilesTest, HugeSparseFileLoadsAsNone) {
+TEST_F(LinuxFilesTest, OfAHugeSparseFileTheBeginningIsLoaded) {
     root_.put(kPath, Bytes());
     std::filesystem::resize_file(root_.real(kPath), std::uintmax_t{1} << 40U);
-    EXPECT_EQ(files_.load(kPath), std::nullopt);
+    EXPECT_THAT(files_.load(kPath), Optional(Bytes(platform::kMaxLoadSize)));
 }
 
 TEST_F(LinuxFilesTest, FileWithoutAnAnnouncedSizeLoadsWhole) {
-    platform::LinuxFiles files{platform::Paths("/")};
+    platform::LinuxFiles files{platform::Paths("/"), log_};
     const auto loaded = files.load("/proc/self/status");
     ASSERT_TRUE(loaded.has_value());
     const std::string text(loaded->begin(), loaded->end());

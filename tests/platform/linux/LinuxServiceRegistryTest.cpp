@@ -8,6 +8,7 @@
 #include <gtest/gtest.h>
 
 #include <atomic>
+#include <filesystem>
 #include <optional>
 #include <string>
 
@@ -161,6 +162,82 @@ TEST_F(LinuxServiceRegistryTest, ServiceThatRefusesOrIsMissingHasNoEntries) {
     server.reset();
     serve([](const Packet& request) { return support::reply(request, 0, 1, "/a"); });
     EXPECT_NE(registry.findByPath("/a"), kNoService);
+}
+
+/// What the operator sees, by which the states of a kernel side can be told apart.
+class RegistryWarningsTest : public LinuxServiceRegistryTest {
+  protected:
+    std::vector<std::string> warningsOf(LinuxServiceRegistry& asked) {
+        static_cast<void>(asked.findByClassName("Keystrand"));
+        for (const auto& line : log.lines()) {
+            EXPECT_EQ(line.level, LogLevel::warning);
+        }
+        std::vector<std::string> texts = log.texts();
+        log.clear();
+        return texts;
+    }
+
+    static std::vector<std::string> cannotFind(const std::string& reason) {
+        return {"kstd: ServiceRegistry: cannot find Keystrand: " + reason + "."};
+    }
+
+    const std::vector<std::string> none{};
+};
+
+TEST_F(RegistryWarningsTest, AbsentKernelSide) {
+    EXPECT_EQ(warningsOf(registry), cannotFind("No such file or directory"));
+    EXPECT_EQ(warningsOf(registry), none);
+}
+
+TEST_F(RegistryWarningsTest, SilentKernelSide) {
+    server.emplace(path, [](const SeqpacketServer::Peer& peer) {
+        static_cast<void>(peer.receive());
+        static_cast<void>(peer.receive());
+    });
+    LinuxServiceRegistry impatient(path, log, std::chrono::milliseconds(1));
+    EXPECT_EQ(warningsOf(impatient), cannotFind("Connection timed out"));
+}
+
+TEST_F(RegistryWarningsTest, RefusingKernelSide) {
+    serve([](const Packet& request) { return support::reply(request, -42, 0, ""); });
+    EXPECT_EQ(warningsOf(registry), cannotFind("refused with status -42"));
+    EXPECT_EQ(warningsOf(registry), none);
+}
+
+TEST_F(RegistryWarningsTest, KernelSideWithoutTheEntry) {
+    serve([](const Packet& request) { return support::reply(request, 0, 0, ""); });
+    EXPECT_EQ(warningsOf(registry), cannotFind("there is none"));
+}
+
+TEST_F(RegistryWarningsTest, ReasonIsNewsAgainWhenItHasWorked) {
+    EXPECT_EQ(warningsOf(registry).size(), 1U);
+    serve([](const Packet& request) { return support::reply(request, 0, 1, "/a"); });
+    EXPECT_EQ(warningsOf(registry), none);
+    server.reset();
+    std::filesystem::remove(path);
+    static_cast<void>(warningsOf(registry));
+    serve([](const Packet& request) { return support::reply(request, 0, 1, "/a"); });
+    EXPECT_EQ(warningsOf(registry), none);
+    server.reset();
+    std::filesystem::remove(path);
+    EXPECT_EQ(warningsOf(registry).size(), 1U);
+}
+
+TEST_F(RegistryWarningsTest, CopyThatIsRefusedAndPropertyThatIsNotThere) {
+    std::int32_t status = 0;
+    serve([&status](const Packet& request) {
+        return support::reply(request, request[5] == 3 ? status : 0, request[5] == 3 ? 0 : 1,
+                              request[5] == 3 ? "" : "/a");
+    });
+    const ServiceHandle entry = registry.findByClassName("Keystrand");
+    ASSERT_NE(entry, kNoService);
+    EXPECT_EQ(registry.copyProperty(entry, "N"), std::nullopt);
+    EXPECT_EQ(log.texts(), none);
+    status = -7;
+    EXPECT_EQ(registry.copyProperty(entry, "N"), std::nullopt);
+    EXPECT_EQ(registry.copyProperty(entry, "N"), std::nullopt);
+    EXPECT_EQ(log.texts(), std::vector<std::string>{
+                               "kstd: ServiceRegistry: cannot copy N: refused with status -7."});
 }
 
 } // namespace
