@@ -9,9 +9,11 @@
 #include "platform/linux/KernelSocketConnection.h"
 #include "platform/linux/LinuxConfigurationResource.h"
 #include "platform/linux/LinuxEventStream.h"
+#include "platform/linux/LinuxFiles.h"
 #include "platform/linux/LinuxHost.h"
 #include "platform/linux/LinuxManagedSettings.h"
 #include "platform/linux/LinuxPropertyLists.h"
+#include "platform/linux/LinuxServiceRegistry.h"
 #include "platform/linux/LinuxUserDefaults.h"
 #include "platform/linux/SettingsWatch.h"
 #include "platform/linux/alarms/AlarmStore.h"
@@ -90,6 +92,27 @@ Texts kernelThatIsNotThere() {
     return parts.fake.log.texts();
 }
 
+Texts startThatIsNotTold() {
+    DaemonParts parts;
+    parts.failRequest(3, -42);
+    parts.makeService()->start();
+    return parts.fake.log.texts();
+}
+
+Texts fileThatCannotBeOpened() {
+    platform::FakeSystemLog log;
+    static_cast<void>(platform::LinuxFiles(platform::Paths("/"), log)
+                          .openForWriting("/nowhere/at/all", platform::ProtectionClass::none,
+                                          platform::kNoClassOptions, 0600));
+    return log.texts();
+}
+
+Texts kernelThatNobodyServes() {
+    platform::FakeSystemLog log;
+    static_cast<void>(platform::LinuxServiceRegistry("/nowhere/at/all", log).findByClassName("x"));
+    return log.texts();
+}
+
 Texts kernelOfAnotherUser() {
     const support::TemporaryDirectory directory;
     platform::FakeSystemLog log;
@@ -151,9 +174,31 @@ Texts databaseThatCannotBeWritten() {
                                         "select raise(fail, 'no'); end",
                                         {}));
                 static_cast<void>(database.executeSQL("nonsense", {}));
+                static_cast<void>(database.statementForSQL("nonsense"));
             });
         },
         logEvent);
+}
+
+Texts eventThatCannotBeStored() {
+    return logging(
+        [](LoggerParts& parts) {
+            parts.logger().fields.metricsBase = platform::ValueMap{{"a", platform::Null()}};
+        },
+        logEvent);
+}
+
+Texts serverThatIsAcceptedByForce() {
+    class Trust final : public platform::ServerTrust {
+        [[nodiscard]] platform::TrustResult evaluate() override { return {}; }
+    };
+    return logging([](LoggerParts& parts) { parts.logger().setAllowsInsecureSplunkCert(true); },
+                   [](LoggerParts& parts) {
+                       Trust trust;
+                       parts.logger().didReceiveChallenge(
+                           {platform::kServerTrustMethod, 0, &trust},
+                           [](platform::ChallengeDisposition, const auto&) {});
+                   });
 }
 
 Texts uploadThatGets(const platform::FakeHTTPAnswer& answer) {
@@ -204,6 +249,10 @@ Texts dueUploadWithoutADatabase() {
             };
         },
         logDueEvent);
+}
+
+Texts uploadsThatAreDisabled() {
+    return bagThatIs(platform::FakeHTTPAnswer::status(200, R"({"disabled":true})"));
 }
 
 Texts noUploadAddress() {
@@ -364,6 +413,14 @@ const std::vector<Example> kExamples = {
     {"saveThatFails", message::kStateFileNotSaved, saveThatFails},
     {"kernelThatRefuses", message::kKernelServiceFailed, kernelThatRefuses},
     {"kernelThatIsNotThere", message::kKernelServiceFailed, kernelThatIsNotThere},
+    {"kernelThatNobodyServes", message::kKernelServiceFailed, kernelThatNobodyServes},
+    {"startThatIsNotTold", message::kKernelSideNotTold, startThatIsNotTold},
+    {"settingThatIsNotTold", message::kKernelSideNotTold, kernelThatRefuses},
+    {"fileThatCannotBeOpened", message::kStateFileFailed, fileThatCannotBeOpened},
+    {"eventThatCannotBeStored", message::kEventNotStored, eventThatCannotBeStored},
+    {"serverThatIsChallenged", message::kServerChallenge, serverThatIsAcceptedByForce},
+    {"serverThatIsAcceptedByForce", message::kServerAccepted, serverThatIsAcceptedByForce},
+    {"uploadsThatAreDisabled", message::kUploadsDisabled, uploadsThatAreDisabled},
     {"kernelOfAnotherUser", message::kKernelServiceNotTrusted, kernelOfAnotherUser, true},
     {"databaseThatCannotBeOpened", message::kDatabaseNotOpened, databaseThatCannotBeOpened},
     {"databaseThatCannotBeWritten", message::kDatabaseFailed, databaseThatCannotBeWritten},
@@ -451,7 +508,7 @@ TEST(MessageIdsTest, IdentifiersAreThoseOfTheCatalog) {
         }
     }
     EXPECT_EQ(known, explained);
-    EXPECT_EQ(known.size(), 20U);
+    EXPECT_EQ(known.size(), 26U);
 }
 
 } // namespace
