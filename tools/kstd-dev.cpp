@@ -15,9 +15,11 @@
 #include <csignal>
 #include <cstdio>
 #include <exception>
+#include <fcntl.h>
 #include <filesystem>
 #include <iostream>
 #include <string>
+#include <sys/file.h>
 #include <utility>
 #include <vector>
 
@@ -58,6 +60,16 @@ void makeDirectories(const platform::Paths& paths) {
     std::filesystem::permissions(paths.stateDirectory(), perms::owner_all);
 }
 
+/// Holds the root directory for this process, as long as it is open; not open when another one
+/// does.
+base::FileDescriptor holdRoot(const platform::Paths& paths) {
+    base::FileDescriptor root(::open(paths.under("/").c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (root.isOpen() && ::flock(root.get(), LOCK_EX | LOCK_NB) != 0) {
+        root.reset();
+    }
+    return root;
+}
+
 base::FileDescriptor eventSocket(const platform::Paths& paths) {
     base::FileDescriptor activated = platform::takeActivatedEventSocket();
     return activated.isOpen() ? std::move(activated)
@@ -67,6 +79,11 @@ base::FileDescriptor eventSocket(const platform::Paths& paths) {
 int runDaemon(const Options& options, const platform::StopRequest& stop) {
     const platform::Paths paths(options.root);
     makeDirectories(paths);
+    const base::FileDescriptor held = holdRoot(paths);
+    if (!held.isOpen()) {
+        std::cerr << "kstd-dev: another kstd-dev runs under " << options.root << '\n';
+        return 1;
+    }
     platform::LinuxHostOptions hostOptions{.paths = paths,
                                            .eventSocket = eventSocket(paths),
                                            .messageClasses = kstd::messageClasses(),

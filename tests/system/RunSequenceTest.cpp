@@ -200,5 +200,19 @@ TEST_F(RunSequenceTest, KernelRestartedWhileTheDaemonRuns) {
     kernel("wait acks=1");
 }
 
+TEST_F(RunSequenceTest, SecondDaemonUnderTheSameRootIsRefusedWhileTheFirstLives) {
+    startKernel();
+    const auto first = startDaemon();
+    const auto second = beginDaemon();
+    EXPECT_EQ(second->awaitEnd(), 1);
+    EXPECT_EQ(second->lines(), std::vector<std::string>{"kstd-dev: another kstd-dev runs under " +
+                                                        root.path().string()});
+    sendEvent("for the first");
+    EXPECT_TRUE(first->awaitLine("Wisp Event: for the first (notifyd)."));
+    first->signal(SIGTERM);
+    EXPECT_EQ(first->awaitEnd(), 0);
+    static_cast<void>(startDaemon());
+}
+
 } // namespace
 } // namespace system_tests
