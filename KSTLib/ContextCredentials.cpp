@@ -6,8 +6,8 @@
 #include "KSTLib/LibrarySender.h"
 #include "KSTLib/TemporaryContext.h"
 #include "common/AssertLine.h"
-#include "common/CredentialCommands.h"
-#include "common/WipedBytes.h"
+#include "common/CommandSender.h"
+#include "common/PayloadMemory.h"
 
 #include <algorithm>
 

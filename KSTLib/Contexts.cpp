@@ -4,6 +4,7 @@
 #include "KSTLib/Command.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
+#include "KSTLib/Platform.h"
 #include "KSTLib/TemporaryContext.h"
 #include "common/Allocation.h"
 #include "common/AssertLine.h"
@@ -164,6 +165,25 @@ KSTStatus postContextDelete(KSTContextRef context) noexcept {
         disposeOfContext(context);
     }
     return logReturning(kDeleteFunction, err);
+}
+
+TemporaryContext::~TemporaryContext() {
+    if (context_ == nullptr) {
+        return;
+    }
+    KSTStatus err = kKSTErrorUnexpected;
+    if (process_ == processNumber()) {
+        err = isTimeUp() ? postContextDelete(context_) : deleteContext(context_, true);
+    }
+    if (err != kKSTErrorSuccess) {
+        static_cast<void>(deleteContext(context_, false));
+    }
+}
+
+KSTStatus TemporaryContext::create(CheckPlace place) noexcept {
+    process_ = processNumber();
+    const KSTStatus err = createContext(&context_);
+    return err == kKSTErrorSuccess ? err : failCall(libraryContext(), err, place);
 }
 
 } // namespace kst

@@ -1,6 +1,6 @@
 #include "KSTLib/LibraryLogging.h"
 
-#include "common/LogLine.h"
+#include "common/LibraryLog.h"
 
 #include <cinttypes>
 

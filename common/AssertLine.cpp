@@ -1,6 +1,6 @@
 #include "common/AssertLine.h"
 
-#include "common/LogLine.h"
+#include "common/LibraryLog.h"
 
 #include <cinttypes>
 #include <cstdlib>

@@ -1,4 +1,6 @@
 #include "KSTLib/CredentialSerialization.h"
+#include "KSTLib/Serialization.h"
+#include "common/Allocation.h"
 #include "common/AssertLine.h"
 #include "common/CredentialTypes.h"
 #include "common/SerializationContext.h"
@@ -99,4 +101,8 @@ KSTStatus CompareCredentials(const KSTCredential* credential1, const KSTCredenti
     }
     *outEqual = areEqualOfOneType(credential1, credential2) ? 1 : 0;
     return kKSTErrorSuccess;
+}
+
+void DeallocDataBlob(void* data, std::size_t length) noexcept {
+    kst::release(data, length);
 }

@@ -1,12 +1,11 @@
 #include "KSTLib/Command.h"
 #include "KSTLib/LibCall.h"
 #include "common/AssertLine.h"
+#include "common/CommandSender.h"
 #include "common/ContextObject.h"
-#include "common/CredentialCommands.h"
 #include "common/LibCallReport.h"
-#include "common/PolicyCommands.h"
+#include "common/PayloadMemory.h"
 #include "common/RequiredFunction.h"
-#include "common/WipedBytes.h"
 
 namespace {
 

@@ -2,6 +2,8 @@
 
 #include "platform/SystemLog.h"
 
+#include <cstddef>
+
 /// Which log the library writes to: one for the process, none at first. Not synchronised.
 namespace kst {
 
@@ -17,5 +19,14 @@ inline platform::SystemLog* installedLibraryLog = nullptr;
 inline void setLibraryLog(platform::SystemLog* log) noexcept {
     installedLibraryLog = log;
 }
+
+/// What a line has room for; a longer one is cut there and ends in "...".
+inline constexpr std::size_t kMaxLogLineLength = 1023;
+
+/// Writes one line, formatted as printf does, at level info. Writes nothing when `log` is null.
+/// The line is built on the stack, so that a failure to allocate can be reported too.
+[[gnu::format(printf, 3, 4)]] void writeLogLine(platform::SystemLog* log,
+                                                const platform::CodePlace& place,
+                                                const char* format, ...) noexcept;
 
 } // namespace kst

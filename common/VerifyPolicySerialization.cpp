@@ -1,9 +1,8 @@
 #include "KSTLib/RequestSerialization.h"
 #include "common/AssertLine.h"
-#include "common/HandleWire.h"
-#include "common/ParameterWire.h"
-#include "common/PayloadReader.h"
-#include "common/ReceivedBlob.h"
+#include "common/ContextObject.h"
+#include "common/ParameterPayload.h"
+#include "common/PayloadMemory.h"
 #include "common/SerializationContext.h"
 #include "common/WriterRoom.h"
 

@@ -3,7 +3,7 @@
 #include "KSTLib/Command.h"
 #include "base/ByteReader.h"
 #include "base/Concat.h"
-#include "common/HandleWire.h"
+#include "common/ContextObject.h"
 #include "kstctl/decode/Decoders.h"
 #include "wire/CommandTable.h"
 #include "wire/RestrictedMode.h"

@@ -2,7 +2,6 @@
 #include "KSTLib/RequirementSerialization.h"
 #include "base/Concat.h"
 #include "common/RequirementLayout.h"
-#include "common/RequirementProperties.h"
 #include "kstctl/decode/Decoded.h"
 #include "kstctl/decode/Decoders.h"
 

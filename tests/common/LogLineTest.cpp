@@ -1,5 +1,4 @@
-#include "common/LogLine.h"
-
+#include "common/LibraryLog.h"
 #include "tests/support/RecordingLog.h"
 
 #include <gtest/gtest.h>

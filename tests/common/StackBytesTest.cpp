@@ -1,5 +1,4 @@
-#include "common/NumberedPayload.h"
-#include "common/WipedBytes.h"
+#include "common/PayloadMemory.h"
 
 #include <gtest/gtest.h>
 

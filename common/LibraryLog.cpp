@@ -1,4 +1,4 @@
-#include "common/LogLine.h"
+#include "common/LibraryLog.h"
 
 #include <algorithm>
 #include <array>

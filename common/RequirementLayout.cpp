@@ -1,4 +1,4 @@
-#include "common/RequirementProperties.h"
+#include "common/RequirementLayout.h"
 
 #include <array>
 
