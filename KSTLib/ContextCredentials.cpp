@@ -5,8 +5,8 @@
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
 #include "KSTLib/TemporaryContext.h"
-#include "common/AssertLine.h"
 #include "common/CommandSender.h"
+#include "common/Failure.h"
 #include "common/PayloadMemory.h"
 
 #include <algorithm>

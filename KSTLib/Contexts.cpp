@@ -7,9 +7,8 @@
 #include "KSTLib/Platform.h"
 #include "KSTLib/TemporaryContext.h"
 #include "common/Allocation.h"
-#include "common/AssertLine.h"
 #include "common/ContextObject.h"
-#include "common/RequiredFunction.h"
+#include "common/Failure.h"
 
 #include <algorithm>
 
@@ -128,10 +127,10 @@ KSTStatus deleteContextInternal(KSTContextRef context, bool destroy) {
 }
 
 KSTStatus getExternalForm(KSTContextRef context, const KSTDataBlock& processExternalForm) {
-    KSTStatus err = kst::libraryContext().requireArguments({kst::Argument(context, "context")});
-    if (err == kKSTErrorSuccess) {
-        err = kst::requireBlock(kst::libraryContext(), processExternalForm, "processExternalForm");
-    }
+    KSTStatus err = kst::libraryContext().requireArguments({
+        kst::Argument(context, "context"),
+        kst::Argument(processExternalForm, "processExternalForm"),
+    });
     if (err == kKSTErrorSuccess) {
         err = sendHandle(kKSTCommandContextGetExternalForm, context);
     }

@@ -1,14 +1,13 @@
 #pragma once
 
 #include "KSTLib/Status.h"
-#include "common/AssertLine.h"
+#include "common/Failure.h"
 #include "common/LibraryLog.h"
 
 #include <cstdint>
 
 /// What the public functions of the library write: a line on entry and one on exit, each shown only
-/// when its severity is not below the library's log level, and the lines of failed checks, shown
-/// always.
+/// when its severity is not below the library's log level.
 namespace kst {
 
 inline constexpr std::uint8_t kInitialLogLevel = 40;
@@ -39,10 +38,5 @@ void logReturningReference(const char* function, KSTStatus status, const void* r
 
 /// "KSTLib: <function>: log level set to <level>."
 void logLevelSet(const char* function) noexcept;
-
-/// The context of the library's failed checks.
-[[nodiscard]] inline AssertionContext libraryContext() noexcept {
-    return {libraryLog(), "KSTLib", "KSTLib/KSTLib"};
-}
 
 } // namespace kst

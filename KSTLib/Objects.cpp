@@ -3,20 +3,10 @@
 #include "KSTLib/LibCall.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/Requirement.h"
-#include "common/AssertLine.h"
-#include "common/RequiredFunction.h"
+#include "common/Failure.h"
 #include "common/RequirementLayout.h"
 
 namespace {
-
-/// An object and a block under the names that the lines of failed checks give them.
-template <typename Block>
-KSTStatus requireObjectAndBlock(const kst::Argument& object, const Block& block,
-                                const char* blockName) {
-    const KSTStatus err = kst::libraryContext().requireArguments({object});
-    return err == kKSTErrorSuccess ? kst::requireBlock(kst::libraryContext(), block, blockName)
-                                   : err;
-}
 
 /// Hands over what `getPropertyData` finds; a null pointer for no bytes.
 template <typename Object>
@@ -24,8 +14,10 @@ KSTStatus handOverProperty(const Object* object, const char* objectName, std::ui
                            KSTStatus (*getPropertyData)(const Object*, std::uint32_t, const void**,
                                                         std::size_t*),
                            const KSTDataBlock& processProperty) {
-    KSTStatus err = requireObjectAndBlock(kst::Argument(object, objectName), processProperty,
-                                          "processProperty");
+    KSTStatus err = kst::libraryContext().requireArguments({
+        kst::Argument(object, objectName),
+        kst::Argument(processProperty, "processProperty"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -41,8 +33,10 @@ KSTStatus handOverProperty(const Object* object, const char* objectName, std::ui
 
 KSTStatus getProperties(const KSTRequirement* requirement,
                         const KSTPropertyBlock& processProperty) {
-    const KSTStatus err = requireObjectAndBlock(kst::Argument(requirement, "requirement"),
-                                                processProperty, "processProperty");
+    const KSTStatus err = kst::libraryContext().requireArguments({
+        kst::Argument(requirement, "requirement"),
+        kst::Argument(processProperty, "processProperty"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -57,8 +51,11 @@ KSTStatus getProperties(const KSTRequirement* requirement,
 
 void getSubrequirements(const KSTRequirement* requirement,
                         const KSTRequirementBlock& processSubrequirement) {
-    if (requireObjectAndBlock(kst::Argument(requirement, "requirement"), processSubrequirement,
-                              "processSubrequirement") != kKSTErrorSuccess) {
+    const KSTStatus err = kst::libraryContext().requireArguments({
+        kst::Argument(requirement, "requirement"),
+        kst::Argument(processSubrequirement, "processSubrequirement"),
+    });
+    if (err != kKSTErrorSuccess) {
         return;
     }
     const std::uint32_t count =

@@ -8,10 +8,9 @@
 #include "KSTLib/RequirementSerialization.h"
 #include "KSTLib/TemporaryContext.h"
 #include "common/Allocation.h"
-#include "common/AssertLine.h"
 #include "common/CommandSender.h"
+#include "common/Failure.h"
 #include "common/PayloadMemory.h"
-#include "common/RequiredFunction.h"
 
 #include <cstring>
 #include <limits>
@@ -20,11 +19,6 @@
 namespace {
 
 constexpr std::uint32_t kAnyAge = std::numeric_limits<std::uint32_t>::max();
-
-template <typename Block>
-KSTStatus requireBlock(const Block& block, kst::CheckPlace place = kst::CheckPlace::here()) {
-    return kst::requireBlock(kst::libraryContext(), block, "processRequirement", place);
-}
 
 /// Context and policy are there.
 KSTStatus verifyPolicyInternal(const kst::PolicyQuestion& question, const char* policyId,
@@ -49,13 +43,11 @@ KSTStatus verifyAclConstraintInternal(const kst::PolicyQuestion& question,
 template <typename Block>
 KSTStatus verifyPolicy(const kst::PolicyQuestion& question, const char* policyId,
                        const Block& block, kst::PolicyAnswer& answer) {
-    KSTStatus err = kst::libraryContext().requireArguments({
+    const KSTStatus err = kst::libraryContext().requireArguments({
         kst::Argument(question.context, "context"),
         kst::Argument(policyId, "policyId"),
+        kst::Argument(block, "processRequirement"),
     });
-    if (err == kKSTErrorSuccess) {
-        err = requireBlock(block);
-    }
     return err == kKSTErrorSuccess ? verifyPolicyInternal(question, policyId, answer) : err;
 }
 
@@ -69,7 +61,7 @@ KSTStatus verifyAclConstraint(const kst::PolicyQuestion& question, const void* a
                         kKSTErrorBadParameter);
     }
     if (err == kKSTErrorSuccess) {
-        err = requireBlock(block);
+        err = kst::libraryContext().requireArguments({kst::Argument(block, "processRequirement")});
     }
     if (err == kKSTErrorSuccess && length > std::numeric_limits<std::uint32_t>::max()) {
         err = kst::fail(kst::libraryContext(), "aclConstraintLength <= UINT32_MAX", 0,
@@ -196,7 +188,8 @@ KSTStatus checkArguments(const void* acl, std::size_t aclLength, const KSTStatus
     if (acl == nullptr || aclLength == 0) {
         return kst::fail(context, "acl && aclLength", 0, kKSTErrorBadParameter);
     }
-    const KSTStatus err = kst::requireBlock(context, block, "processConstraintCharacteristics");
+    const KSTStatus err =
+        context.requireArguments({kst::Argument(block, "processConstraintCharacteristics")});
     if (err == kKSTErrorSuccess && aclLength > std::numeric_limits<std::uint32_t>::max()) {
         return kst::fail(context, "aclLength <= UINT32_MAX", 0, kKSTErrorBadParameter);
     }

@@ -2,7 +2,7 @@
 
 #include "KSTLib/Contexts.h"
 #include "KSTLib/Status.h"
-#include "common/AssertLine.h"
+#include "common/Failure.h"
 
 #include <cstdint>
 

@@ -5,7 +5,7 @@
 #include "KSTLib/LibCall.h"
 #include "KSTLib/PolicyVerification.h"
 #include "KSTLib/Requirement.h"
-#include "common/AssertLine.h"
+#include "common/Failure.h"
 
 #include <cstddef>
 #include <cstdint>

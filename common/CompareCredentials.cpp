@@ -1,9 +1,8 @@
 #include "KSTLib/CredentialSerialization.h"
 #include "KSTLib/Serialization.h"
 #include "common/Allocation.h"
-#include "common/AssertLine.h"
 #include "common/CredentialTypes.h"
-#include "common/SerializationContext.h"
+#include "common/Failure.h"
 
 #include <algorithm>
 #include <cstring>

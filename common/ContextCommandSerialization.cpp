@@ -1,8 +1,6 @@
 #include "KSTLib/CredentialSerialization.h"
-#include "common/AssertLine.h"
 #include "common/ContextObject.h"
-#include "common/SerializationContext.h"
-#include "common/WriterRoom.h"
+#include "common/Failure.h"
 
 namespace {
 

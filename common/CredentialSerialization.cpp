@@ -2,9 +2,8 @@
 
 #include "base/ByteReader.h"
 #include "common/Allocation.h"
-#include "common/AssertLine.h"
 #include "common/CredentialTypes.h"
-#include "common/SerializationContext.h"
+#include "common/Failure.h"
 
 #include <cstring>
 #include <string.h>

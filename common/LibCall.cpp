@@ -3,9 +3,8 @@
 #include "KSTLib/Command.h"
 #include "common/Allocation.h"
 #include "common/CommandHeader.h"
-#include "common/LibCallReport.h"
+#include "common/Failure.h"
 #include "common/PayloadMemory.h"
-#include "common/RequiredFunction.h"
 
 #include <cstring>
 #include <limits>
@@ -17,7 +16,7 @@ constexpr const char* kSourcePath = "common/LibCall";
 KSTStatus setEnvironmentVariable(KSTTransport transport, void* transportContext,
                                  std::uint32_t variable, const void* data, std::size_t dataLength) {
     const kst::AssertionContext context = kst::libCallContext(kSourcePath);
-    const KSTStatus missing = kst::requireFunction(context, transport, "transport");
+    const KSTStatus missing = context.requireArguments({kst::Argument(transport, "transport")});
     if (missing != kKSTErrorSuccess) {
         return missing;
     }
@@ -75,10 +74,10 @@ void handOver(const KSTDataBlock& block, const std::uint8_t* bytes, std::size_t 
 KSTStatus getEnvironmentVariable(KSTTransport transport, void* transportContext,
                                  std::uint32_t variable, const KSTDataBlock& processVariable) {
     const kst::AssertionContext context = kst::libCallContext(kBlockSourcePath);
-    KSTStatus err = kst::requireFunction(context, transport, "transport");
-    if (err == kKSTErrorSuccess) {
-        err = kst::requireBlock(context, processVariable, "processVariable");
-    }
+    KSTStatus err = context.requireArguments({
+        kst::Argument(transport, "transport"),
+        kst::Argument(processVariable, "processVariable"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -100,7 +99,7 @@ KSTStatus getEnvironmentVariable(KSTTransport transport, void* transportContext,
 KSTStatus kernelControl(KSTTransport transport, void* transportContext, std::uint32_t code,
                         const void* data, std::size_t dataLength, const KSTDataBlock& resultBlock) {
     const kst::AssertionContext context = kst::libCallContext(kBlockSourcePath);
-    KSTStatus err = kst::requireFunction(context, transport, "transport");
+    KSTStatus err = context.requireArguments({kst::Argument(transport, "transport")});
     if (err != kKSTErrorSuccess) {
         return err;
     }

@@ -1,11 +1,9 @@
 #include "KSTLib/Command.h"
 #include "KSTLib/LibCall.h"
-#include "common/AssertLine.h"
 #include "common/CommandSender.h"
 #include "common/ContextObject.h"
-#include "common/LibCallReport.h"
+#include "common/Failure.h"
 #include "common/PayloadMemory.h"
-#include "common/RequiredFunction.h"
 
 namespace {
 
@@ -14,7 +12,7 @@ kst::CommandSender senderOver(KSTTransport transport) {
 }
 
 KSTStatus checkTransport(const kst::CommandSender& sender) {
-    return kst::requireFunction(sender.context, sender.transport, "transport");
+    return sender.context.requireArguments({kst::Argument(sender.transport, "transport")});
 }
 
 KSTStatus create(const kst::CommandSender& sender, KSTContextRef* context, std::uint8_t* logLevel) {

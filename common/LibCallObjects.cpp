@@ -2,10 +2,8 @@
 #include "KSTLib/LibCall.h"
 #include "KSTLib/RequirementSerialization.h"
 #include "common/Allocation.h"
-#include "common/AssertLine.h"
 #include "common/CredentialTypes.h"
-#include "common/LibCallReport.h"
-#include "common/RequiredFunction.h"
+#include "common/Failure.h"
 #include "common/RequirementLayout.h"
 
 #include <cstring>
@@ -233,10 +231,10 @@ KSTStatus getPropertyData(const KSTRequirement* requirement, std::uint32_t prope
 }
 
 KSTStatus deleteRequirement(KSTTransport transport, KSTRequirement* requirement) {
-    KSTStatus err = kst::requireFunction(assertionContext(), transport, "transport");
-    if (err == kKSTErrorSuccess) {
-        err = assertionContext().requireArguments({kst::Argument(requirement, "requirement")});
-    }
+    const KSTStatus err = assertionContext().requireArguments({
+        kst::Argument(transport, "transport"),
+        kst::Argument(requirement, "requirement"),
+    });
     if (err == kKSTErrorSuccess) {
         DeallocRequirement(requirement);
     }

@@ -2,9 +2,8 @@
 
 #include "KSTLib/RequestSerialization.h"
 #include "common/Allocation.h"
-#include "common/AssertLine.h"
 #include "common/ContextObject.h"
-#include "common/SerializationContext.h"
+#include "common/Failure.h"
 
 #include <array>
 #include <string.h>

@@ -5,8 +5,7 @@
 #include "KSTLib/Status.h"
 #include "base/ByteReader.h"
 #include "base/ByteWriter.h"
-#include "common/AssertLine.h"
-#include "common/SerializationContext.h"
+#include "common/Failure.h"
 
 #include <cstddef>
 #include <cstdint>

@@ -1,7 +1,7 @@
 #include "common/PayloadMemory.h"
 
 #include "base/ByteWriter.h"
-#include "common/SerializationContext.h"
+#include "common/Failure.h"
 
 #include <algorithm>
 #include <string.h>

@@ -4,7 +4,7 @@
 #include "KSTLib/Status.h"
 #include "base/ByteReader.h"
 #include "common/Allocation.h"
-#include "common/AssertLine.h"
+#include "common/Failure.h"
 
 #include <array>
 #include <cstddef>

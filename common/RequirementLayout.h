@@ -1,7 +1,6 @@
 #pragma once
 
 #include "KSTLib/Requirement.h"
-#include "common/AssertLine.h"
 
 #include <algorithm>
 #include <cstddef>
@@ -99,16 +98,6 @@ inline void setChildAt(KSTRequirement* node, std::uint32_t index,
     const CompositeLayout& layout = *findCompositeLayout(node->type);
     std::memcpy(reinterpret_cast<std::uint8_t*>(node) + compositeSize(layout, index), &child,
                 kChildSize);
-}
-
-/// Writes the line "err == 0 " once for each of `levels` levels that a failure passes on its way
-/// up. Hands `status` back.
-inline KSTStatus failLevels(const AssertionContext& context, KSTStatus status,
-                            std::size_t levels) noexcept {
-    for (std::size_t level = 0; level < levels; ++level) {
-        static_cast<void>(failCall(context, status));
-    }
-    return status;
 }
 
 /// One property of the requirements of one type.

@@ -1,10 +1,9 @@
 #include "KSTLib/RequirementSerialization.h"
 
 #include "base/ByteWriter.h"
-#include "common/AssertLine.h"
+#include "common/Failure.h"
 #include "common/LevelStack.h"
 #include "common/RequirementLayout.h"
-#include "common/SerializationContext.h"
 
 namespace {
 

@@ -1,10 +1,8 @@
 #include "KSTLib/RequestSerialization.h"
-#include "common/AssertLine.h"
 #include "common/ContextObject.h"
+#include "common/Failure.h"
 #include "common/ParameterPayload.h"
 #include "common/PayloadMemory.h"
-#include "common/SerializationContext.h"
-#include "common/WriterRoom.h"
 
 #include <algorithm>
 #include <string.h>

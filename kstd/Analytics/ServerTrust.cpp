@@ -1,4 +1,4 @@
-#include "common/AssertLine.h"
+#include "common/Failure.h"
 #include "kstd/Analytics/KSTDAnalyticsLogger.h"
 #include "kstd/LogLines.h"
 #include "platform/SystemLog.h"

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "KSTLib/Status.h"
-#include "common/AssertLine.h"
+#include "common/Failure.h"
 #include "kstd/DeviceRestrictedMode/KSTDRMDeamonNotification.h"
 #include "kstd/KSTService.h"
 

@@ -215,7 +215,7 @@ TEST(CheckPlacesTest, NoFunctionLendsItsCallersPlaceToSeveralChecks) {
 
 TEST(CheckPlacesTest, ChecksAreFound) {
     const std::set<std::string> names = checks();
-    for (const char* const name : {"fail", "failCall", "stop", "Argument", "requireFunction"}) {
+    for (const char* const name : {"fail", "failCall", "failForRoom", "stop", "Argument"}) {
         EXPECT_TRUE(names.contains(name)) << name;
     }
 }

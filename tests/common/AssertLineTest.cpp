@@ -1,5 +1,4 @@
-#include "common/AssertLine.h"
-
+#include "common/Failure.h"
 #include "tests/support/AssertionLines.h"
 #include "tests/support/RecordingLog.h"
 

@@ -2,7 +2,7 @@
 
 #include "base/Concat.h"
 #include "base/Saturate.h"
-#include "common/AssertLine.h"
+#include "common/Failure.h"
 #include "kstd/Analytics/SQLite/DatabaseFile.h"
 #include "kstd/Analytics/SQLite/FormatText.h"
 #include "kstd/Analytics/SQLite/SchemaHash.h"

@@ -1,12 +1,19 @@
 #pragma once
 
 #include "KSTLib/Status.h"
+#include "common/LibraryLog.h"
 #include "platform/SystemLog.h"
 
 #include <cstddef>
 #include <cstdint>
 #include <utility>
 
+/// How a function of the library or of a program tells what it refuses and what went wrong: one
+/// line for each failed check, and the status back, so that both are one statement:
+///
+///     KSTStatus err = context.requireArguments({Argument(a, "a"), Argument(b, "b")});
+///     if (size > room) return fail(context, "size <= room", 0, kKSTErrorBadParameter);
+///     if (err != kKSTErrorSuccess) return failCall(context, err);
 namespace kst {
 
 /// The source and the line that hold a check. No other check of that source has the line.
@@ -25,9 +32,21 @@ struct CheckPlace {
 struct Argument {
     explicit constexpr Argument(const void* argument, const char* argumentName,
                                 CheckPlace argumentPlace = CheckPlace::here()) noexcept
-        : value(argument), name(argumentName), place(argumentPlace) {}
+        : isThere(argument != nullptr), name(argumentName), place(argumentPlace) {}
 
-    const void* value;
+    template <typename Result, typename... Arguments>
+    explicit constexpr Argument(Result (*function)(Arguments...), const char* argumentName,
+                                CheckPlace argumentPlace = CheckPlace::here()) noexcept
+        : isThere(function != nullptr), name(argumentName), place(argumentPlace) {}
+
+    /// A block, which has no address of its own: what it calls stands for it.
+    template <typename Block>
+    requires requires(const Block& block) { block.invoke; }
+    explicit constexpr Argument(const Block& block, const char* argumentName,
+                                CheckPlace argumentPlace = CheckPlace::here()) noexcept
+        : isThere(block.invoke != nullptr), name(argumentName), place(argumentPlace) {}
+
+    bool isThere;
     /// What the line of the failed check calls it.
     const char* name;
     CheckPlace place;
@@ -76,7 +95,7 @@ AssertionContext::requireArguments(const Argument (&arguments)[count]) const noe
     const auto isThere = [&missing, &place](const Argument& argument) {
         missing = argument.name;
         place = argument.place;
-        return argument.value != nullptr;
+        return argument.isThere;
     };
     const auto areThere = [&]<std::size_t... index>(std::index_sequence<index...>) {
         return (isThere(arguments[index]) && ...);
@@ -94,5 +113,52 @@ AssertionContext::requireArguments(const Argument (&arguments)[count]) const noe
 /// Writes the line of a failed check and stops the process: a program that has come here is broken.
 [[noreturn]] void stop(const AssertionContext& context, const char* condition,
                        CheckPlace place = CheckPlace::here()) noexcept;
+
+/// The context of the library's failed checks: its log.
+[[nodiscard]] inline AssertionContext libraryContext() noexcept {
+    return {libraryLog(), "KSTLib", "KSTLib/KSTLib"};
+}
+
+inline constexpr const char* kLibCallTag = "KST";
+
+/// The context of a failed check in a LibCall function of the source `path`: the library's log.
+[[nodiscard]] inline AssertionContext libCallContext(const char* path) noexcept {
+    return {libraryLog(), kLibCallTag, path};
+}
+
+/// The context of a failed check in the serialisers.
+[[nodiscard]] inline AssertionContext serializationContext() noexcept {
+    return libCallContext("common/LibSerialization");
+}
+
+/// The failure of a writer whose payload does not fit.
+[[nodiscard]] inline KSTStatus failForRoom(CheckPlace place = CheckPlace::here()) noexcept {
+    return fail(serializationContext(), "*outSize >= requiredSize", 0, kKSTErrorBadParameter,
+                place);
+}
+
+/// `measured` is how measuring the payload ended: a failure is reported and returned. Otherwise the
+/// size must fit.
+[[nodiscard]] inline KSTStatus checkRoom(KSTStatus measured, std::uint64_t requiredSize,
+                                         std::uint64_t room) noexcept {
+    if (measured != kKSTErrorSuccess) {
+        return failCall(serializationContext(), measured);
+    }
+    return room >= requiredSize ? kKSTErrorSuccess : failForRoom();
+}
+
+/// Writes the line "err == 0 " once for each of `levels` levels that a failure passes on its way
+/// up. Hands `status` back.
+inline KSTStatus failLevels(const AssertionContext& context, KSTStatus status,
+                            std::size_t levels) noexcept {
+    for (std::size_t level = 0; level < levels; ++level) {
+        static_cast<void>(failCall(context, status));
+    }
+    return status;
+}
+
+/// Prints the line of a LibCall function's failed return to standard output and flushes it, so that
+/// it is not lost with the process; prints nothing on success. Hands `status` back.
+KSTStatus printReturn(const char* function, KSTStatus status) noexcept;
 
 } // namespace kst

@@ -1,8 +1,9 @@
-#include "common/AssertLine.h"
+#include "common/Failure.h"
 
 #include "common/LibraryLog.h"
 
 #include <cinttypes>
+#include <cstdio>
 #include <cstdlib>
 
 namespace kst {
@@ -18,6 +19,16 @@ void writeAssertLine(platform::SystemLog* log, const char* tag, const char* path
 void stop(const AssertionContext& context, const char* condition, CheckPlace place) noexcept {
     static_cast<void>(fail(context, condition, 0, kKSTErrorUnexpected, place));
     std::abort();
+}
+
+KSTStatus printReturn(const char* function, KSTStatus status) noexcept {
+    if (status != kKSTErrorSuccess) {
+        // There is nobody to tell when standard output cannot be written to.
+        static_cast<void>(
+            std::printf("%s: %s: returning, err = %" PRId32 ".\n", kLibCallTag, function, status));
+        static_cast<void>(std::fflush(stdout));
+    }
+    return status;
 }
 
 } // namespace kst
