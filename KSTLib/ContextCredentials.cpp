@@ -4,7 +4,6 @@
 #include "KSTLib/Command.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
-#include "KSTLib/TemporaryContext.h"
 #include "common/CommandSender.h"
 #include "common/Failure.h"
 #include "common/PayloadMemory.h"

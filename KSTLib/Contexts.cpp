@@ -5,7 +5,6 @@
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/LibrarySender.h"
 #include "KSTLib/Platform.h"
-#include "KSTLib/TemporaryContext.h"
 #include "common/Allocation.h"
 #include "common/ContextObject.h"
 #include "common/Failure.h"

@@ -1,10 +1,16 @@
 #pragma once
 
 #include "KSTLib/Channel.h"
+#include "KSTLib/Contexts.h"
 #include "KSTLib/LibraryLogging.h"
+#include "KSTLib/Status.h"
 #include "common/CommandSender.h"
+#include "common/Failure.h"
 
-/// How the library's own functions send their commands.
+#include <cstdint>
+
+/// How the library's own functions send their commands, and the context that some make for one
+/// call.
 namespace kst {
 
 [[nodiscard]] inline CommandSender librarySender() noexcept {
@@ -23,5 +29,33 @@ inline void updateLogLevelIfOpen() noexcept {
         updateLogLevel();
     }
 }
+
+/// KSTContextCreate and KSTContextDelete as parts of another function's call, in whose time they
+/// are.
+[[nodiscard]] KSTStatus createContext(KSTContextRef* context) noexcept;
+[[nodiscard]] KSTStatus deleteContext(KSTContextRef context, bool destroy) noexcept;
+
+/// `deleteContext` that tells the kernel service and does not wait for its answer.
+[[nodiscard]] KSTStatus postContextDelete(KSTContextRef context) noexcept;
+
+/// A context that is made for one call on the global scope and destroyed at the end of the scope:
+/// also when the call's time is up, but then nobody waits for the kernel service's answer. When it
+/// cannot be told, and in a child that a block of the call forked, the object goes alone.
+class TemporaryContext {
+  public:
+    TemporaryContext() = default;
+    TemporaryContext(const TemporaryContext&) = delete;
+    TemporaryContext& operator=(const TemporaryContext&) = delete;
+    ~TemporaryContext();
+
+    /// What KSTContextCreate fails with, reported by the caller's line too. To be called once.
+    [[nodiscard]] KSTStatus create(CheckPlace place = CheckPlace::here()) noexcept;
+
+    [[nodiscard]] KSTContextRef get() const { return context_; }
+
+  private:
+    KSTContextRef context_ = nullptr;
+    std::uint64_t process_ = 0;
+};
 
 } // namespace kst

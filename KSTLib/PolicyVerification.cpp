@@ -6,7 +6,6 @@
 #include "KSTLib/LibrarySender.h"
 #include "KSTLib/RequestSerialization.h"
 #include "KSTLib/RequirementSerialization.h"
-#include "KSTLib/TemporaryContext.h"
 #include "common/Allocation.h"
 #include "common/CommandSender.h"
 #include "common/Failure.h"
