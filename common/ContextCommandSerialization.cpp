@@ -64,6 +64,7 @@ KSTStatus SerializeAddCredential(const KSTHandle* handle, const KSTCredential* c
     if (err != kKSTErrorSuccess) {
         return err;
     }
+    // Fits: the room was checked, and any payload is longer than a handle.
     base::ByteWriter front(outBuffer, kKSTHandleSize);
     static_cast<void>(kst::writeHandle(front, handle));
     auto* behindHandle = static_cast<std::uint8_t*>(outBuffer) + kKSTHandleSize;

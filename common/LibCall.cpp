@@ -116,6 +116,7 @@ KSTStatus kernelControl(KSTTransport transport, void* transportContext, std::uin
     err = transport(transportContext, kKSTCommandKernelControl, 0, payload.data(), payload.size(),
                     outBuffer.data(), &outSize);
     if (err != kKSTErrorSuccess) {
+        // No return yet: the block sees failed replies, too.
         static_cast<void>(kst::failCall(context, err));
     }
     if (outSize > outBuffer.size()) {
