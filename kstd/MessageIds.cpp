@@ -8,6 +8,7 @@ using namespace message;
 
 constexpr platform::MessageClass kClasses[] = {
     {kDaemonStarted, "kstd: main: Entering the main runloop."},
+    {kCannotStart, "kstd: cannot start: "},
     {kStateFileNotSaved,
      "kstd: -[DeviceRestrictedModeService saveDataBlob:data:]: returning, err = "},
     {kStateFileNotLoaded,

@@ -11,6 +11,7 @@ namespace kstd {
 namespace message {
 
 inline constexpr char kDaemonStarted[] = "7dccb63d23e541889ee00d6f0d3c5009";
+inline constexpr char kCannotStart[] = "c0bd1ae3d3c14d1fb0f5f1f6a1c50d27";
 inline constexpr char kStateFileNotSaved[] = "008de38b32f5452cbba50c270c7106f4";
 inline constexpr char kStateFileNotLoaded[] = "a3b469b827d8490a8f1f5b04ba9ebb93";
 inline constexpr char kStateFileFailed[] = "7f3e4ddf63324ac483b4858955e7f02f";

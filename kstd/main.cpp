@@ -8,6 +8,9 @@
 
 #include <chrono>
 #include <csignal>
+#include <cstdlib>
+#include <optional>
+#include <system_error>
 
 namespace {
 
@@ -21,12 +24,18 @@ int main() {
     // A peer that hangs up shows as a status, not as a signal.
     std::signal(SIGPIPE, SIG_IGN);
 
-    platform::LinuxHost host({.paths = platform::Paths("/"),
-                              .eventSocket = platform::takeActivatedEventSocket(),
-                              .idleTime = kIdleTime,
-                              .messageClasses = kstd::messageClasses(),
-                              .stop = &stop});
-    const platform::Host interfaces = host.interfaces();
+    std::optional<platform::LinuxHost> host;
+    try {
+        host.emplace(platform::LinuxHostOptions{.paths = platform::Paths("/"),
+                                                .eventSocket = platform::takeActivatedEventSocket(),
+                                                .idleTime = kIdleTime,
+                                                .messageClasses = kstd::messageClasses(),
+                                                .stop = &stop});
+    } catch (const std::system_error&) {
+        // The host has said why.
+        return EXIT_FAILURE;
+    }
+    const platform::Host interfaces = host->interfaces();
     kst::installPlatform({interfaces.log, interfaces.registry, interfaces.channel});
     const kstd::AnalyticsLifetime analytics;
     return kstd::Daemon(interfaces, kstd::makeServices(interfaces)).run();

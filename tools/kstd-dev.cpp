@@ -11,6 +11,7 @@
 
 #include <CLI/CLI.hpp>
 
+#include <cerrno>
 #include <chrono>
 #include <csignal>
 #include <cstdio>
@@ -20,6 +21,7 @@
 #include <iostream>
 #include <string>
 #include <sys/file.h>
+#include <system_error>
 #include <utility>
 #include <vector>
 
@@ -89,7 +91,8 @@ int runDaemon(const Options& options, const platform::StopRequest& stop) {
                                            .messageClasses = kstd::messageClasses(),
                                            .stop = &stop};
     if (!hostOptions.eventSocket.isOpen()) {
-        std::cerr << "kstd-dev: cannot make the event socket " << paths.eventSocket() << '\n';
+        std::cerr << "kstd-dev: cannot make the event socket " << paths.eventSocket() << ": "
+                  << std::generic_category().message(errno) << '\n';
         return 1;
     }
     if (options.idleMilliseconds > 0) {

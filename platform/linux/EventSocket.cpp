@@ -14,6 +14,7 @@
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/un.h>
+#include <system_error>
 #include <utility>
 
 namespace platform {
@@ -82,7 +83,9 @@ void EventSocket::receiveOne() {
     if (length < 0) {
         if (errno != EAGAIN && errno != EINTR) {
             log_.write(LogLevel::warning,
-                       base::concat("kstd: EventSocket: cannot receive, error ", errno, ".\n"), {});
+                       base::concat("kstd: EventSocket: cannot receive: ",
+                                    std::generic_category().message(errno), ".\n"),
+                       {});
         }
         return;
     }

@@ -29,6 +29,7 @@
 
 #include <string>
 #include <string_view>
+#include <system_error>
 #include <utility>
 
 namespace platform {
@@ -148,8 +149,15 @@ struct LinuxHost::Parts {
     std::unique_ptr<IdleExit> idleExit;
 };
 
-LinuxHost::LinuxHost(LinuxHostOptions options)
-    : parts_(std::make_unique<Parts>(std::move(options))) {}
+LinuxHost::LinuxHost(LinuxHostOptions options) {
+    LinuxSystemLog log(options.paths, options.messageClasses, kIdentifier);
+    try {
+        parts_ = std::make_unique<Parts>(std::move(options));
+    } catch (const std::system_error& error) {
+        log.write(LogLevel::error, base::concat("kstd: cannot start: ", error.what(), ".\n"), {});
+        throw;
+    }
+}
 
 LinuxHost::~LinuxHost() {
     parts_->events.clearHandlers();

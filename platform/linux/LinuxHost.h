@@ -42,6 +42,8 @@ struct LinuxHostOptions {
 /// they use is still there.
 class LinuxHost {
   public:
+    /// Throws std::system_error, and leaves a line, when the system refuses what the host cannot be
+    /// without: descriptors, above all.
     explicit LinuxHost(LinuxHostOptions options);
     LinuxHost(const LinuxHost&) = delete;
     LinuxHost& operator=(const LinuxHost&) = delete;

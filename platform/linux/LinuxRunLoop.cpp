@@ -7,8 +7,8 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <new>
 #include <sys/epoll.h>
+#include <system_error>
 #include <time.h>
 #include <utility>
 
@@ -37,7 +37,7 @@ std::uint64_t microsecondsUntil(Date deadline) {
 
 void requireMade(int result) {
     if (result < 0) {
-        throw std::bad_alloc();
+        throw std::system_error(-result, std::generic_category(), "the run loop");
     }
 }
 
@@ -94,7 +94,9 @@ bool LinuxRunLoop::runOnce(Date deadline) {
     const int result = sd_event_run(event_, microsecondsUntil(deadline));
     if (result < 0) {
         log_.write(LogLevel::error,
-                   base::concat("kstd: MainRunLoop: cannot run, error ", -result, ".\n"), {});
+                   base::concat("kstd: MainRunLoop: cannot run: ",
+                                std::generic_category().message(-result), ".\n"),
+                   {});
         return false;
     }
     return true;

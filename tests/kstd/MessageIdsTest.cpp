@@ -30,11 +30,30 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <fstream>
 #include <map>
 #include <regex>
 #include <set>
 #include <sys/socket.h>
+#include <system_error>
+
+struct sd_event;
+
+namespace {
+
+/// What making a run loop fails with, unless it is 0.
+int runLoopError = 0;
+
+} // namespace
+
+// The linker puts this between the platform and the init system's library.
+// NOLINTBEGIN(bugprone-reserved-identifier)
+extern "C" int __real_sd_event_new(sd_event** made);
+extern "C" int __wrap_sd_event_new(sd_event** made) {
+    return runLoopError != 0 ? runLoopError : __real_sd_event_new(made);
+}
+// NOLINTEND(bugprone-reserved-identifier)
 
 namespace kstd {
 namespace {
@@ -305,6 +324,18 @@ Texts hostWithoutASocket() {
     return standardError.lines();
 }
 
+/// No run loop can be made. A limit on the process would be met by the sanitizers, too.
+Texts hostWithoutDescriptors() {
+    const support::RootDirectory root;
+    const support::StandardErrorCapture standardError;
+    runLoopError = -EMFILE;
+    EXPECT_THROW(platform::LinuxHost({.paths = root.paths()}), std::system_error);
+    runLoopError = 0;
+    EXPECT_EQ(standardError.lines(),
+              Texts{"kstd: cannot start: the run loop: Too many open files."});
+    return standardError.lines();
+}
+
 Texts socketThatCannotBeReceivedFrom() {
     int ends[2] = {-1, -1};
     EXPECT_EQ(::pipe(ends), 0);
@@ -432,6 +463,7 @@ const std::vector<Example> kExamples = {
      [] { return eventsOnTheSocket({"text"}, 65534); }, true},
     {"malformedEvents", message::kMalformedEvent, malformedEvents},
     {"hostWithoutASocket", message::kNoEventSocket, hostWithoutASocket},
+    {"hostWithoutDescriptors", message::kCannotStart, hostWithoutDescriptors},
     {"socketThatCannotBeReceivedFrom", message::kNoEventSocket, socketThatCannotBeReceivedFrom},
     {"settingsThatAreNotUsed", message::kSettingsNotUsed, settingsThatAreNotUsed},
     {"settingsThatAreNotWatched", message::kSettingsNotWatched, settingsThatAreNotWatched},
@@ -508,7 +540,7 @@ TEST(MessageIdsTest, IdentifiersAreThoseOfTheCatalog) {
         }
     }
     EXPECT_EQ(known, explained);
-    EXPECT_EQ(known.size(), 26U);
+    EXPECT_EQ(known.size(), 27U);
 }
 
 } // namespace

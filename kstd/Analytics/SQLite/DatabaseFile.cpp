@@ -126,9 +126,19 @@ std::optional<platform::Error> makeParentDirectories(const std::string& path) {
     return std::nullopt;
 }
 
-void createDatabaseFile(const std::string& path) {
+bool createDatabaseFile(const std::string& path) {
+    struct stat found {};
+    const bool isNew = ::stat(path.c_str(), &found) != 0 && errno == ENOENT;
     const base::FileDescriptor created(
         ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kOwnerOnlyFile));
+    if (created.isOpen()) {
+        static_cast<void>(::fchmod(created.get(), kOwnerOnlyFile));
+    }
+    return isNew;
+}
+
+void keepForOwner(const std::string& path) {
+    static_cast<void>(::chmod(path.c_str(), kOwnerOnlyFile));
 }
 
 void removeDatabaseFiles(const std::string& path) {

@@ -12,12 +12,15 @@ namespace kstd {
 /// made.
 [[nodiscard]] std::optional<platform::Error> makeParentDirectories(const std::string& path);
 
-/// Makes an empty file, for the owner alone, unless there is something at `path`. SQLite gives the
-/// files that it keeps beside the database the same mode.
+/// Makes an empty file, for the owner alone whatever the umask is, unless there is something at
+/// `path`. SQLite gives the files that it keeps beside the database the same mode. True when there
+/// was nothing: whatever is there once SQLite has opened it is new, and is given to the owner alone
+/// by `keepForOwner`, also if making it here has failed.
 ///
 /// An existing file is not even opened: closing it would drop the locks that other connections of
 /// this process have on it.
-void createDatabaseFile(const std::string& path);
+[[nodiscard]] bool createDatabaseFile(const std::string& path);
+void keepForOwner(const std::string& path);
 
 /// Registers with SQLite, once in the process, its own way to files with one difference: the index
 /// of a log, which SQLite maps, has its blocks before anybody uses it. SQLite alone writes one byte

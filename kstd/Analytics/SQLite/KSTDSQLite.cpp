@@ -231,7 +231,7 @@ bool KSTDSQLite::openConnection(platform::Error& reason) {
         causes_.tellOfDirectory(reason.description);
         return false;
     }
-    createDatabaseFile(path_);
+    const bool isNew = createDatabaseFile(path_);
     const int code = sqlite3_open_v2(
         path_.c_str(), &db_, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, registerDatabaseFiles());
     if (code != SQLITE_OK) {
@@ -239,6 +239,9 @@ bool KSTDSQLite::openConnection(platform::Error& reason) {
                                           base::Hex{static_cast<std::uint32_t>(code)}, ")");
         causes_.tell(code, db_);
         return false;
+    }
+    if (isNew) {
+        keepForOwner(path_);
     }
     return true;
 }

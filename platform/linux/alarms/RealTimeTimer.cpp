@@ -3,8 +3,8 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstdint>
-#include <new>
 #include <sys/timerfd.h>
+#include <system_error>
 #include <unistd.h>
 
 namespace platform {
@@ -20,7 +20,7 @@ int makeTimer() {
 
 RealTimeTimer::RealTimeTimer() : descriptor_(makeTimer()) {
     if (!descriptor_.isOpen()) {
-        throw std::bad_alloc();
+        throw std::system_error(errno, std::generic_category(), "the timer");
     }
 }
 

@@ -202,7 +202,7 @@ bool isLocked(const std::string& file) {
 TEST_F(KSTDSQLiteTest, SecondObjectLeavesTheLocksOfTheFirst) {
     const auto first = openDatabase();
     ASSERT_TRUE(isLocked(path));
-    createDatabaseFile(path);
+    EXPECT_FALSE(createDatabaseFile(path));
     EXPECT_TRUE(isLocked(path));
     const auto second = openDatabase();
     EXPECT_TRUE(isLocked(path));

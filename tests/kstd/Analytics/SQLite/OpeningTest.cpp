@@ -84,6 +84,31 @@ TEST_F(OpeningTest, FilesAndDirectoriesAreForTheOwnerAlone) {
     }
 }
 
+TEST_F(OpeningTest, FilesAreForTheOwnerAloneWhateverTheUmask) {
+    for (const mode_t mask : {0U, 022U, 077U, 0277U, 0777U}) {
+        const std::string file = directory.file(std::to_string(mask) + ".db");
+        const mode_t before = ::umask(mask);
+        KSTDSQLite made(file, kSchema, environment);
+        EXPECT_TRUE(made.openWithError(nullptr)) << mask;
+        ::umask(before);
+        for (const char* const suffix : {"", "-wal", "-shm"}) {
+            EXPECT_EQ(modeOf(file + suffix), 0600U) << mask << suffix;
+        }
+    }
+}
+
+// Nothing can be made at a link, behind which SQLite then makes the file itself.
+TEST_F(OpeningTest, FileThatSQLiteHasMadeIsForTheOwnerAlone) {
+    const std::string target = directory.file("target.db");
+    std::filesystem::create_symlink(target, path);
+    const mode_t before = ::umask(0);
+    const auto opened = openDatabase();
+    ::umask(before);
+    for (const char* const suffix : {"", "-wal", "-shm"}) {
+        EXPECT_EQ(modeOf(target + suffix), 0600U) << suffix;
+    }
+}
+
 TEST_F(OpeningTest, ExistingFileKeepsItsMode) {
     write(path, "");
     ASSERT_EQ(::chmod(path.c_str(), 0644), 0);
