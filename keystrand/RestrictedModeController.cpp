@@ -58,7 +58,17 @@ std::function<void()> RestrictedModeController::daemonStarted(bool allowed,
     takeUp(allowed, state);
     return [this, unacknowledged = std::move(unacknowledged)] {
         publisher_.postAgain(unacknowledged);
+        announceAlarmAgain();
     };
+}
+
+void RestrictedModeController::announceAlarmAgain() {
+    // What was acknowledged may be lost all the same: an alarm that did not get onto disk goes with
+    // the daemon.
+    const TimerRestarted record = timer_.timerRestarted();
+    if (record.alarm != 0 && registry_.find(wire::rm::kTimerRestartedProperty) == nullptr) {
+        publish({makeTimerRestarted(record)});
+    }
 }
 
 void RestrictedModeController::takeUp(bool allowed, const StateBytes& state) {

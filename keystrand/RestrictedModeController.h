@@ -48,6 +48,7 @@ class RestrictedModeController {
 
   private:
     void takeUp(bool allowed, const StateBytes& state);
+    void announceAlarmAgain();
     void publish(const RestrictedModeTimer::Notifications& notifications);
     void setPolicy(const RestrictedModePolicy& policy);
 

@@ -97,8 +97,36 @@ TEST_F(RestrictedModeControllerTest, ZeroStateOnlySaysWhetherItIsAllowed) {
 
 TEST_F(RestrictedModeControllerTest, StateThatWasLastPublishedIsNoNews) {
     controller_.lock();
+    static_cast<void>(registry_.copy("KSTRMTimerRestarted"));
+    moveClock(kStart + 100);
+    acknowledge("KSTRMTimerRestarted");
+    acknowledge("KSTRMSaveAnalytics");
+    poster_.events.clear();
+    daemonStarts(true, state(1, kStart, 1));
+    EXPECT_THAT(poster_.events, IsEmpty());
+}
+
+TEST_F(RestrictedModeControllerTest, AlarmOfARunningTimerIsAnnouncedToEveryDaemonThatStarts) {
+    controller_.lock();
+    const ByteVector record = property("KSTRMTimerRestarted");
     acknowledge("KSTRMTimerRestarted");
     poster_.events.clear();
+    daemonStarts(true, state(1, kStart, 0));
+    EXPECT_THAT(poster_.events,
+                ElementsAre("com.zerva.notifyd.matching com.zerva.Keystrand.KSTRMTimerRestarted"));
+    EXPECT_EQ(property("KSTRMTimerRestarted"), record);
+    // It is there now; a second daemon is told of it as of anything unacknowledged.
+    poster_.events.clear();
+    daemonStarts(true, state(1, kStart, 0));
+    EXPECT_EQ(poster_.events.size(), 1U);
+    EXPECT_EQ(property("KSTRMTimerRestarted"), record);
+}
+
+TEST_F(RestrictedModeControllerTest, AQuietModelAnnouncesNoAlarmAgain) {
+    controller_.lock();
+    acknowledge("KSTRMTimerRestarted");
+    poster_.events.clear();
+    controller_.setQuiet(true);
     daemonStarts(true, state(1, kStart, 0));
     EXPECT_THAT(poster_.events, IsEmpty());
 }
