@@ -9,6 +9,7 @@
 #include "platform/SystemLog.h"
 
 #include <algorithm>
+#include <array>
 #include <utility>
 
 namespace kstd {
@@ -20,6 +21,10 @@ constexpr char kSubsystem[] = "Keystrand";
 
 constexpr std::int64_t kSecondsBetweenUploads = 259200;
 constexpr std::int64_t kSecondsBetweenUploadsOfDevelopers = 60;
+
+constexpr double kSecondsPerDay = 86400;
+/// The days at which the buckets behind the first begin.
+constexpr std::array<int, 4> kBuckets = {1, 7, 30, 365};
 
 } // namespace
 
@@ -126,6 +131,49 @@ std::optional<platform::Timestamp> KSTDAnalyticsLogger::datePropertyForKey(const
     std::optional<platform::Timestamp> date;
     fields.queue->sync([&] { date = fields.database->datePropertyForKey(key); });
     return date;
+}
+
+platform::ValueMap
+KSTDAnalyticsLogger::eventDictForEventName(std::string_view name,
+                                           const platform::ValueMap* withAttributes) const {
+    platform::ValueMap event;
+    if (withAttributes != nullptr) {
+        event = *withAttributes;
+    }
+    if (fields.splunkTopicName) {
+        event.insert_or_assign("topic", *fields.splunkTopicName);
+    } else {
+        event.erase("topic");
+    }
+    event.insert_or_assign("eventType", name);
+    event.insert_or_assign("eventTime", platform::millisecondsSince1970(host_.clock.now()));
+    if (fields.metricsBase) {
+        event.insert(fields.metricsBase->begin(), fields.metricsBase->end());
+    }
+    return event;
+}
+
+platform::ValueMap
+KSTDAnalyticsLogger::eventDictWithBlacklistedFieldsStrippedFrom(platform::ValueMap map) const {
+    if (fields.blacklistedFields) {
+        for (const std::string& field : *fields.blacklistedFields) {
+            map.erase(field);
+        }
+    }
+    return map;
+}
+
+int KSTDAnalyticsLogger::fuzzyDaysSinceDate(platform::Timestamp date, platform::Clock& clock) {
+    const double seconds =
+        platform::timestampOf(clock.now()).secondsSince2001 - date.secondsSince2001;
+    int bucket = 0;
+    for (const int days : kBuckets) {
+        if (seconds < days * kSecondsPerDay) {
+            break;
+        }
+        bucket = days;
+    }
+    return bucket;
 }
 
 } // namespace kstd

@@ -202,7 +202,7 @@ TEST(IncludeRulesTest, RulesRefuseWhatTheyShould) {
     EXPECT_FALSE(isAllowed({"KSTLib/KSTLib.h", "KSTLib/Channel.h"}));
     EXPECT_FALSE(isAllowed({"KSTLib/KSTLib.h", "common/Allocation.h"}));
     EXPECT_TRUE(isAllowed({"common/LibCall.cpp", "KSTLib/Status.h"}));
-    EXPECT_FALSE(isAllowed({"kstd/Analytics/Upload.cpp", "KSTLib/Channel.h"}));
+    EXPECT_FALSE(isAllowed({"kstd/Analytics/KSTDAnalyticsLoggerUpload.cpp", "KSTLib/Channel.h"}));
     EXPECT_FALSE(isAllowed({"kstd/Analytics/SQLite/KSTDSQLite.cpp", "kstd/Analytics/Analytics.h"}));
     EXPECT_FALSE(isAllowed({"fuzz/fuzz_json.cpp", "platform/linux/Paths.h"}));
     EXPECT_FALSE(isAllowed({"kstd/main.cpp", "platform/https/LinuxHTTPSessions.h"}));

@@ -1,9 +1,13 @@
 #include "base/Concat.h"
+#include "common/Failure.h"
+#include "kstd/Analytics/EndpointBag.h"
 #include "kstd/Analytics/KSTDAnalyticsLogger.h"
 #include "kstd/Analytics/TQAnalyticsLoggerSQLiteStore.h"
 #include "kstd/Analytics/UploadDocument.h"
 #include "kstd/Analytics/WaitForReply.h"
+#include "kstd/LogLines.h"
 #include "platform/Clock.h"
+#include "platform/JSON.h"
 #include "platform/SystemLog.h"
 
 #include <utility>
@@ -21,6 +25,12 @@ constexpr std::int64_t kDatabaseNotOpenable = -1;
 /// How much of a document goes into the log. The log shows a part of so long a line only, and a
 /// document may have hundreds of megabytes.
 constexpr std::size_t kLoggedDocumentSize = 8192;
+
+constexpr std::uint64_t kMillisecondsPerSecond = 1000;
+
+bool isTrusted(platform::TrustResult result) {
+    return result == platform::TrustResult::proceed || result == platform::TrustResult::unspecified;
+}
 
 } // namespace
 
@@ -123,6 +133,93 @@ bool KSTDAnalyticsLogger::isAccepted(const platform::HTTPReply& reply, const pla
 platform::HTTPReply KSTDAnalyticsLogger::replyTo(const platform::HTTPRequest& request) {
     const auto session = host_.https.makeEphemeral({{"User-Agent", kUserAgent}}, weak_from_this());
     return waitForReply(*session, request);
+}
+
+using platform::Link;
+using platform::LogLevel;
+
+std::optional<Link> KSTDAnalyticsLogger::splunkUploadURL() {
+    return fields.splunkUploadURL ? fields.splunkUploadURL : fetchUploadURL();
+}
+
+std::optional<Link> KSTDAnalyticsLogger::fetchUploadURL() {
+    const auto reply = replyTo({.method = "GET", .link = fields.splunkBagURL});
+    if (reply.error) {
+        host_.log.write(LogLevel::error,
+                        base::concat("Unable to fetch splunk endpoint at URL: ",
+                                     fields.splunkBagURL ? fields.splunkBagURL->text : "(null)",
+                                     " -- error: ", reply.error->description),
+                        {});
+        return std::nullopt;
+    }
+    const auto JSON = host_.json.read(reply.body);
+    const auto bag = JSON ? EndpointBag::fromValue(JSON.value()) : std::nullopt;
+    if (bag && !ignoreServerDisablingMessages() && !takeOverSwitches(*bag)) {
+        host_.log.write(LogLevel::info, "not returning a splunk URL because uploads are disabled",
+                        {});
+        return std::nullopt;
+    }
+    auto link = bag ? takeOverMetrics(*bag) : std::nullopt;
+    if (!link) {
+        host_.log.write(LogLevel::error, "Malformed Ombrix config payload!", {});
+    }
+    return link;
+}
+
+/// Whether uploads are wanted. If not, all but `disableLogging` stays as it was.
+bool KSTDAnalyticsLogger::takeOverSwitches(const EndpointBag& bag) {
+    fields.disableLogging = bag.disabled;
+    if (bag.disabled || bag.sendDisabled) {
+        return false;
+    }
+    if (bag.postFrequency && *bag.postFrequency >= kMillisecondsPerSecond) {
+        fields.secondsBetweenUploads =
+            static_cast<std::int64_t>(*bag.postFrequency / kMillisecondsPerSecond);
+    }
+    fields.blacklistedEvents = bag.blacklistedEvents;
+    fields.blacklistedFields = bag.blacklistedFields;
+    return true;
+}
+
+std::optional<Link> KSTDAnalyticsLogger::takeOverMetrics(const EndpointBag& bag) {
+    fields.metricsBase = bag.metricsBase;
+    if (!bag.metricsUrl) {
+        return std::nullopt;
+    }
+    if (platform::namesUser(*bag.metricsUrl)) {
+        return std::nullopt;
+    }
+    const std::string text =
+        base::concat(*bag.metricsUrl, "/2/", fields.splunkTopicName.value_or("(null)"));
+    host_.log.write(LogLevel::info, base::concat("got metrics endpoint: ", text), {});
+    const auto link = platform::linkFromText(text);
+    // Only this spelling of the scheme is a link that was meant.
+    return link && link->scheme() == "https" ? link : std::nullopt;
+}
+
+void KSTDAnalyticsLogger::didReceiveChallenge(const platform::AuthenticationChallenge& challenge,
+                                              const platform::ChallengeCompletion& completion) {
+    using enum platform::ChallengeDisposition;
+    if (!completion) {
+        kst::stop({&host_.log, kTag, "kstd/Analytics/KSTDAnalyticsLogger"}, "completion");
+    }
+    host_.log.write(platform::LogLevel::info, "Splunk upload challenge", {});
+    if (challenge.previousFailureCount > 0) {
+        completion(cancel, std::nullopt);
+        return;
+    }
+    if (challenge.method != platform::kServerTrustMethod) {
+        completion(performDefaultHandling, std::nullopt);
+        return;
+    }
+    const platform::TrustResult result = challenge.trust->evaluate();
+    if (fields.allowInsecureSplunkCert) {
+        host_.log.write(platform::LogLevel::info, "Force Accepting Splunk Credential", {});
+    } else if (!isTrusted(result)) {
+        completion(cancel, std::nullopt);
+        return;
+    }
+    completion(useCredential, platform::ServerTrustCredential{challenge.trust});
 }
 
 } // namespace kstd
