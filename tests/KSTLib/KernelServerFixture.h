@@ -19,6 +19,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 namespace support {
@@ -102,10 +103,30 @@ class KernelServerFixture : public LibraryFixture {
         });
     }
 
+    using Handler = std::function<bool(const Peer&, int code, const Packet& request)>;
+
+    /// A handler that a test sets while the server's threads ask for it.
+    class SharedHandler {
+      public:
+        SharedHandler& operator=(Handler handler) {
+            const std::lock_guard lock(mutex_);
+            handler_ = std::move(handler);
+            return *this;
+        }
+        [[nodiscard]] Handler get() const {
+            const std::lock_guard lock(mutex_);
+            return handler_;
+        }
+
+      private:
+        mutable std::mutex mutex_;
+        Handler handler_;
+    };
+
     /// Handles what has arrived in place of the usual answer; false leaves it to that.
-    std::function<bool(const Peer&, int code, const Packet& request)> handle;
+    SharedHandler handle;
     /// Requests are overwritten as soon as they were looked at.
-    bool wipesRequests = false;
+    std::atomic<bool> wipesRequests = false;
 
   private:
     static int codeOf(const Packet& request) {
@@ -153,7 +174,8 @@ class KernelServerFixture : public LibraryFixture {
                 std::fill(request.begin() + 16, request.end(), std::uint8_t{0});
             }
             note({connection, code, request[8]});
-            if (!handle || !handle(peer, code, request)) {
+            const Handler handler = handle.get();
+            if (!handler || !handler(peer, code, request)) {
                 peer.send(answerTo(code, request));
             }
         }
