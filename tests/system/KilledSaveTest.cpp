@@ -67,9 +67,10 @@ class KilledSaveTest : public SystemFixture {
         EXPECT_EQ(
             handedOver[0],
             (Request{3, "010000" + hex(isLoaded ? *saved : std::vector<std::uint8_t>(13, 0)), 0}));
-        // A record that is still there is announced to it again, and acknowledged.
-        for (std::size_t i = 1; i < handedOver.size(); ++i) {
-            EXPECT_EQ(handedOver[i].control, 7U);
+        // Only a record that is still there is announced to it again, and acknowledged once.
+        EXPECT_LE(handedOver.size(), acknowledged ? 1U : 2U);
+        if (handedOver.size() == 2) {
+            EXPECT_EQ(handedOver[1].control, 7U);
         }
         daemon->signal(SIGKILL);
         daemon->awaitEnd();
