@@ -4,7 +4,8 @@
 #include <stdint.h>
 
 /** The result of every library call: 0 is success. Statuses of the kernel side and of the platform
- *  pass through unchanged; the platform's own lie between -1001 and -5095 (-1000 - errno). */
+ *  pass through unchanged; the platform's own lie between -1001 and -5095 (-1000 - errno).
+ *  KSTLib/Words.h has words for all of them. */
 typedef int32_t KSTStatus;
 
 enum {

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "KSTLib/Words.h"
+
 #include <cstddef>
 #include <cstdint>
 #include <functional>
@@ -11,24 +13,25 @@
 
 namespace keystrand {
 
-/// What the kernel service answers when it refuses; listed in docs/kernel-socket.md.
+/// What the kernel service answers when it refuses; listed in docs/kernel-socket.md, and known to
+/// clients by the same numbers.
 using KernelStatus = std::int32_t;
 
 inline constexpr KernelStatus kKernelSuccess = 0;
-inline constexpr KernelStatus kKernelMalformedRequest = -6001;
-inline constexpr KernelStatus kKernelNoSuchEntry = -6002;
-inline constexpr KernelStatus kKernelNotOpen = -6003;
-inline constexpr KernelStatus kKernelUnknownSelector = -6004;
-inline constexpr KernelStatus kKernelMalformedFrame = -6005;
-inline constexpr KernelStatus kKernelUnknownCommand = -6006;
-inline constexpr KernelStatus kKernelBadPayload = -6007;
-inline constexpr KernelStatus kKernelReplyDoesNotFit = -6008;
-inline constexpr KernelStatus kKernelTableFull = -6009;
-inline constexpr KernelStatus kKernelNoSuchContext = -6010;
-inline constexpr KernelStatus kKernelTooManyContexts = -6011;
-inline constexpr KernelStatus kKernelTooManyCredentials = -6012;
-inline constexpr KernelStatus kKernelNoSuchPolicy = -6013;
-inline constexpr KernelStatus kKernelBadConstraint = -6014;
+inline constexpr KernelStatus kKernelMalformedRequest = kKSTKernelErrorMalformedRequest;
+inline constexpr KernelStatus kKernelNoSuchEntry = kKSTKernelErrorNoSuchEntry;
+inline constexpr KernelStatus kKernelNotOpen = kKSTKernelErrorNotOpen;
+inline constexpr KernelStatus kKernelUnknownSelector = kKSTKernelErrorUnknownSelector;
+inline constexpr KernelStatus kKernelMalformedFrame = kKSTKernelErrorMalformedFrame;
+inline constexpr KernelStatus kKernelUnknownCommand = kKSTKernelErrorUnknownCommand;
+inline constexpr KernelStatus kKernelBadPayload = kKSTKernelErrorBadPayload;
+inline constexpr KernelStatus kKernelReplyDoesNotFit = kKSTKernelErrorReplyDoesNotFit;
+inline constexpr KernelStatus kKernelTableFull = kKSTKernelErrorTableFull;
+inline constexpr KernelStatus kKernelNoSuchContext = kKSTKernelErrorNoSuchContext;
+inline constexpr KernelStatus kKernelTooManyContexts = kKSTKernelErrorTooManyContexts;
+inline constexpr KernelStatus kKernelTooManyCredentials = kKSTKernelErrorTooManyCredentials;
+inline constexpr KernelStatus kKernelNoSuchPolicy = kKSTKernelErrorNoSuchPolicy;
+inline constexpr KernelStatus kKernelBadConstraint = kKSTKernelErrorBadConstraint;
 
 /// A command frame as it stands in the input of a struct call; the payload points into the input.
 struct CommandFrame {

@@ -3,6 +3,7 @@
 #include "KSTLib/KSTLib.h"
 #include "KSTLib/LibCall.h"
 #include "KSTLib/Serialization.h"
+#include "KSTLib/Words.h"
 
 #include <string.h>
 
@@ -219,4 +220,27 @@ size_t sizeOfCredentialInC(void) {
 
 int64_t allocatedBytesInC(void) {
     return gAllocatedBytes + gLastAllocatedBytes;
+}
+
+const char* wordsInC(int table, uint32_t number) {
+    switch (table) {
+    case 0:
+        return KSTStatusText((KSTStatus)number);
+    case 1:
+        return KSTCredentialPropertyText(number);
+    case 2:
+        return KSTRequirementPropertyText(number);
+    case 3:
+        return KSTPassphrasePurposeText(number);
+    case 4:
+        return KSTRequirementStateText(number);
+    case 5:
+        return KSTRequirementTypeText(number);
+    default:
+        return KSTParameterTypeText(number);
+    }
+}
+
+uint32_t credentialTypeForRequirementTypeInC(uint32_t type) {
+    return KSTCredentialTypeForRequirementType(type);
 }

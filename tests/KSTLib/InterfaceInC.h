@@ -87,6 +87,11 @@ size_t sizeOfCredentialInC(void);
 
 int64_t allocatedBytesInC(void);
 
+/** What C has for words: one function for each table. */
+enum { kWordTableCount = 7 };
+const char* wordsInC(int table, uint32_t number);
+uint32_t credentialTypeForRequirementTypeInC(uint32_t type);
+
 #ifdef __cplusplus
 }
 #endif
