@@ -1,6 +1,6 @@
 // JSON from outside: what can be read comes back the same after it was written.
 
-#include "platform/shared/JSONCodec.h"
+#include "platform/formats/JSONCodec.h"
 
 #include <cstddef>
 #include <cstdint>

@@ -2,8 +2,8 @@
 // should be, and what was read can be written and read again without a change.
 
 #include "platform/ValueBuilder.h"
-#include "platform/shared/BinaryPropertyList.h"
-#include "platform/shared/UnicodeText.h"
+#include "platform/formats/PropertyListCodec.h"
+#include "platform/formats/UnicodeText.h"
 
 #include <algorithm>
 #include <cstdint>

@@ -1,8 +1,8 @@
 #include "base/Concat.h"
 #include "kstctl/Forms.h"
 #include "kstctl/TerminalText.h"
-#include "platform/shared/JSONWriter.h"
-#include "platform/shared/UnicodeText.h"
+#include "platform/formats/JSONCodec.h"
+#include "platform/formats/UnicodeText.h"
 
 #include <cmath>
 #include <utility>

@@ -1,7 +1,7 @@
 #include "kstctl/TerminalText.h"
 
 #include "base/Concat.h"
-#include "platform/shared/UnicodeText.h"
+#include "platform/formats/UnicodeText.h"
 
 #include <algorithm>
 #include <optional>

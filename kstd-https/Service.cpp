@@ -1,8 +1,8 @@
 #include "kstd-https/Service.h"
 
 #include "kstd-https/Daemon.h"
+#include "platform/host/HTTPRequestCheck.h"
 #include "platform/https/HTTPTransfer.h"
-#include "platform/shared/HTTPRequestCheck.h"
 
 #include <algorithm>
 #include <cstdint>

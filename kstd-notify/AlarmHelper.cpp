@@ -1,6 +1,6 @@
 #include "kstd-notify/AlarmHelper.h"
 
-#include "platform/shared/LogText.h"
+#include "platform/host/LogText.h"
 #include "wire/EventDatagram.h"
 
 #include <systemd/sd-daemon.h>

@@ -5,7 +5,7 @@
 #include "kstd-notify/Notice.h"
 #include "kstd-notify/SystemdAlarmTimer.h"
 #include "platform/SystemLog.h"
-#include "platform/shared/LogText.h"
+#include "platform/host/LogText.h"
 #include "wire/EventDatagram.h"
 
 #include <ostream>

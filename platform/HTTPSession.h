@@ -124,7 +124,7 @@ using HTTPCompletion = std::function<void(const HTTPReply&)>;
 /// are kept.
 ///
 /// Redirects are not followed: the answer is what the first server says. How long a request may
-/// take depends on its method and its size only (platform/shared/HTTPLimits.h); what takes longer
+/// take depends on its method and its size only (platform/host/HTTPLimits.h); what takes longer
 /// ends it with kTimedOut. No header is sent but Host, Content-Length (with a body) and the
 /// session's own.
 class HTTPSession {

@@ -5,7 +5,7 @@
 #include "kstctl/commands/NewFile.h"
 #include "kstctl/database/EventText.h"
 #include "kstd/Analytics/Analytics.h"
-#include "platform/linux/LinuxPropertyLists.h"
+#include "platform/formats/PropertyListCodec.h"
 
 #include <algorithm>
 #include <functional>
@@ -102,7 +102,7 @@ class Listing {
   private:
     const EventDatabase& database_;
     const Environment& environment_;
-    platform::LinuxPropertyLists propertyLists_;
+    platform::PropertyListCodec propertyLists_;
     std::optional<std::string> type_;
     std::uint64_t toLeaveOut_ = 0;
     std::optional<platform::Error> fault_;

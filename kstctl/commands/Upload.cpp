@@ -8,10 +8,10 @@
 #include "kstctl/status/UploadConfiguration.h"
 #include "kstd/Analytics/Analytics.h"
 #include "kstd/Analytics/UploadDocument.h"
+#include "platform/formats/JSONCodec.h"
+#include "platform/formats/PropertyListCodec.h"
 #include "platform/linux/LinuxClock.h"
-#include "platform/linux/LinuxPropertyLists.h"
 #include "platform/linux/LinuxSystemVersion.h"
-#include "platform/shared/JSONCodec.h"
 
 #include <functional>
 
@@ -70,7 +70,7 @@ class DocumentWriter {
     const Environment& environment_;
     const EventDatabase& database_;
     platform::JSONCodec json_;
-    platform::LinuxPropertyLists propertyLists_;
+    platform::PropertyListCodec propertyLists_;
 };
 
 /// All but the document.

@@ -5,8 +5,8 @@
 #include "kstctl/status/LastUpload.h"
 #include "kstctl/status/Section.h"
 #include "kstctl/status/UploadConfiguration.h"
+#include "platform/formats/PropertyListCodec.h"
 #include "platform/linux/LinuxConfigurationResource.h"
-#include "platform/linux/LinuxPropertyLists.h"
 #include "platform/linux/LinuxUserDefaults.h"
 
 #include <algorithm>
@@ -52,7 +52,7 @@ void addHTTPSSocket(Section& section, const Environment& environment, bool isNee
 
 UploadConfiguration UploadConfiguration::read(const platform::Paths& paths) {
     RecordingLog log;
-    platform::LinuxPropertyLists propertyLists;
+    platform::PropertyListCodec propertyLists;
     platform::LinuxConfigurationResource resources(paths, propertyLists, log);
     platform::LinuxUserDefaults defaults(paths, propertyLists, log);
     UploadConfiguration configuration{.analytics =

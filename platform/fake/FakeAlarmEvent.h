@@ -3,8 +3,8 @@
 #include "platform/Clock.h"
 #include "platform/EventStream.h"
 #include "platform/fake/FakeAlarmStore.h"
-#include "platform/shared/AlarmRegistrations.h"
-#include "platform/shared/EventQueue.h"
+#include "platform/host/AlarmRegistrations.h"
+#include "platform/host/EventQueue.h"
 
 #include <optional>
 #include <string_view>

@@ -5,7 +5,7 @@
 #include "platform/fake/FakeClock.h"
 #include "platform/fake/FakeEventStream.h"
 #include "platform/fake/FakeMainRunLoop.h"
-#include "platform/shared/EventQueue.h"
+#include "platform/host/EventQueue.h"
 
 #include <string>
 #include <string_view>

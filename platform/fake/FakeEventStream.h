@@ -1,7 +1,7 @@
 #pragma once
 
 #include "platform/EventStream.h"
-#include "platform/shared/EventQueue.h"
+#include "platform/host/EventQueue.h"
 
 #include <functional>
 #include <string_view>

@@ -1,8 +1,7 @@
 #include "platform/fake/FakeFormats.h"
 
-#include "platform/shared/BinaryPropertyList.h"
-#include "platform/shared/JSONReader.h"
-#include "platform/shared/JSONWriter.h"
+#include "platform/formats/JSONCodec.h"
+#include "platform/formats/PropertyListCodec.h"
 
 #include <cstdio>
 #include <cstdlib>

@@ -1,8 +1,8 @@
 #include "platform/fake/FakeHTTPSessions.h"
 
 #include "base/Concat.h"
-#include "platform/shared/Challenges.h"
-#include "platform/shared/HTTPRequestCheck.h"
+#include "platform/host/Challenges.h"
+#include "platform/host/HTTPRequestCheck.h"
 
 #include <string>
 #include <string_view>

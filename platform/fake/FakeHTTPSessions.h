@@ -1,7 +1,7 @@
 #pragma once
 
 #include "platform/HTTPSession.h"
-#include "platform/shared/RequestThreads.h"
+#include "platform/host/RequestThreads.h"
 
 #include <condition_variable>
 #include <cstddef>

@@ -4,7 +4,7 @@
 #include "platform/ProcessTransaction.h"
 #include "platform/fake/FakeAlarmEvent.h"
 #include "platform/fake/FakeClock.h"
-#include "platform/shared/EventQueue.h"
+#include "platform/host/EventQueue.h"
 
 #include <cstddef>
 #include <functional>

@@ -1,6 +1,6 @@
 #include "platform/fake/FakeSerialQueues.h"
 
-#include "platform/shared/SerialQueueOfOne.h"
+#include "platform/host/SerialQueueOfOne.h"
 
 namespace platform {
 

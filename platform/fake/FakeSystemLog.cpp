@@ -1,6 +1,6 @@
 #include "platform/fake/FakeSystemLog.h"
 
-#include "platform/shared/LogText.h"
+#include "platform/host/LogText.h"
 
 #include <algorithm>
 #include <iterator>

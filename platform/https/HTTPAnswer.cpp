@@ -1,7 +1,7 @@
 #include "platform/https/HTTPAnswer.h"
 
 #include "base/Concat.h"
-#include "platform/shared/HTTPRequestCheck.h"
+#include "platform/host/HTTPRequestCheck.h"
 
 namespace platform {
 

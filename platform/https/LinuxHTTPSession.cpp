@@ -1,6 +1,6 @@
 #include "platform/https/LinuxHTTPSession.h"
 
-#include "platform/shared/HTTPRequestCheck.h"
+#include "platform/host/HTTPRequestCheck.h"
 
 #include <utility>
 

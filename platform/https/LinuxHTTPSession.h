@@ -1,8 +1,8 @@
 #pragma once
 
 #include "platform/HTTPSession.h"
+#include "platform/host/RequestThreads.h"
 #include "platform/https/HTTPTransfer.h"
-#include "platform/shared/RequestThreads.h"
 
 #include <map>
 #include <memory>

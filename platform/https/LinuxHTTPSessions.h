@@ -1,7 +1,7 @@
 #pragma once
 
 #include "platform/HTTPSession.h"
-#include "platform/shared/HTTPLimits.h"
+#include "platform/host/HTTPLimits.h"
 
 #include <cstddef>
 #include <map>

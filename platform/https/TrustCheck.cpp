@@ -1,8 +1,8 @@
 #include "platform/https/TrustCheck.h"
 
 #include "base/Concat.h"
+#include "platform/host/Challenges.h"
 #include "platform/https/CertificateTrust.h"
-#include "platform/shared/Challenges.h"
 
 #include <filesystem>
 #include <openssl/err.h>

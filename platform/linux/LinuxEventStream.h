@@ -2,8 +2,8 @@
 
 #include "platform/EventStream.h"
 #include "platform/SystemLog.h"
+#include "platform/host/EventQueue.h"
 #include "platform/linux/LinuxRunLoop.h"
-#include "platform/shared/EventQueue.h"
 
 #include <functional>
 #include <memory>

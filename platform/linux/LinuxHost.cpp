@@ -1,6 +1,9 @@
 #include "platform/linux/LinuxHost.h"
 
 #include "base/Concat.h"
+#include "platform/formats/JSONCodec.h"
+#include "platform/formats/PropertyListCodec.h"
+#include "platform/host/SerialQueueOfOne.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/IdleExit.h"
 #include "platform/linux/LinuxClock.h"
@@ -11,7 +14,6 @@
 #include "platform/linux/LinuxKernelChannel.h"
 #include "platform/linux/LinuxManagedSettings.h"
 #include "platform/linux/LinuxProcessTransactions.h"
-#include "platform/linux/LinuxPropertyLists.h"
 #include "platform/linux/LinuxRunLoop.h"
 #include "platform/linux/LinuxServiceRegistry.h"
 #include "platform/linux/LinuxSystemLog.h"
@@ -22,8 +24,6 @@
 #include "platform/linux/alarms/HelpedAlarmWaker.h"
 #include "platform/linux/alarms/LinuxAlarm.h"
 #include "platform/linux/alarms/TimerAlarmWaker.h"
-#include "platform/shared/JSONCodec.h"
-#include "platform/shared/SerialQueueOfOne.h"
 
 #include <systemd/sd-daemon.h>
 
@@ -126,7 +126,7 @@ struct LinuxHost::Parts {
     LinuxFiles files;
     LinuxManagedSettings settings;
     LinuxClock clock;
-    LinuxPropertyLists propertyLists;
+    PropertyListCodec propertyLists;
     LinuxUserDefaults defaults;
     LinuxConfigurationResource resources;
     LinuxSystemVersion version;

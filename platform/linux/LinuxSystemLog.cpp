@@ -2,8 +2,8 @@
 
 #include "base/FileDescriptor.h"
 #include "base/UnixAddress.h"
-#include "platform/shared/LogText.h"
-#include "platform/shared/MessageClasses.h"
+#include "platform/host/LogText.h"
+#include "platform/host/MessageClasses.h"
 
 #include <algorithm>
 #include <array>

@@ -2,9 +2,9 @@
 
 #include "base/Concat.h"
 #include "base/Saturate.h"
+#include "platform/host/Challenges.h"
+#include "platform/host/HTTPRequestCheck.h"
 #include "platform/linux/AsBytes.h"
-#include "platform/shared/Challenges.h"
-#include "platform/shared/HTTPRequestCheck.h"
 
 #include <algorithm>
 #include <cstdint>

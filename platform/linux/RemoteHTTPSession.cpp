@@ -1,7 +1,7 @@
 #include "platform/linux/RemoteHTTPSession.h"
 
+#include "platform/host/HTTPRequestCheck.h"
 #include "platform/linux/HTTPSClient.h"
-#include "platform/shared/HTTPRequestCheck.h"
 
 namespace platform {
 

@@ -1,8 +1,8 @@
 #pragma once
 
 #include "platform/HTTPSession.h"
+#include "platform/host/RequestThreads.h"
 #include "platform/linux/RemoteHTTPExchange.h"
-#include "platform/shared/RequestThreads.h"
 
 #include <utility>
 

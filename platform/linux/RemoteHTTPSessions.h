@@ -1,8 +1,8 @@
 #pragma once
 
 #include "platform/HTTPSession.h"
+#include "platform/host/HTTPLimits.h"
 #include "platform/linux/StopRequest.h"
-#include "platform/shared/HTTPLimits.h"
 
 #include <chrono>
 #include <map>

@@ -19,7 +19,8 @@ namespace fs = std::filesystem;
 constexpr const char* kPublicHeaders = "public headers";
 
 /// Rooms by their folder; a folder inside a room may be one of its own.
-const std::vector<std::string> kRooms = {"platform/shared",
+const std::vector<std::string> kRooms = {"platform/formats",
+                                         "platform/host",
                                          "platform/https",
                                          "platform/linux",
                                          "platform/fake",

@@ -6,7 +6,7 @@
 #include "kstctl/Forms.h"
 #include "kstctl/database/EventText.h"
 #include "kstctl/database/UploadDate.h"
-#include "platform/linux/LinuxPropertyLists.h"
+#include "platform/formats/PropertyListCodec.h"
 #include "tests/kstd/Analytics/SQLite/OtherConnection.h"
 #include "tests/kstd/Analytics/SQLite/SmallDisk.h"
 #include "tests/support/ChildProcess.h"
@@ -434,7 +434,7 @@ TEST_F(EventDatabaseTest, OneEventOrNoneAtAll) {
 }
 
 TEST(EventTextTest, EventsAsTheyAreShown) {
-    platform::LinuxPropertyLists propertyLists;
+    platform::PropertyListCodec propertyLists;
     const platform::ValueMap attributes = {
         {"bytes", platform::Bytes{1, 0xff}},
         {"date", platform::Timestamp{0.5}},
@@ -458,7 +458,7 @@ TEST(EventTextTest, EventsAsTheyAreShown) {
 }
 
 TEST(EventTextTest, RowsWithoutAnEvent) {
-    platform::LinuxPropertyLists propertyLists;
+    platform::PropertyListCodec propertyLists;
     const auto list = propertyLists.binary(platform::ValueList()).value();
     for (const std::optional<platform::Bytes>& data :
          {std::optional<platform::Bytes>(), std::optional(platform::Bytes()),

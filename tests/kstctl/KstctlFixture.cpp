@@ -1,7 +1,7 @@
 #include "tests/kstctl/KstctlFixture.h"
 
 #include "base/Concat.h"
-#include "platform/shared/JSONReader.h"
+#include "platform/formats/JSONCodec.h"
 
 #include <algorithm>
 #include <filesystem>

@@ -1,7 +1,7 @@
 #include "kstctl/status/LastUpload.h"
 
 #include "kstd/MessageIds.h"
-#include "platform/shared/MessageClasses.h"
+#include "platform/host/MessageClasses.h"
 
 #include <gtest/gtest.h>
 

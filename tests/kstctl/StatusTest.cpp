@@ -4,7 +4,7 @@
 #include "base/Concat.h"
 #include "base/FileDescriptor.h"
 #include "base/UnixAddress.h"
-#include "platform/shared/BinaryPropertyList.h"
+#include "platform/formats/PropertyListCodec.h"
 #include "tests/kstctl/KstctlFixture.h"
 
 #include <cerrno>

@@ -5,6 +5,8 @@
 #include "base/UnixAddress.h"
 #include "kstd/Analytics/AnalyticsConfiguration.h"
 #include "kstd/Daemon.h"
+#include "platform/formats/PropertyListCodec.h"
+#include "platform/host/MessageClasses.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/KernelSocketConnection.h"
 #include "platform/linux/LinuxConfigurationResource.h"
@@ -12,14 +14,12 @@
 #include "platform/linux/LinuxFiles.h"
 #include "platform/linux/LinuxHost.h"
 #include "platform/linux/LinuxManagedSettings.h"
-#include "platform/linux/LinuxPropertyLists.h"
 #include "platform/linux/LinuxServiceRegistry.h"
 #include "platform/linux/LinuxUserDefaults.h"
 #include "platform/linux/SettingsWatch.h"
 #include "platform/linux/alarms/AlarmStore.h"
 #include "platform/linux/alarms/HelpedAlarmWaker.h"
 #include "platform/linux/alarms/TimerAlarmWaker.h"
-#include "platform/shared/MessageClasses.h"
 #include "tests/kstd/Analytics/LoggerFixture.h"
 #include "tests/kstd/DaemonFixture.h"
 #include "tests/platform/linux/RootDirectory.h"
@@ -371,7 +371,7 @@ Texts settingsThatAreNotWatched() {
 Texts configurationThatIsNotUsed() {
     const support::RootDirectory root;
     platform::FakeSystemLog log;
-    platform::LinuxPropertyLists propertyLists;
+    platform::PropertyListCodec propertyLists;
     for (const char* const directory : {"/etc/kstd", "/usr/share/c"}) {
         root.makeDirectory(directory);
         root.put(std::string(directory) + "/d.plist", "no property list");

@@ -1,10 +1,10 @@
 #pragma once
 
 #include "platform/EventStream.h"
+#include "platform/host/AlarmRegistrations.h"
 #include "platform/linux/LinuxEventStream.h"
 #include "platform/linux/alarms/AlarmStore.h"
 #include "platform/linux/alarms/AlarmWaker.h"
-#include "platform/shared/AlarmRegistrations.h"
 
 #include <cstdint>
 #include <map>

@@ -1,7 +1,7 @@
 #include "platform/fake/FakeSystemLog.h"
+#include "platform/formats/PropertyListCodec.h"
 #include "platform/linux/LinuxConfigurationResource.h"
 #include "platform/linux/LinuxInternalDiagnostics.h"
-#include "platform/linux/LinuxPropertyLists.h"
 #include "platform/linux/LinuxSystemVersion.h"
 #include "platform/linux/LinuxUserDefaults.h"
 #include "tests/platform/contract/ConfigurationContract.h"
@@ -27,7 +27,7 @@ class LinuxUserDefaultsFixture final : public UserDefaultsFixture {
   private:
     support::RootDirectory root_;
     platform::FakeSystemLog log_;
-    platform::LinuxPropertyLists propertyLists_;
+    platform::PropertyListCodec propertyLists_;
     platform::LinuxUserDefaults defaults_{root_.paths(), propertyLists_, log_};
 };
 
@@ -53,7 +53,7 @@ class LinuxConfigurationResourceFixture final : public ConfigurationResourceFixt
   private:
     support::RootDirectory root_;
     platform::FakeSystemLog log_;
-    platform::LinuxPropertyLists propertyLists_;
+    platform::PropertyListCodec propertyLists_;
     platform::LinuxConfigurationResource resources_{root_.paths(), propertyLists_, log_};
 };
 

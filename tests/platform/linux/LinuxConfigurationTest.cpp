@@ -1,9 +1,9 @@
 // User defaults, configuration resources and internal diagnostics as files.
 
 #include "platform/fake/FakeSystemLog.h"
+#include "platform/formats/PropertyListCodec.h"
 #include "platform/linux/LinuxConfigurationResource.h"
 #include "platform/linux/LinuxInternalDiagnostics.h"
-#include "platform/linux/LinuxPropertyLists.h"
 #include "platform/linux/LinuxUserDefaults.h"
 #include "tests/platform/linux/OpenDescriptors.h"
 #include "tests/platform/linux/RootDirectory.h"
@@ -70,7 +70,7 @@ class LinuxConfigurationTest : public testing::Test {
 
     support::RootDirectory root_;
     platform::FakeSystemLog log_;
-    platform::LinuxPropertyLists propertyLists_;
+    platform::PropertyListCodec propertyLists_;
     platform::LinuxUserDefaults defaults_{root_.paths(), propertyLists_, log_};
     platform::LinuxConfigurationResource resources_{root_.paths(), propertyLists_, log_};
 };

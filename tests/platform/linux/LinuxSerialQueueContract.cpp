@@ -1,4 +1,4 @@
-#include "platform/shared/SerialQueueOfOne.h"
+#include "platform/host/SerialQueueOfOne.h"
 #include "tests/platform/contract/SerialQueueContract.h"
 
 namespace contract {

@@ -2,7 +2,7 @@
 // text is a frame: its length as four bytes, least significant first, and so many bytes. A frame
 // without bytes answers a text that is no JSON.
 
-#include "platform/shared/JSONCodec.h"
+#include "platform/formats/JSONCodec.h"
 
 #include <array>
 #include <cstdint>

@@ -5,7 +5,7 @@
 
 #include "base/Concat.h"
 #include "platform/ValueBuilder.h"
-#include "platform/shared/BinaryPropertyList.h"
+#include "platform/formats/PropertyListCodec.h"
 
 #include <bit>
 #include <cstdio>

@@ -1,0 +1,86 @@
+#pragma once
+
+#include "base/ByteReader.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <span>
+
+/// The numbers of the binary form that both its writer and its reader need, and how objects are
+/// found in a file; PropertyListCodec.h describes the form. The file may hold anything; every
+/// length is compared with what is left.
+namespace platform::binary_property_list {
+
+/// The high half of a marker byte.
+enum class Kind : std::uint8_t {
+    boolean = 0x0,
+    integer = 0x1,
+    real = 0x2,
+    date = 0x3,
+    bytes = 0x4,
+    asciiText = 0x5,
+    utf16Text = 0x6,
+    list = 0xa,
+    map = 0xd,
+};
+
+[[nodiscard]] constexpr std::uint8_t marker(Kind kind, std::uint8_t low) {
+    return static_cast<std::uint8_t>((static_cast<unsigned>(kind) << 4U) | low);
+}
+
+[[nodiscard]] constexpr Kind kindOf(std::uint8_t marker) {
+    return static_cast<Kind>(marker >> 4U);
+}
+
+inline constexpr std::uint8_t kFalse = marker(Kind::boolean, 8);
+inline constexpr std::uint8_t kTrue = marker(Kind::boolean, 9);
+inline constexpr std::uint8_t kFloat = marker(Kind::real, 2);
+inline constexpr std::uint8_t kDouble = marker(Kind::real, 3);
+inline constexpr std::uint8_t kDate = marker(Kind::date, 3);
+
+/// The low half of a marker behind which the count follows.
+inline constexpr std::uint8_t kCountFollows = 0xf;
+
+inline constexpr std::size_t kMagicSize = 8;
+inline constexpr std::size_t kUnusedTrailerSize = 6;
+inline constexpr std::size_t kTrailerSize = kUnusedTrailerSize + 2 + 3 * sizeof(std::uint64_t);
+
+using Span = std::span<const std::uint8_t>;
+
+/// Reads a number that has its high byte first, of at most 8 bytes.
+[[nodiscard]] bool readNumber(base::ByteReader& reader, std::size_t width, std::uint64_t& number);
+
+/// Reads the content of an object that has a count, in its marker or behind it: so many elements of
+/// `width` bytes.
+[[nodiscard]] bool readElements(std::uint8_t marker, base::ByteReader& reader, std::size_t width,
+                                Span& elements);
+
+/// The objects of a file, which must outlive it.
+class ObjectTable {
+  public:
+    /// False when the file is none or its tables do not fit into it.
+    [[nodiscard]] bool open(Span file);
+
+    /// The number of the object that is the whole value.
+    [[nodiscard]] std::uint64_t top() const { return top_; }
+
+    [[nodiscard]] std::size_t referenceWidth() const { return referenceWidth_; }
+
+    /// The object that the `index`-th of the references is to; there must be so many.
+    [[nodiscard]] std::uint64_t reference(Span references, std::size_t index) const;
+
+    /// Gives the object's marker, and in `reader` all that stands behind it in the object table.
+    [[nodiscard]] bool find(std::uint64_t object, std::uint8_t& marker,
+                            base::ByteReader& reader) const;
+
+  private:
+    /// All that stands before the offset table.
+    Span objects_;
+    Span offsets_;
+    std::uint64_t count_ = 0;
+    std::uint64_t top_ = 0;
+    std::size_t offsetWidth_ = 0;
+    std::size_t referenceWidth_ = 0;
+};
+
+} // namespace platform::binary_property_list
