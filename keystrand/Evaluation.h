@@ -51,7 +51,7 @@ struct Missing {
                                                              const Situation& situation);
 
 /// The requirement tree that a client is told, on the wire: what is missing, each node with its
-/// state and its priority. The data of the leaves are described in docs/keystrand-sim.md.
+/// state and its priority. The data of the leaves are described in docs/client-guide.md.
 [[nodiscard]] std::vector<std::uint8_t> encodeMissing(const Missing& missing);
 
 } // namespace keystrand
