@@ -83,7 +83,7 @@ Simulator::Simulator(const Settings& settings, const Paths& paths, PolicyTable p
       clock_(settings.clock),
       publisher_(kernel_.registry, events_),
       restrictedMode_(settings.periods, clock_, kernel_.registry, publisher_),
-      kernelControls_(makeKernelControls(restrictedMode_, kernel_.registry)),
+      kernelControls_(makeKernelControls(restrictedMode_)),
       commands_(makeCommands(
           kernel_, [this] { return clock_.now(); }, kernelControls_)),
       handler_({.registry = kernel_.registry, .commands = commands_, .logLevel = kernel_.logLevel},
@@ -104,7 +104,11 @@ Simulator::Simulator(const Settings& settings, const Paths& paths, PolicyTable p
     kernel_.policies = std::move(policies);
     kernel_.logLevel = settings.logLevel;
     restrictedMode_.setQuiet(settings.quiet);
-    restrictedMode_.setRearm([this] { armDeadline(); });
+    RestrictedModeController::Hooks hooks;
+    hooks.rearm = [this] {
+        armDeadline();
+    };
+    restrictedMode_.setHooks(std::move(hooks));
 }
 
 bool Simulator::run() {
@@ -117,7 +121,7 @@ void Simulator::armDeadline() {
         return;
     }
     // A deadline that the system's clock cannot express never comes.
-    const std::uint64_t seconds = restrictedMode_.timer().nextDeadline();
+    const std::uint64_t seconds = restrictedMode_.nextDeadline();
     if (seconds > RestrictedModeTimer::kLatestTime / kMicrosecondsPerSecond) {
         deadline_.disable();
         return;

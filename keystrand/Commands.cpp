@@ -46,13 +46,8 @@ CommandResult kernelControl(const DispatchTable& controls, Payload payload) {
 
 } // namespace
 
-DispatchTable makeCommands(KernelState& kernel, const Now& now,
-                           const DispatchTable& kernelControls) {
+DispatchTable makeServiceCommands(KernelState& kernel, const DispatchTable& kernelControls) {
     DispatchTable table;
-    addContextCommands(table, kernel);
-    addCredentialCommands(table, kernel, now);
-    addPolicyCommands(table, kernel, now);
-    addAccessListCommand(table, kernel);
     table.add(kKSTCommandSetEnvironmentVariable,
               {.min = kNumberSize, .max = kNumberSize + kKSTEnvironmentVariableMaxSize},
               [&](Payload payload) { return setVariable(kernel.environment, payload); });
@@ -61,6 +56,16 @@ DispatchTable makeCommands(KernelState& kernel, const Now& now,
     table.add(kKSTCommandKernelControl,
               {.min = kNumberSize, .max = kNumberSize + kKSTKernelControlMaxSize},
               [&](Payload payload) { return kernelControl(kernelControls, payload); });
+    return table;
+}
+
+DispatchTable makeCommands(KernelState& kernel, const Now& now,
+                           const DispatchTable& kernelControls) {
+    DispatchTable table = makeServiceCommands(kernel, kernelControls);
+    addContextCommands(table, kernel);
+    addCredentialCommands(table, kernel, now);
+    addPolicyCommands(table, kernel, now);
+    addAccessListCommand(table, kernel);
     return table;
 }
 

@@ -15,9 +15,14 @@ namespace keystrand {
 /// The time in seconds, which ages are counted in.
 using Now = std::function<CredentialSet::Seconds()>;
 
-/// The commands of a frame. The table refers to the state and to the controls.
+/// All commands of a frame. The table refers to the state and to the controls.
 [[nodiscard]] DispatchTable makeCommands(KernelState& kernel, const Now& now,
                                          const DispatchTable& kernelControls);
+
+/// The commands of a kernel side that keeps no credentials: environment variables and kernel
+/// control. Those of contexts, credentials and policies are answered like any unknown one.
+[[nodiscard]] DispatchTable makeServiceCommands(KernelState& kernel,
+                                                const DispatchTable& kernelControls);
 
 /// The groups of commands, a file of source for each.
 void addContextCommands(DispatchTable& table, KernelState& kernel);

@@ -59,18 +59,18 @@ std::optional<std::string_view> zeroFilledName(Payload payload) {
     return name;
 }
 
-CommandResult acknowledge(Registry& registry, Payload payload) {
+CommandResult acknowledge(RestrictedModeController& restrictedMode, Payload payload) {
     const auto name = zeroFilledName(payload);
     if (!name) {
         return refuse();
     }
-    registry.acknowledge(*name);
+    restrictedMode.acknowledge(*name);
     return {};
 }
 
 } // namespace
 
-DispatchTable makeKernelControls(RestrictedModeController& restrictedMode, Registry& registry) {
+DispatchTable makeKernelControls(RestrictedModeController& restrictedMode) {
     DispatchTable table;
     table.add(kKSTKernelControlRMDaemonStarted, exactly(kDaemonStartedPayloadSize),
               [&](Payload payload) { return daemonStarted(restrictedMode, payload); });
@@ -82,7 +82,7 @@ DispatchTable makeKernelControls(RestrictedModeController& restrictedMode, Regis
                   return CommandResult{};
               });
     table.add(kKSTKernelControlRMNotificationAck, exactly(kNotificationAckPayloadSize),
-              [&](Payload payload) { return acknowledge(registry, payload); });
+              [&](Payload payload) { return acknowledge(restrictedMode, payload); });
     return table;
 }
 

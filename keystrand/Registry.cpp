@@ -78,17 +78,18 @@ std::optional<std::vector<std::uint8_t>> Registry::copy(std::string_view name) {
     return property.value;
 }
 
-bool Registry::acknowledge(std::string_view name) {
+std::optional<Registry::Record> Registry::acknowledge(std::string_view name) {
     const auto found = acknowledgedProperty(name);
     if (found == properties_.end()) {
-        return false;
+        return std::nullopt;
     }
     const Property& property = found->second;
     if (property.announcements > 0 || property.handedOut != property.generation) {
-        return false;
+        return std::nullopt;
     }
+    Record dropped{.name = found->first, .generation = property.generation};
     properties_.erase(found);
-    return true;
+    return dropped;
 }
 
 Registry::Properties::iterator Registry::acknowledgedProperty(std::string_view name) {

@@ -68,8 +68,8 @@ class Registry {
     /// Drops the property when its present generation is the one last handed out and no
     /// announcement is left to answer: an event that is still on its way finds its record.
     /// An acknowledged name is cut at 64 bytes: such a name also stands for a longer property, the
-    /// one copied most recently among several. True when a property was dropped.
-    bool acknowledge(std::string_view name);
+    /// one copied most recently among several. None when nothing was dropped.
+    std::optional<Record> acknowledge(std::string_view name);
 
     [[nodiscard]] std::size_t count() const { return properties_.size(); }
 

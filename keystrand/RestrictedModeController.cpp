@@ -1,5 +1,6 @@
 #include "keystrand/RestrictedModeController.h"
 
+#include <algorithm>
 #include <utility>
 
 namespace keystrand {
@@ -13,16 +14,23 @@ bool isNews(const Bytes& handedBack, const std::optional<Bytes>& lastPublished,
     return handedBack != lastPublished && registry.find(property) == nullptr;
 }
 
+template <typename Hook, typename... Arguments>
+void call(const Hook& hook, const Arguments&... arguments) {
+    if (hook) {
+        hook(arguments...);
+    }
+}
+
 } // namespace
 
 RestrictedModeController::RestrictedModeController(RestrictedModeTimer::Periods periods,
-                                                   const Clock& clock, const Registry& registry,
+                                                   const Clock& clock, Registry& registry,
                                                    NotificationPublisher& publisher)
     : clock_(clock), timer_(periods, clock.now()), registry_(registry), publisher_(publisher) {}
 
-void RestrictedModeController::setRearm(Rearm rearm) {
-    rearm_ = std::move(rearm);
-    rearm_();
+void RestrictedModeController::setHooks(Hooks hooks) {
+    hooks_ = std::move(hooks);
+    call(hooks_.rearm);
 }
 
 void RestrictedModeController::lock() {
@@ -56,9 +64,14 @@ std::function<void()> RestrictedModeController::daemonStarted(bool allowed,
     // What is published from here on has its event already.
     auto unacknowledged = publisher_.unacknowledged();
     takeUp(allowed, state);
+    call(hooks_.daemonStarted, allowed, state);
     return [this, unacknowledged = std::move(unacknowledged)] {
         publisher_.postAgain(unacknowledged);
+        for (const Record& record : unacknowledged) {
+            awaitAcknowledgement(record.name);
+        }
         announceAlarmAgain();
+        call(hooks_.rearm);
     };
 }
 
@@ -86,17 +99,69 @@ void RestrictedModeController::restoreAnalytics(const AnalyticsBytes& blob) {
     }
 }
 
+void RestrictedModeController::acknowledge(std::string_view name) {
+    const auto dropped = registry_.acknowledge(name);
+    if (!dropped) {
+        return;
+    }
+    awaited_.erase(dropped->name);
+    call(hooks_.acknowledged, *dropped);
+    call(hooks_.rearm);
+}
+
 void RestrictedModeController::catchUp() {
+    tellWhatIsUnacknowledged();
     publish(timer_.advance(clock_.now()));
 }
 
+RestrictedModeController::Seconds RestrictedModeController::nextDeadline() const {
+    Seconds next = timer_.nextDeadline();
+    for (const auto& [property, awaited] : awaited_) {
+        next = std::min(next, awaited.until);
+    }
+    return next;
+}
+
 void RestrictedModeController::publish(const RestrictedModeTimer::Notifications& notifications) {
+    // Whoever reads a record that restricted mode has begun finds it in force.
+    if (timer_.restricted() != toldRestricted_) {
+        toldRestricted_ = timer_.restricted();
+        call(hooks_.restrictedModeChanged, toldRestricted_);
+    }
     if (!quiet_) {
         for (const Notification& notification : notifications) {
             publisher_.publish(notification);
+            awaitAcknowledgement(wire::rm::findNotificationKind(notification.type)->property);
         }
     }
-    rearm_();
+    call(hooks_.rearm);
+}
+
+void RestrictedModeController::awaitAcknowledgement(const std::string& property) {
+    const Registry::Property* record = registry_.find(property);
+    if (record == nullptr || hooks_.patience == kForever) {
+        return;
+    }
+    const Seconds now = clock_.now();
+    const Seconds until = hooks_.patience < kForever - now ? now + hooks_.patience : kForever;
+    awaited_.insert_or_assign(property, Awaited{.generation = record->generation, .until = until});
+}
+
+void RestrictedModeController::tellWhatIsUnacknowledged() {
+    const Seconds now = clock_.now();
+    for (auto it = awaited_.begin(); it != awaited_.end();) {
+        if (it->second.until > now) {
+            ++it;
+            continue;
+        }
+        const auto waited = awaited_.extract(it++);
+        const Record record{.name = waited.key(), .generation = waited.mapped().generation};
+        // What was put in its place by others than the model is not waited for.
+        const Registry::Property* present = registry_.find(record.name);
+        if (present != nullptr && present->generation == record.generation) {
+            call(hooks_.unacknowledged, record);
+        }
+    }
 }
 
 void RestrictedModeController::setPolicy(const RestrictedModePolicy& policy) {

@@ -6,6 +6,12 @@
 #include "keystrand/RestrictedModeTimer.h"
 
 #include <functional>
+#include <limits>
+#include <map>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
 
 namespace keystrand {
 
@@ -14,13 +20,32 @@ namespace keystrand {
 class RestrictedModeController {
   public:
     using Seconds = RestrictedModeTimer::Seconds;
-    /// Called whenever the next deadline or the clock may have changed.
-    using Rearm = std::function<void()>;
+    using Record = Registry::Record;
+    static constexpr Seconds kForever = std::numeric_limits<Seconds>::max();
+
+    /// What the program wants to be told; null for nothing. None of them changes the model.
+    struct Hooks {
+        /// The next deadline or the clock may have changed.
+        std::function<void()> rearm = nullptr;
+        /// Restricted mode was entered or left; no record says so yet. A stay that begins and ends
+        /// in one step is none.
+        std::function<void(bool restricted)> restrictedModeChanged = nullptr;
+        /// A daemon has started and handed back what it kept. The model has taken up what of it is
+        /// news, and the daemon has no reply yet.
+        std::function<void(bool allowed, const StateBytes& state)> daemonStarted = nullptr;
+        /// A record was acknowledged and is gone.
+        std::function<void(const Record& record)> acknowledged = nullptr;
+        /// A record of the model has waited for `patience` seconds since it was published, or since
+        /// a daemon that started was told again. Once for each time.
+        std::function<void(const Record& record)> unacknowledged = nullptr;
+        Seconds patience = kForever;
+    };
 
     RestrictedModeController(RestrictedModeTimer::Periods periods, const Clock& clock,
-                             const Registry& registry, NotificationPublisher& publisher);
+                             Registry& registry, NotificationPublisher& publisher);
 
-    void setRearm(Rearm rearm);
+    /// Calls the new `rearm`, and no other of them.
+    void setHooks(Hooks hooks);
 
     void lock();
     void unlock();
@@ -41,8 +66,13 @@ class RestrictedModeController {
     [[nodiscard]] std::function<void()> daemonStarted(bool allowed, const StateBytes& state);
     void restoreAnalytics(const AnalyticsBytes& blob);
 
+    /// Drops the record that the name stands for if it was read; nothing otherwise.
+    void acknowledge(std::string_view name);
+
     /// Does what became due on the clock, each thing at its own time.
     void catchUp();
+    /// The next time on the clock at which `catchUp` does something.
+    [[nodiscard]] Seconds nextDeadline() const;
 
     [[nodiscard]] const RestrictedModeTimer& timer() const { return timer_; }
 
@@ -51,14 +81,24 @@ class RestrictedModeController {
     void announceAlarmAgain();
     void publish(const RestrictedModeTimer::Notifications& notifications);
     void setPolicy(const RestrictedModePolicy& policy);
+    void awaitAcknowledgement(const std::string& property);
+    void tellWhatIsUnacknowledged();
+
+    /// A record whose acknowledgement is waited for.
+    struct Awaited {
+        std::uint64_t generation = 0;
+        Seconds until = 0;
+    };
 
     const Clock& clock_;
     RestrictedModeTimer timer_;
-    const Registry& registry_;
+    Registry& registry_;
     NotificationPublisher& publisher_;
     bool quiet_ = false;
-    Rearm rearm_ = [] {
-    };
+    Hooks hooks_;
+    bool toldRestricted_ = false;
+    /// By their properties.
+    std::map<std::string, Awaited> awaited_;
 };
 
 } // namespace keystrand

@@ -33,7 +33,7 @@ RestrictedModeTimer::Notifications RestrictedModeTimer::lock(Seconds now) {
     locked_ = true;
     standardModeStart_ = now;
     endedStays_ = 0;
-    announce(notifications);
+    settle(now, notifications);
     return notifications;
 }
 

@@ -33,9 +33,10 @@ class RestrictedModeTimer {
     /// More analytics periods than this that end in one step are collected as one long period.
     static constexpr Seconds kMaxPeriodsAtOnce = 1000;
 
-    /// Both at least 1 second.
     struct Periods {
+        /// With 0 a device that is locked is in restricted mode at once.
         std::uint32_t untilRestricted = 3600;
+        /// At least 1 second.
         std::uint32_t analytics = 86400;
     };
 

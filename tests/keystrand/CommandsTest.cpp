@@ -36,7 +36,7 @@ class CommandsTest : public testing::Test {
     SetClock clock_{1000};
     NotificationPublisher publisher_{registry_, poster_};
     RestrictedModeController restrictedMode_{{}, clock_, registry_, publisher_};
-    DispatchTable controls_ = makeKernelControls(restrictedMode_, registry_);
+    DispatchTable controls_ = makeKernelControls(restrictedMode_);
     DispatchTable commands_ = makeCommands(
         kernel_, [] { return CredentialSet::Seconds{1000}; }, controls_);
 };
@@ -85,6 +85,20 @@ TEST_F(CommandsTest, EveryCommandOfTheTableIsAnsweredAndNoOtherButTheContextsPro
             wire::findCommandKind(code) != nullptr || code == kGetProperty || code == kSetProperty;
         EXPECT_EQ(run(code, Payload(5000)) != kKernelUnknownCommand, known) << code;
     }
+}
+
+TEST_F(CommandsTest, WithoutCredentialsOnlyVariablesAndKernelControlAreAnswered) {
+    const DispatchTable service = makeServiceCommands(kernel_, controls_);
+    for (std::uint32_t code = 0; code < 256; ++code) {
+        const bool known = code == 24 || code == 25 || code == 26;
+        for (const std::size_t size : {0U, 5000U}) {
+            EXPECT_EQ(service.run(code, Payload(size)).status != -6006, known) << code;
+        }
+    }
+    ASSERT_EQ(service.run(24, Bytes().u32(5).u8(7).get()).status, 0);
+    EXPECT_EQ(service.run(25, Bytes().u32(5).get()).output, Payload{7});
+    EXPECT_EQ(service.run(26, Bytes().u32(5).u8(0).get()).status, 0);
+    EXPECT_FALSE(restrictedMode_.timer().policy().allowed);
 }
 
 TEST_F(CommandsTest, UnknownCommands) {

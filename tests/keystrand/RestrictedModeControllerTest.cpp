@@ -225,13 +225,188 @@ TEST_F(RestrictedModeControllerTest, ClockSetBackFiresNothing) {
 
 TEST_F(RestrictedModeControllerTest, RearmsOnEveryChangeOfTheDeadline) {
     std::vector<std::uint64_t> deadlines;
-    controller_.setRearm([&] { deadlines.push_back(controller_.timer().nextDeadline()); });
+    RestrictedModeController::Hooks hooks;
+    hooks.rearm = [&] {
+        deadlines.push_back(controller_.nextDeadline());
+    };
+    controller_.setHooks(hooks);
     controller_.lock();
     controller_.setBootArg(true);
     controller_.setBootArg(false);
     controller_.unlock();
     EXPECT_THAT(deadlines, ElementsAre(kStart + 86400, kStart + 100, kStart + 86400, kStart + 100,
                                        kStart + 86400));
+}
+
+/// What the hooks were told, in words, and what the records said then.
+class HooksTest : public RestrictedModeControllerTest {
+  protected:
+    using Seconds = RestrictedModeController::Seconds;
+    static constexpr Seconds kPatience = 30;
+
+    void listen(Seconds patience = kPatience) {
+        RestrictedModeController::Hooks hooks;
+        hooks.restrictedModeChanged = [this](bool restricted) {
+            told_.push_back(restricted ? "restricted" : "open");
+            publishedBefore_ = publisher_.publishedCount();
+        };
+        hooks.daemonStarted = [this](bool allowed, const StateBytes& state) {
+            told_.push_back(allowed ? "daemon, allowed" : "daemon, not allowed");
+            handedBack_ = state;
+        };
+        hooks.acknowledged = [this](const Registry::Record& record) {
+            told_.push_back("acknowledged " + record.name);
+        };
+        hooks.unacknowledged = [this](const Registry::Record& record) {
+            told_.push_back("waits " + record.name);
+        };
+        hooks.patience = patience;
+        controller_.setHooks(hooks);
+    }
+    /// The daemon reads a property and acknowledges it.
+    void daemonHandles(const char* property) {
+        static_cast<void>(registry_.copy(property));
+        controller_.acknowledge(property);
+    }
+
+    std::vector<std::string> told_;
+    std::uint64_t publishedBefore_ = 0;
+    StateBytes handedBack_{};
+};
+
+TEST_F(HooksTest, NoHookIsNeeded) {
+    controller_.setHooks({});
+    controller_.lock();
+    moveClock(kStart + 100);
+    daemonStarts(true, {});
+    daemonHandles("KSTRMTimerRestarted");
+    EXPECT_EQ(registry_.find("KSTRMTimerRestarted"), nullptr);
+}
+
+TEST_F(HooksTest, ProgramIsToldOfRestrictedModeBeforeAnyRecordSaysSo) {
+    listen(RestrictedModeController::kForever);
+    controller_.lock();
+    moveClock(kStart + 99);
+    EXPECT_THAT(told_, IsEmpty());
+    const std::uint64_t published = publisher_.publishedCount();
+    moveClock(kStart + 100);
+    EXPECT_THAT(told_, ElementsAre("restricted"));
+    EXPECT_EQ(publishedBefore_, published);
+    moveClock(kStart + 101);
+    controller_.unlock();
+    EXPECT_THAT(told_, ElementsAre("restricted", "open"));
+}
+
+TEST_F(HooksTest, PolicyThatGoesOffOpensAndThatComesBackCloses) {
+    listen(RestrictedModeController::kForever);
+    controller_.lock();
+    moveClock(kStart + 100);
+    controller_.setAllowed(false);
+    controller_.setAllowed(true);
+    EXPECT_THAT(told_, ElementsAre("restricted", "open", "restricted"));
+}
+
+TEST_F(HooksTest, StayThatBeginsAndEndsInOneStepIsNone) {
+    listen(RestrictedModeController::kForever);
+    controller_.lock();
+    clock_.time = kStart + 100;
+    controller_.unlock();
+    EXPECT_THAT(told_, IsEmpty());
+}
+
+TEST_F(HooksTest, QuietModelTellsTheProgramAllTheSame) {
+    listen();
+    controller_.setQuiet(true);
+    controller_.lock();
+    moveClock(kStart + 100);
+    moveClock(kStart + 100 + kPatience);
+    EXPECT_THAT(told_, ElementsAre("restricted"));
+}
+
+TEST_F(HooksTest, ProgramIsToldWhatADaemonHandedBackOnceItIsTakenUp) {
+    listen();
+    const auto afterwards = controller_.daemonStarted(true, state(1, kStart - 500, 1));
+    EXPECT_THAT(told_, ElementsAre("restricted", "daemon, allowed"));
+    EXPECT_EQ(handedBack_, state(1, kStart - 500, 1));
+    afterwards();
+    daemonStarts(false, {});
+    EXPECT_THAT(told_, ElementsAre("restricted", "daemon, allowed", "open", "daemon, not allowed"));
+    EXPECT_EQ(handedBack_, StateBytes{});
+}
+
+TEST_F(HooksTest, ProgramIsToldOfRecordsThatAnAcknowledgementDropped) {
+    listen();
+    controller_.lock();
+    controller_.acknowledge("KSTRMTimerRestarted");
+    controller_.acknowledge("nothing");
+    EXPECT_THAT(told_, IsEmpty());
+    daemonHandles("KSTRMTimerRestarted");
+    EXPECT_THAT(told_, ElementsAre("acknowledged KSTRMTimerRestarted"));
+    controller_.acknowledge("KSTRMTimerRestarted");
+    EXPECT_EQ(told_.size(), 1U);
+}
+
+TEST_F(HooksTest, ProgramIsToldOnceOfARecordThatWaitedTooLong) {
+    listen();
+    controller_.lock();
+    EXPECT_EQ(controller_.nextDeadline(), kStart + kPatience);
+    moveClock(kStart + kPatience - 1);
+    EXPECT_THAT(told_, IsEmpty());
+    moveClock(kStart + kPatience);
+    EXPECT_THAT(told_, ElementsAre("waits KSTRMTimerRestarted"));
+    EXPECT_EQ(controller_.nextDeadline(), kStart + 100);
+    moveClock(kStart + kPatience + 1);
+    EXPECT_EQ(told_.size(), 1U);
+}
+
+TEST_F(HooksTest, RecordThatWasAcknowledgedInTimeDoesNotWait) {
+    listen();
+    controller_.lock();
+    daemonHandles("KSTRMTimerRestarted");
+    EXPECT_EQ(controller_.nextDeadline(), kStart + 100);
+    moveClock(kStart + kPatience);
+    EXPECT_THAT(told_, ElementsAre("acknowledged KSTRMTimerRestarted"));
+}
+
+TEST_F(HooksTest, NewerRecordWaitsAnew) {
+    listen();
+    controller_.lock();
+    moveClock(kStart + kPatience - 1);
+    controller_.setBootArg(true);
+    moveClock(kStart + kPatience);
+    EXPECT_THAT(told_, IsEmpty());
+    moveClock(kStart + kPatience - 1 + kPatience);
+    EXPECT_THAT(told_, ElementsAre("waits KSTRMTimerRestarted"));
+}
+
+TEST_F(HooksTest, RecordThatIsToldAgainToADaemonWaitsAnew) {
+    listen();
+    controller_.lock();
+    moveClock(kStart + kPatience - 1);
+    daemonStarts(true, {});
+    told_.clear();
+    moveClock(kStart + kPatience);
+    EXPECT_THAT(told_, IsEmpty());
+    moveClock(kStart + kPatience - 1 + kPatience);
+    EXPECT_THAT(told_, ElementsAre("waits KSTRMTimerRestarted"));
+}
+
+TEST_F(HooksTest, WhatOthersPutInItsPlaceIsNotWaitedFor) {
+    listen();
+    controller_.lock();
+    ASSERT_TRUE(registry_.set("KSTRMTimerRestarted", ByteVector{1}));
+    moveClock(kStart + kPatience);
+    EXPECT_THAT(told_, IsEmpty());
+}
+
+TEST_F(HooksTest, PatienceThatNeverEndsAsksForNoDeadline) {
+    listen(RestrictedModeController::kForever);
+    controller_.lock();
+    EXPECT_EQ(controller_.nextDeadline(), kStart + 100);
+    listen(RestrictedModeController::kForever - 1);
+    controller_.setBootArg(true);
+    moveClock(kStart + 86399);
+    EXPECT_THAT(told_, IsEmpty());
 }
 
 TEST(SystemClockTest, IsFarBeyondTheYear2020) {

@@ -83,6 +83,38 @@ TEST_F(RestrictedModeTimerTest, RestrictedModeBeginsOnce) {
     EXPECT_THAT(timer_.advance(kDue + 1), IsEmpty());
 }
 
+TEST(RestrictedModeTimerWithoutGraceTest, LockAloneBeginsRestrictedMode) {
+    RestrictedModeTimer timer({.untilRestricted = 0, .analytics = kAnalyticsPeriod}, kStart);
+    EXPECT_THAT(recordsOf(timer.lock(kStart)),
+                ElementsAre(timerRestarted(0, 1, kStart, 1),
+                            saveAnalytics(figuresBlob(kStart, 0, 0, kStart))));
+    EXPECT_TRUE(timer.restricted());
+    EXPECT_EQ(timer.nextDeadline(), kStart + kAnalyticsPeriod);
+    EXPECT_THAT(recordsOf(timer.unlock(kStart)),
+                ElementsAre(timerRestartedAnalytics(0), timerRestarted(0, 1, 0, 0),
+                            saveAnalytics(figuresBlob(kStart, 0, 0, 0))));
+}
+
+TEST(RestrictedModeTimerWithoutGraceTest, OneSecondIsOneSecond) {
+    RestrictedModeTimer timer({.untilRestricted = 1, .analytics = kAnalyticsPeriod}, kStart);
+    EXPECT_THAT(recordsOf(timer.lock(kStart)),
+                ElementsAre(timerRestarted(kStart + 1, 1, kStart, 0)));
+    EXPECT_FALSE(timer.restricted());
+    EXPECT_EQ(timer.advance(kStart + 1).size(), 2U);
+    EXPECT_TRUE(timer.restricted());
+}
+
+TEST(RestrictedModeTimerWithoutGraceTest, PolicyDecidesBeforeTheLock) {
+    RestrictedModeTimer timer({.untilRestricted = 0, .analytics = kAnalyticsPeriod}, kStart);
+    RestrictedModePolicy off;
+    off.allowed = false;
+    EXPECT_THAT(timer.setPolicy(kStart, off), IsEmpty());
+    EXPECT_THAT(recordsOf(timer.lock(kStart)), ElementsAre(timerRestarted(0, 1, kStart, 0)));
+    EXPECT_FALSE(timer.restricted());
+    EXPECT_EQ(timer.setPolicy(kStart + 1, {}).size(), 2U);
+    EXPECT_TRUE(timer.restricted());
+}
+
 TEST_F(RestrictedModeTimerTest, UnlockInStandardModeCountsNothing) {
     lockAtStart();
     EXPECT_THAT(recordsOf(timer_.unlock(kDue - 1)),
