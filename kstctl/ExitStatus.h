@@ -1,8 +1,12 @@
 #pragma once
 
+#include "base/Concat.h"
 #include "platform/Error.h"
 
+#include <cerrno>
 #include <string>
+#include <string_view>
+#include <system_error>
 #include <utility>
 
 namespace kstctl {
@@ -35,6 +39,18 @@ inline constexpr char kCommandErrorDomain[] = "kstctl";
 [[nodiscard]] inline ExitStatus statusOf(const platform::Error& error) {
     return error.domain == kCommandErrorDomain ? static_cast<ExitStatus>(error.code)
                                                : ExitStatus::failed;
+}
+
+[[nodiscard]] inline bool isRefusal(int error) {
+    return error == EACCES || error == EPERM;
+}
+
+/// Why a file, by its path and the error's number, could not be had.
+[[nodiscard]] inline platform::Error fileError(std::string_view path, int error) {
+    const ExitStatus status = error == ENOENT || error == ENOTDIR ? ExitStatus::missing
+                              : isRefusal(error)                  ? ExitStatus::unreadable
+                                                                  : ExitStatus::failed;
+    return failure(status, base::concat(path, ": ", std::generic_category().message(error)));
 }
 
 } // namespace kstctl

@@ -1,5 +1,6 @@
 #include "kstctl/Report.h"
 
+#include "kstd/Analytics/SQLite/DateFormatter.h"
 #include "kstd/Analytics/SQLite/HexText.h"
 
 namespace kstctl {
@@ -38,6 +39,28 @@ Report::Datum::~Datum() = default;
 
 std::string hexText(std::span<const std::uint8_t> bytes) {
     return kstd::RXLowercaseHexStringWithoutSpaces(bytes);
+}
+
+namespace {
+
+constexpr std::int64_t kEndOfYear9999 = 253'402'300'800;
+
+} // namespace
+
+std::string timeText(platform::Timestamp time) {
+    return kstd::DateFormatter().text(time);
+}
+
+std::string timeText(platform::Date time) {
+    return timeText(platform::timestampOf(time));
+}
+
+std::string timeText(std::uint64_t secondsSince1970) {
+    if (secondsSince1970 == 0 || secondsSince1970 >= kEndOfYear9999) {
+        return {};
+    }
+    return timeText(platform::Timestamp{static_cast<double>(secondsSince1970) -
+                                        static_cast<double>(platform::kSecondsFrom1970To2001)});
 }
 
 } // namespace kstctl

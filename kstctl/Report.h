@@ -1,5 +1,8 @@
 #pragma once
 
+#include "platform/Date.h"
+#include "platform/Timestamp.h"
+
 #include <concepts>
 #include <cstdint>
 #include <span>
@@ -91,5 +94,12 @@ struct Field {
 
 /// Bytes as lower-case hexadecimal digits.
 [[nodiscard]] std::string hexText(std::span<const std::uint8_t> bytes);
+
+/// 2026-11-20T08:15:00Z, to the second, cut off towards the past.
+[[nodiscard]] std::string timeText(platform::Timestamp time);
+[[nodiscard]] std::string timeText(platform::Date time);
+/// The same for seconds since 1970-01-01 UTC; empty for 0, which stands for no time, and for times
+/// after the year 9999.
+[[nodiscard]] std::string timeText(std::uint64_t secondsSince1970);
 
 } // namespace kstctl

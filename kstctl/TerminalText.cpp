@@ -1,6 +1,5 @@
-#include "kstctl/TerminalText.h"
-
 #include "base/Concat.h"
+#include "kstctl/Forms.h"
 #include "platform/formats/UnicodeText.h"
 
 #include <algorithm>

@@ -1,6 +1,5 @@
 #include "base/Concat.h"
 #include "kstctl/Forms.h"
-#include "kstctl/TerminalText.h"
 
 #include <algorithm>
 #include <array>

@@ -1,9 +1,7 @@
 #include "base/Concat.h"
-#include "kstctl/FileError.h"
-#include "kstctl/Options.h"
+#include "kstctl/CommandLine.h"
+#include "kstctl/ExitStatus.h"
 #include "kstctl/Output.h"
-#include "kstctl/Progress.h"
-#include "kstctl/commands/Commands.h"
 
 #include <exception>
 #include <filesystem>
@@ -14,7 +12,7 @@ namespace {
 
 using kstctl::ExitStatus;
 
-ExitStatus runIn(const kstctl::Options& options) {
+ExitStatus runIn(const kstctl::CommandLine& options) {
     kstctl::Output output(options.isJSON);
     kstctl::Progress progress;
     std::error_code error;
@@ -37,7 +35,7 @@ ExitStatus runIn(const kstctl::Options& options) {
 
 int main(int argc, char** argv) try {
     ExitStatus status = ExitStatus::success;
-    const auto options = kstctl::parseOptions(argc, argv, status);
+    const auto options = kstctl::parseCommandLine(argc, argv, status);
     return static_cast<int>(options ? runIn(*options) : status);
 } catch (const std::exception& error) {
     kstctl::Output::complain(error.what());

@@ -1,9 +1,8 @@
 #include "base/Concat.h"
-#include "kstctl/FileError.h"
-#include "kstctl/HexText.h"
+#include "kstctl/CommandLine.h"
+#include "kstctl/ExitStatus.h"
 #include "kstctl/Output.h"
-#include "kstctl/commands/Commands.h"
-#include "kstctl/commands/Input.h"
+#include "kstctl/commands/Inputs.h"
 #include "kstctl/decode/Kinds.h"
 #include "kstctl/decode/Payloads.h"
 

@@ -1,13 +1,12 @@
 #include "base/ByteWriter.h"
 #include "base/Concat.h"
-#include "kstctl/Alarms.h"
-#include "kstctl/EventSocketFile.h"
-#include "kstctl/FileError.h"
-#include "kstctl/HexText.h"
+#include "kstctl/CommandLine.h"
+#include "kstctl/ExitStatus.h"
 #include "kstctl/Output.h"
-#include "kstctl/TimeText.h"
-#include "kstctl/commands/Commands.h"
-#include "kstctl/commands/EventNames.h"
+#include "kstctl/Report.h"
+#include "kstctl/commands/Inputs.h"
+#include "kstctl/status/DaemonSockets.h"
+#include "kstctl/status/RegisteredAlarms.h"
 #include "wire/EventDatagram.h"
 
 #include <algorithm>
@@ -39,7 +38,7 @@ platform::Result<platform::Bytes> registeredDate(const EventName& name,
     if (!alarms) {
         return alarms.error();
     }
-    for (const Alarm& alarm : alarms.value()) {
+    for (const RegisteredAlarm& alarm : alarms.value()) {
         if (alarm.stream == name.stream && alarm.event == name.name && alarm.problem.empty()) {
             return payloadOf(alarm.date);
         }

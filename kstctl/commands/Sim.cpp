@@ -1,10 +1,10 @@
 #include "base/Concat.h"
 #include "keystrand-sim/ControlClient.h"
 #include "keystrand-sim/Paths.h"
-#include "kstctl/FileError.h"
+#include "kstctl/CommandLine.h"
+#include "kstctl/ExitStatus.h"
+#include "kstctl/Forms.h"
 #include "kstctl/Output.h"
-#include "kstctl/TerminalText.h"
-#include "kstctl/commands/Commands.h"
 
 #include <unistd.h>
 

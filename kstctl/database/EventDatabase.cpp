@@ -2,9 +2,9 @@
 
 #include "base/Concat.h"
 #include "kstctl/ExitStatus.h"
-#include "kstctl/Progress.h"
-#include "kstctl/database/Connection.h"
-#include "kstctl/database/DatabaseFiles.h"
+#include "kstctl/Output.h"
+#include "kstctl/database/DatabaseConnection.h"
+#include "kstd/Analytics/SQLite/DateFormatter.h"
 
 #include <poll.h>
 #include <utility>
@@ -39,7 +39,7 @@ StoredEvent eventOf(sqlite3_stmt* row) {
 /// Reads what is wanted through one connection. Each step gives SQLite's code when it fails.
 class Reader {
   public:
-    Reader(Connection& connection, const EventQuery& query)
+    Reader(DatabaseConnection& connection, const EventQuery& query)
         : connection_(connection), query_(query) {}
 
     /// SQLITE_OK, SQLITE_EMPTY when it is another kind of database, or why it failed.
@@ -99,15 +99,15 @@ class Reader {
         return events.isDone() ? SQLITE_OK : events.code();
     }
 
-    Connection& connection_;
+    DatabaseConnection& connection_;
     const EventQuery& query_;
 };
 
 /// The connection is closed when this returns. `code` is SQLite's.
-platform::Result<EventDatabase> readOnce(const std::string& path, Connection::Log log,
+platform::Result<EventDatabase> readOnce(const std::string& path, DatabaseConnection::Log log,
                                          const EventQuery& query,
                                          std::chrono::milliseconds patience, int& code) {
-    Connection connection(path, log, patience);
+    DatabaseConnection connection(path, log, patience);
     EventDatabase database;
     code = connection.code() == SQLITE_OK ? Reader(connection, query).read(database)
                                           : connection.code();
@@ -156,9 +156,10 @@ platform::Result<EventDatabase> readEventDatabase(const std::string& path, const
             continue;
         }
         int code = SQLITE_OK;
-        auto result =
-            readOnce(path, files.isAtRest() ? Connection::Log::ignored : Connection::Log::used,
-                     query, patience, code);
+        auto result = readOnce(path,
+                               files.isAtRest() ? DatabaseConnection::Log::ignored
+                                                : DatabaseConnection::Log::used,
+                               query, patience, code);
         if (haveVanished(code, files)) {
             reason = result.error();
             ::poll(nullptr, 0, kMillisecondsBetweenLooks);
@@ -169,6 +170,42 @@ platform::Result<EventDatabase> readEventDatabase(const std::string& path, const
         }
     }
     return reason;
+}
+
+namespace {
+
+constexpr char kStore[] = "insert or replace into Properties (key, value) values "
+                          "('upload_date', ?)";
+
+/// SQLITE_OK, SQLITE_EMPTY when it is another kind of database, or why it failed.
+int store(DatabaseConnection& connection, const std::string& date) {
+    if (const int code = connection.execute("begin immediate"); code != SQLITE_OK) {
+        return code;
+    }
+    Query tables(connection, kTablesQuery);
+    if (!tables.step()) {
+        return tables.code();
+    }
+    if (sqlite3_column_int(tables.row(), 0) != kTableCount) {
+        return SQLITE_EMPTY;
+    }
+    Query storing(connection, kStore, date);
+    static_cast<void>(storing.step());
+    return storing.isDone() ? connection.execute("commit") : storing.code();
+}
+
+} // namespace
+
+platform::Result<std::string> storeUploadDate(const std::string& path, platform::Timestamp date,
+                                              std::chrono::milliseconds patience) {
+    if (const auto looked = DatabaseFiles::look(path); !looked) {
+        return looked.error();
+    }
+    const std::string text = kstd::DateFormatter().text(date);
+    DatabaseConnection connection(path, DatabaseConnection::Log::written, patience);
+    const int code = connection.code() == SQLITE_OK ? store(connection, text) : connection.code();
+    return code == SQLITE_OK ? platform::Result<std::string>(text)
+                             : databaseError(path, connection, code);
 }
 
 } // namespace kstctl

@@ -1,8 +1,8 @@
 #include "kstctl/database/EventRows.h"
 
 #include "base/Concat.h"
-#include "kstctl/FileError.h"
-#include "kstctl/WholeWrite.h"
+#include "kstctl/ExitStatus.h"
+#include "kstctl/Output.h"
 
 #include <algorithm>
 #include <cerrno>

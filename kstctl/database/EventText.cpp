@@ -1,7 +1,7 @@
 #include "kstctl/database/EventText.h"
 
 #include "kstctl/Forms.h"
-#include "kstctl/TimeText.h"
+#include "kstctl/Report.h"
 
 #include <concepts>
 #include <type_traits>

@@ -3,7 +3,7 @@
 #include "base/ByteReader.h"
 #include "base/Concat.h"
 #include "keystrand/NotificationRecord.h"
-#include "kstctl/TimeText.h"
+#include "kstctl/Report.h"
 #include "kstctl/decode/Decoders.h"
 #include "wire/EventDatagram.h"
 

@@ -1,19 +1,28 @@
 #include "kstctl/status/DaemonProcess.h"
 
 #include "base/Concat.h"
-#include "kstctl/FileError.h"
-#include "kstctl/status/BoundSockets.h"
+#include "kstctl/ExitStatus.h"
+#include "kstctl/Output.h"
+#include "kstctl/Report.h"
+#include "kstctl/status/DaemonSockets.h"
+#include "kstctl/status/Section.h"
 #include "platform/linux/LinuxClock.h"
+
+#include <systemd/sd-bus.h>
+#include <systemd/sd-daemon.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <charconv>
+#include <cstdlib>
 #include <ctime>
 #include <filesystem>
 #include <fstream>
+#include <memory>
 #include <set>
 #include <sstream>
 #include <string_view>
+#include <system_error>
 #include <unistd.h>
 
 namespace kstctl {
@@ -124,6 +133,149 @@ DaemonState findDaemonProcess(const std::string& path) {
     }
     state.whyNoStart = "no daemon runs, and nobody keeps when one did";
     return state;
+}
+
+namespace {
+
+constexpr char kInitSystem[] = "org.freedesktop.systemd1";
+constexpr char kUnitPath[] = "/org/freedesktop/systemd1/unit/kstd_2eservice";
+constexpr char kUnitInterface[] = "org.freedesktop.systemd1.Unit";
+constexpr char kServiceInterface[] = "org.freedesktop.systemd1.Service";
+constexpr std::int64_t kNanosecondsPerMicrosecond = 1000;
+
+struct Closer {
+    void operator()(sd_bus* bus) const { sd_bus_flush_close_unref(bus); }
+};
+
+DaemonState unknownBecause(int error) {
+    DaemonState state{.source = "init system"};
+    state.problem = failure(
+        isRefusal(error) ? ExitStatus::unreadable : ExitStatus::failed,
+        base::concat("the init system cannot be asked: ", std::generic_category().message(error)));
+    return state;
+}
+
+/// Asks for properties until one of them cannot be had.
+class Unit {
+  public:
+    explicit Unit(sd_bus* bus) : bus_(bus) {}
+
+    std::string text(const char* interface, const char* property) {
+        char* value = nullptr;
+        note(sd_bus_get_property_string(bus_, kInitSystem, kUnitPath, interface, property, nullptr,
+                                        &value));
+        const std::unique_ptr<char, decltype(&std::free)> owner(value, std::free);
+        return value != nullptr ? value : std::string();
+    }
+
+    template <typename Number>
+    Number number(char type, const char* property) {
+        Number value = 0;
+        note(sd_bus_get_property_trivial(bus_, kInitSystem, kUnitPath, kServiceInterface, property,
+                                         nullptr, type, &value));
+        return value;
+    }
+
+    [[nodiscard]] int error() const { return error_; }
+
+  private:
+    void note(int result) {
+        if (result < 0 && error_ == 0) {
+            error_ = -result;
+        }
+    }
+
+    sd_bus* bus_;
+    int error_ = 0;
+};
+
+} // namespace
+
+bool isInitSystemThere() {
+    return sd_booted() > 0;
+}
+
+DaemonState askInitSystem() {
+    sd_bus* opened = nullptr;
+    const int result = sd_bus_open_system(&opened);
+    const std::unique_ptr<sd_bus, Closer> bus(opened);
+    return result < 0 ? unknownBecause(-result) : askInitSystem(bus.get());
+}
+
+DaemonState askInitSystem(sd_bus* bus) {
+    Unit unit(bus);
+    const std::string load = unit.text(kUnitInterface, "LoadState");
+    const auto started = unit.number<std::uint64_t>('t', "ExecMainStartTimestamp");
+    const auto pid = unit.number<std::uint32_t>('u', "MainPID");
+    if (unit.error() != 0) {
+        return unknownBecause(unit.error());
+    }
+    DaemonState state{.source = "init system"};
+    if (load == "not-found") {
+        state.problem = failure(ExitStatus::missing, "there is no unit kstd.service");
+        return state;
+    }
+    if (pid != 0) {
+        state.pid = pid;
+    }
+    if (started != 0) {
+        state.lastStart =
+            platform::Date{static_cast<std::int64_t>(started) * kNanosecondsPerMicrosecond};
+    } else {
+        state.whyNoStart = "not since the machine has started";
+    }
+    return state;
+}
+
+namespace {
+
+void addSocket(Section& section, const EventSocketFile& socket) {
+    Report report;
+    report.add("path", socket.path).add("isPresent", socket.isPresent);
+    if (socket.isPresent) {
+        report.add("owner", socket.owner).add("mode", octalMode(socket.mode));
+    }
+    if (!socket.problem) {
+        report.add("isOpen", true);
+    } else if (statusOf(*socket.problem) == ExitStatus::missing) {
+        report.add("isOpen", false, socket.problem->description);
+    } else {
+        report.add("isOpen", Report::Unknown{socket.problem->description});
+    }
+    if (socket.problem) {
+        section.note(*socket.problem);
+    }
+    section.report.add("eventSocket", std::move(report));
+}
+
+void addProcess(Section& section, const DaemonState& state) {
+    if (state.problem) {
+        section.addUnknown("isRunning", *state.problem);
+        section.report.add("lastStart", Report::Unknown{state.problem->description});
+        return;
+    }
+    section.report.add("isRunning", state.pid.has_value());
+    if (state.pid) {
+        section.report.add("pid", *state.pid);
+    }
+    if (state.lastStart) {
+        section.report.add("lastStart", timeText(*state.lastStart));
+    } else {
+        section.report.add("lastStart", Report::Unknown{state.whyNoStart});
+    }
+    section.report.add("source", state.source);
+}
+
+} // namespace
+
+Section daemonSection(const Environment& environment) {
+    Section section;
+    const EventSocketFile socket = EventSocketFile::look(environment.paths);
+    addSocket(section, socket);
+    addProcess(section, environment.paths.isSystemRoot() && isInitSystemThere()
+                            ? askInitSystem()
+                            : findDaemonProcess(socket.path));
+    return section;
 }
 
 } // namespace kstctl

@@ -1,8 +1,7 @@
-#include "kstctl/status/LastUpload.h"
-
 #include "base/Concat.h"
-#include "kstctl/Environment.h"
-#include "kstctl/TimeText.h"
+#include "kstctl/Output.h"
+#include "kstctl/Report.h"
+#include "kstctl/status/UploadSection.h"
 #include "kstd/MessageIds.h"
 
 #define SD_JOURNAL_SUPPRESS_LOCATION

@@ -1,7 +1,7 @@
 #include "KSTLib/AllocatedBytes.h"
 #include "base/Concat.h"
 #include "kstctl/Forms.h"
-#include "kstctl/HexText.h"
+#include "kstctl/commands/Inputs.h"
 #include "kstctl/decode/Kinds.h"
 #include "kstctl/decode/Payloads.h"
 

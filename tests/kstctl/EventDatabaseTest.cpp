@@ -5,7 +5,6 @@
 #include "kstctl/ExitStatus.h"
 #include "kstctl/Forms.h"
 #include "kstctl/database/EventText.h"
-#include "kstctl/database/UploadDate.h"
 #include "platform/formats/PropertyListCodec.h"
 #include "tests/kstd/Analytics/SQLite/OtherConnection.h"
 #include "tests/kstd/Analytics/SQLite/SmallDisk.h"

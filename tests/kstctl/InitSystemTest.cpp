@@ -1,9 +1,8 @@
 // What the init system's bus interface is asked for and what becomes of its answers. The other end
 // is a connection of the test's own.
 
-#include "kstctl/status/InitSystem.h"
-
 #include "kstctl/ExitStatus.h"
+#include "kstctl/status/DaemonProcess.h"
 
 #include <gtest/gtest.h>
 #include <systemd/sd-bus.h>

@@ -1,5 +1,4 @@
-#include "kstctl/status/LastUpload.h"
-
+#include "kstctl/status/UploadSection.h"
 #include "kstd/MessageIds.h"
 #include "platform/host/MessageClasses.h"
 

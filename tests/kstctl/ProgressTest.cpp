@@ -1,8 +1,6 @@
-#include "kstctl/Progress.h"
-
 #include "base/FileDescriptor.h"
+#include "kstctl/CommandLine.h"
 #include "kstctl/Output.h"
-#include "kstctl/commands/Commands.h"
 #include "tests/kstd/Analytics/SQLite/OtherConnection.h"
 #include "tests/support/TemporaryDirectory.h"
 

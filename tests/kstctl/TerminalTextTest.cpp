@@ -1,4 +1,4 @@
-#include "kstctl/TerminalText.h"
+#include "kstctl/Forms.h"
 
 #include <gtest/gtest.h>
 

@@ -1,9 +1,8 @@
 // What people write on the command line: bytes, dates, names of events.
 
 #include "kstctl/ExitStatus.h"
-#include "kstctl/HexText.h"
-#include "kstctl/TimeText.h"
-#include "kstctl/commands/EventNames.h"
+#include "kstctl/Report.h"
+#include "kstctl/commands/Inputs.h"
 
 #include <gtest/gtest.h>
 

@@ -1,8 +1,12 @@
-#include "kstctl/Alarms.h"
+#include "kstctl/status/RegisteredAlarms.h"
 
 #include "base/Concat.h"
-#include "kstctl/FileError.h"
+#include "kstctl/ExitStatus.h"
+#include "kstctl/Output.h"
 #include "kstctl/RecordingLog.h"
+#include "kstctl/Report.h"
+#include "kstctl/status/Section.h"
+#include "platform/linux/LinuxClock.h"
 #include "platform/linux/alarms/AlarmStore.h"
 #include "wire/EventDatagram.h"
 
@@ -11,6 +15,7 @@
 #include <filesystem>
 #include <tuple>
 #include <unistd.h>
+#include <utility>
 
 namespace kstctl {
 
@@ -47,11 +52,12 @@ bool speaksOf(const std::string& line, const std::string& path) {
 }
 
 /// Appends the alarms of one stream, as the daemon's own code reads them.
-void append(std::vector<Alarm>& alarms, const std::string& directory, const std::string& stream) {
+void append(std::vector<RegisteredAlarm>& alarms, const std::string& directory,
+            const std::string& stream) {
     RecordingLog log;
     for (const auto& [event, date] :
          platform::AlarmStore(directory, {wire::kAlarmName}, log).load(stream)) {
-        Alarm alarm{.stream = stream, .event = event, .date = date, .problem = {}};
+        RegisteredAlarm alarm{.stream = stream, .event = event, .date = date, .problem = {}};
         const std::string path = base::concat(directory, '/', stream, '/', event);
         for (const std::string& line : log.lines()) {
             if (speaksOf(line, path)) {
@@ -64,14 +70,14 @@ void append(std::vector<Alarm>& alarms, const std::string& directory, const std:
 
 } // namespace
 
-platform::Result<std::vector<Alarm>> registeredAlarms(const platform::Paths& paths) {
+platform::Result<std::vector<RegisteredAlarm>> registeredAlarms(const platform::Paths& paths) {
     const std::string directory = paths.alarmDirectory();
     int error = 0;
     const std::vector<std::string> streams = namesIn(directory, error);
     if (error != 0) {
         return fileError(directory, error);
     }
-    std::vector<Alarm> alarms;
+    std::vector<RegisteredAlarm> alarms;
     for (const std::string& stream : streams) {
         const std::string path = base::concat(directory, '/', stream);
         const std::vector<std::string> files = namesIn(path, error);
@@ -83,10 +89,37 @@ platform::Result<std::vector<Alarm>> registeredAlarms(const platform::Paths& pat
             append(alarms, directory, stream);
         }
     }
-    std::sort(alarms.begin(), alarms.end(), [](const Alarm& one, const Alarm& other) {
-        return std::tie(one.stream, one.event) < std::tie(other.stream, other.event);
-    });
+    std::sort(alarms.begin(), alarms.end(),
+              [](const RegisteredAlarm& one, const RegisteredAlarm& other) {
+                  return std::tie(one.stream, one.event) < std::tie(other.stream, other.event);
+              });
     return alarms;
+}
+
+Section alarmSection(const Environment& environment) {
+    Section section;
+    section.report.add("path", environment.paths.alarmDirectory());
+    const auto alarms = registeredAlarms(environment.paths);
+    if (!alarms) {
+        section.addUnknown("registered", alarms.error());
+        return section;
+    }
+    const platform::Date now = platform::LinuxClock().now();
+    Data list;
+    for (const RegisteredAlarm& alarm : alarms.value()) {
+        Report report;
+        report.add("stream", alarm.stream).add("name", alarm.event);
+        if (alarm.problem.empty()) {
+            report.add("date", alarm.date.nanosecondsSince1970, timeText(alarm.date));
+        } else {
+            report.add("date", Report::Unknown{alarm.problem});
+            section.note(failure(ExitStatus::malformed, alarm.problem));
+        }
+        report.add("isDue", !alarm.problem.empty() || alarm.date <= now);
+        list.emplace_back(std::move(report));
+    }
+    section.report.add("registered", std::move(list));
+    return section;
 }
 
 } // namespace kstctl

@@ -1,4 +1,4 @@
-#include "kstctl/Options.h"
+#include "kstctl/CommandLine.h"
 
 #include "base/Concat.h"
 #include "kstctl/Output.h"
@@ -52,13 +52,13 @@ CLI::App* addCommand(CLI::App& parent, const char* name, const char* description
 
 /// Makes the command the one to run when it is given, with what its options have filled.
 template <typename Command>
-Command& chosenBy(CLI::App* app, Options& options) {
+Command& chosenBy(CLI::App* app, CommandLine& options) {
     const auto command = std::make_shared<Command>();
     app->final_callback([command, &options] { options.command = *command; });
     return *command;
 }
 
-void addEvents(CLI::App& app, Options& options) {
+void addEvents(CLI::App& app, CommandLine& options) {
     CLI::App* const events = addCommand(app, "events", "The events that wait for upload");
     events->require_subcommand(1);
 
@@ -78,7 +78,7 @@ void addEvents(CLI::App& app, Options& options) {
                           "A file that is not there yet");
 }
 
-void addUpload(CLI::App& app, Options& options) {
+void addUpload(CLI::App& app, CommandLine& options) {
     CLI::App* const upload =
         addCommand(app, "upload", "The document of an upload, and the date of the next one");
     auto& command = chosenBy<UploadCommand>(upload, options);
@@ -99,7 +99,7 @@ void addUpload(CLI::App& app, Options& options) {
     });
 }
 
-void addSend(CLI::App& app, Options& options) {
+void addSend(CLI::App& app, CommandLine& options) {
     CLI::App* const send = addCommand(app, "send", "Send an event to the daemon");
     auto& command = chosenBy<SendCommand>(send, options);
     send->add_option("name", command.name,
@@ -113,7 +113,7 @@ void addSend(CLI::App& app, Options& options) {
     send->add_flag("--exact", command.isExact, "Send a name that is not known");
 }
 
-void addDecode(CLI::App& app, Options& options) {
+void addDecode(CLI::App& app, CommandLine& options) {
     CLI::App* const decode = addCommand(app, "decode", "Show bytes as named fields");
     auto& command = chosenBy<DecodeCommand>(decode, options);
     CLI::Option* const digits =
@@ -128,7 +128,7 @@ void addDecode(CLI::App& app, Options& options) {
     decode->add_flag("--show-secrets", command.showSecrets, "Show passphrases");
 }
 
-void addSim(CLI::App& app, Options& options) {
+void addSim(CLI::App& app, CommandLine& options) {
     CLI::App* const sim = addCommand(app, "sim", "Send a control command to keystrand-sim");
     sim->add_option("words", chosenBy<SimCommand>(sim, options).words, "The command")->required();
 }
@@ -153,8 +153,8 @@ ExitStatus statusOfParseError(const CLI::App& app, const CLI::ParseError& proble
 
 } // namespace
 
-std::optional<Options> parseOptions(int argc, const char* const* argv, ExitStatus& status) {
-    Options options;
+std::optional<CommandLine> parseCommandLine(int argc, const char* const* argv, ExitStatus& status) {
+    CommandLine options;
     CLI::App app("Shows what kstd does and keeps, and drives it.", "kstctl");
     app.set_version_flag("--version", "kstctl " KSTD_VERSION);
     app.require_subcommand(1);

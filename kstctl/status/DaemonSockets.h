@@ -7,6 +7,7 @@
 #include <optional>
 #include <string>
 #include <sys/types.h>
+#include <vector>
 
 namespace kstctl {
 
@@ -24,5 +25,16 @@ struct EventSocketFile {
 
     [[nodiscard]] static EventSocketFile look(const platform::Paths& paths);
 };
+
+/// A local socket of this machine, whoever holds it.
+struct BoundSocket {
+    /// As links of /proc say it.
+    std::string number;
+    /// It takes connections.
+    bool isListening = false;
+};
+
+/// The sockets that are bound to the path. Nobody notices the look.
+[[nodiscard]] std::vector<BoundSocket> socketsBoundTo(const std::string& path);
 
 } // namespace kstctl

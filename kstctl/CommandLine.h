@@ -1,6 +1,7 @@
 #pragma once
 
 #include "kstctl/ExitStatus.h"
+#include "kstctl/Output.h"
 
 #include <chrono>
 #include <cstdint>
@@ -62,7 +63,7 @@ struct SimCommand {
 };
 
 /// What the command line asks for.
-struct Options {
+struct CommandLine {
     std::string root = "/";
     bool isJSON = false;
     /// The longest wait for a database that is locked or a socket that is full.
@@ -74,7 +75,19 @@ struct Options {
 
 /// None when there is nothing to run; `status` is then the program's status, and what is to be said
 /// has been said.
-[[nodiscard]] std::optional<Options> parseOptions(int argc, const char* const* argv,
-                                                  ExitStatus& status);
+[[nodiscard]] std::optional<CommandLine> parseCommandLine(int argc, const char* const* argv,
+                                                          ExitStatus& status);
+
+/// What the program can be asked to do. Each shows its results on the environment's output and
+/// returns what the program ends with.
+
+[[nodiscard]] ExitStatus run(const StatusCommand& command, const Environment& environment);
+[[nodiscard]] ExitStatus run(const EventsListCommand& command, const Environment& environment);
+[[nodiscard]] ExitStatus run(const EventsShowCommand& command, const Environment& environment);
+[[nodiscard]] ExitStatus run(const EventsExportCommand& command, const Environment& environment);
+[[nodiscard]] ExitStatus run(const UploadCommand& command, const Environment& environment);
+[[nodiscard]] ExitStatus run(const SendCommand& command, const Environment& environment);
+[[nodiscard]] ExitStatus run(const DecodeCommand& command, const Environment& environment);
+[[nodiscard]] ExitStatus run(const SimCommand& command, const Environment& environment);
 
 } // namespace kstctl

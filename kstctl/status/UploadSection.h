@@ -1,14 +1,30 @@
 #pragma once
 
+#include "kstctl/ExitStatus.h"
 #include "kstctl/status/Section.h"
+#include "kstd/Analytics/AnalyticsConfiguration.h"
 #include "platform/Date.h"
+#include "platform/linux/Paths.h"
 
 #include <cstdint>
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace kstctl {
+
+/// Where events go, as the next daemon will read it.
+struct UploadConfiguration {
+    kstd::AnalyticsConfiguration analytics;
+    /// What is wrong with the files, which then count for nothing, and with the settings: the lines
+    /// of the daemon.
+    std::vector<std::string> remarks = {};
+    /// What they come to: success when there are none.
+    ExitStatus status = ExitStatus::success;
+
+    [[nodiscard]] static UploadConfiguration read(const platform::Paths& paths);
+};
 
 /// What became of an upload.
 enum class UploadOutcome {

@@ -2,18 +2,45 @@
 
 #include "kstctl/ExitStatus.h"
 #include "platform/Error.h"
+#include "platform/Result.h"
 
 #include <chrono>
 #include <memory>
 #include <optional>
 #include <sqlite3.h>
 #include <string>
+#include <sys/stat.h>
 
 namespace kstctl {
 
+/// What stands at the path of a database, and beside it.
+struct DatabaseFiles {
+    /// The database's file is in WAL mode.
+    bool usesLog = false;
+    bool hasLog = false;
+    /// The log has something in it.
+    bool isLogFilled = false;
+    /// The index of the log is there.
+    bool hasIndex = false;
+    /// Changes with every write to the database's own file.
+    struct stat state {};
+
+    /// Nobody has the database open, and all of it is in its own file.
+    [[nodiscard]] bool isAtRest() const {
+        return usesLog && (!hasLog || (!isLogFilled && !hasIndex));
+    }
+
+    /// Whether all is as it was. For a database that was at rest that means that nothing was
+    /// written between the two looks; of one in use it tells whether somebody came or went.
+    [[nodiscard]] bool isSameAs(const DatabaseFiles& earlier) const;
+
+    /// Fails with ExitStatus::missing, ::unreadable or ::malformed (not a regular file).
+    [[nodiscard]] static platform::Result<DatabaseFiles> look(const std::string& path);
+};
+
 /// A connection that makes no database, and only reads unless it is told. Codes are SQLite's,
 /// extended.
-class Connection {
+class DatabaseConnection {
   public:
     /// How the files beside the database are dealt with.
     enum class Log {
@@ -25,7 +52,7 @@ class Connection {
         written,
     };
 
-    Connection(const std::string& path, Log log, std::chrono::milliseconds patience);
+    DatabaseConnection(const std::string& path, Log log, std::chrono::milliseconds patience);
 
     /// SQLITE_OK when the connection can be used.
     [[nodiscard]] int code() const { return code_; }
@@ -52,17 +79,17 @@ inline constexpr char kTablesQuery[] = "select count(*) from sqlite_master where
 inline constexpr int kTableCount = 2;
 
 /// The error for a code that is a failure; SQLITE_EMPTY stands for a database of another kind.
-[[nodiscard]] platform::Error databaseError(const std::string& path, const Connection& connection,
-                                            int code);
+[[nodiscard]] platform::Error databaseError(const std::string& path,
+                                            const DatabaseConnection& connection, int code);
 
 /// A statement that is run once. `code` is that of the last step, SQLITE_ROW while there is a row.
 class Query {
   public:
-    Query(Connection& connection, const char* SQL);
+    Query(DatabaseConnection& connection, const char* SQL);
     /// With an integer in the place of its question mark.
-    Query(Connection& connection, const char* SQL, std::int64_t bound);
+    Query(DatabaseConnection& connection, const char* SQL, std::int64_t bound);
     /// With a text there.
-    Query(Connection& connection, const char* SQL, const std::string& bound);
+    Query(DatabaseConnection& connection, const char* SQL, const std::string& bound);
 
     /// Whether there is a row.
     [[nodiscard]] bool step();

@@ -10,7 +10,7 @@
 namespace kstctl {
 
 /// An alarm that is registered.
-struct Alarm {
+struct RegisteredAlarm {
     std::string stream;
     std::string event;
     platform::Date date;
@@ -20,6 +20,7 @@ struct Alarm {
 
 /// All alarms that are on disk, by stream and name. None have ever been registered when there is no
 /// directory for them. Fails when it cannot be read.
-[[nodiscard]] platform::Result<std::vector<Alarm>> registeredAlarms(const platform::Paths& paths);
+[[nodiscard]] platform::Result<std::vector<RegisteredAlarm>>
+registeredAlarms(const platform::Paths& paths);
 
 } // namespace kstctl
