@@ -1,0 +1,112 @@
+#pragma once
+
+#include "keystrand-linux/UsbBus.h"
+
+#include <cstdint>
+#include <map>
+#include <set>
+#include <span>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace keystrand::usb {
+
+/// What a device says about itself.
+struct Plug {
+    std::string name = "thing";
+    std::vector<std::uint8_t> descriptors;
+    std::uint16_t vendor = 0x1111;
+    std::uint16_t product = 0x2222;
+    std::string serial = {};
+    bool hardWired = false;
+};
+
+/// Descriptors of one configuration with an interface of each of these classes.
+[[nodiscard]] std::vector<std::uint8_t> descriptorsOf(std::span<const UsbClass> interfaces);
+[[nodiscard]] Plug aKeyboard();
+[[nodiscard]] Plug aMouse();
+[[nodiscard]] Plug aDisk();
+[[nodiscard]] Plug aHub();
+/// A keyboard that is a disk as well.
+[[nodiscard]] Plug aKeyboardWithDisk();
+
+/// A bus as the kernel keeps one: it decides about devices when they come, shows nothing behind a
+/// refused hub, and disconnects what is behind a hub that is refused.
+class FakeUsbBus : public UsbBus {
+  public:
+    /// A root hub comes; it is as the parameter says.
+    void addRootHub(std::uint32_t bus, const std::string& controller = {});
+    void removeRootHub(std::uint32_t bus);
+
+    /// A device is plugged in. What is behind a refused hub is seen when the hub is let in.
+    void plug(const std::string& port, const Plug& what);
+    void unplug(const std::string& port);
+    /// The same device once more, at the same port.
+    void replug(const std::string& port);
+
+    /// Somebody else writes.
+    void setAuthorized(const std::string& port, bool authorized);
+    void setRootHubDefault(std::uint32_t bus, AuthorizedDefault value);
+    void setParameterDefault(AuthorizedDefault value) { parameter_ = value; }
+
+    /// From now on the machine works with what is at that port.
+    void use(const std::string& port) { used_.insert(port); }
+    /// The kernel knows 0 and 1 only.
+    void knowOnlyTwoValues() { twoValues_ = true; }
+    /// Each write to a device fails that many times.
+    void failWrites(unsigned count) { failures_ = count; }
+    void setMissing(bool missing) { missing_ = missing; }
+    /// Called before each look and each write: what happens in between.
+    void setMeanwhile(std::function<void()> meanwhile) { meanwhile_ = std::move(meanwhile); }
+
+    [[nodiscard]] bool isPlugged(const std::string& port) const { return plugs_.contains(port); }
+    /// False also for what is not seen.
+    [[nodiscard]] bool isAuthorized(const std::string& port) const;
+    [[nodiscard]] Attachment attachmentAt(const std::string& port) const;
+    [[nodiscard]] AuthorizedDefault rootHubDefault(std::uint32_t bus) const;
+    [[nodiscard]] AuthorizedDefault parameter() const { return parameter_; }
+    /// "parameter=2", "usb1=2", "1-1=0", in the order in which they were written.
+    [[nodiscard]] const std::vector<std::string>& writes() const { return writes_; }
+    void forgetWrites() { writes_.clear(); }
+
+    [[nodiscard]] std::optional<BusView> look(std::string& problem) override;
+    [[nodiscard]] GateOutcome setParameter(AuthorizedDefault value) override;
+    [[nodiscard]] GateOutcome setRootHub(const RootHub& hub, AuthorizedDefault value) override;
+    [[nodiscard]] GateOutcome accept(const UsbDevice& device) override;
+    [[nodiscard]] GateOutcome refuse(const UsbDevice& device) override;
+    void watch(Changed changed) override { changed_ = std::move(changed); }
+    [[nodiscard]] bool isWatched() const { return changed_ != nullptr; }
+
+  private:
+    struct Seen {
+        Attachment attachment;
+        bool authorized = false;
+    };
+
+    void happen();
+    void tell();
+    void appear(const std::string& port);
+    void disappear(const std::string& port);
+    void becomeAuthorized(const std::string& port);
+    [[nodiscard]] bool hubAboveIsIn(const std::string& port) const;
+    [[nodiscard]] bool isUsed(const std::string& port) const;
+    [[nodiscard]] GateOutcome write(const UsbDevice& device, bool authorized);
+    [[nodiscard]] AuthorizedDefault read(AuthorizedDefault value) const;
+
+    std::map<std::uint32_t, RootHub> rootHubs_;
+    std::map<std::string, Plug> plugs_;
+    std::map<std::string, Seen> seen_;
+    std::set<std::string> used_;
+    std::map<std::uint32_t, std::uint32_t> lastNumber_;
+    std::uint64_t lastInode_ = 0;
+    AuthorizedDefault parameter_ = kAsTheControllerHasIt;
+    bool twoValues_ = false;
+    bool missing_ = false;
+    unsigned failures_ = 0;
+    std::function<void()> meanwhile_;
+    Changed changed_;
+    std::vector<std::string> writes_;
+};
+
+} // namespace keystrand::usb
