@@ -14,7 +14,7 @@ enum {
     kKSTErrorBadParameter = -3,
     /** Memory for a command or a reply could not be had. */
     kKSTErrorOutOfMemory = -4,
-    /** The kernel service could not be found, or its reply has not the size it must have. */
+    /** There is no kernel service, or its reply has not the size it must have. */
     kKSTErrorUnexpected = -5,
     /** A "contains" query was answered with no. */
     kKSTErrorNotContained = -7

@@ -20,6 +20,7 @@ constexpr platform::MessageClass kClasses[] = {
     {kKernelServiceFailed, "KSTLib: KSTKernelControl: returning, err = "},
     {kKernelServiceFailed, "kstd: AssertMacros: entry "},
     {kKernelServiceFailed, "kstd: ServiceRegistry: cannot "},
+    {kKernelServiceFailed, "kstd: KernelSocket: cannot connect to "},
     {kKernelSideNotTold,
      "kstd: -[DeviceRestrictedModeService notifyDaemonStarted]: returning, err = "},
     {kKernelSideNotTold,

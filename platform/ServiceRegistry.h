@@ -17,14 +17,15 @@ inline constexpr ServiceHandle kNoService = 0;
 ///
 /// Called on one thread at a time. Every handle that a find operation returns is owned by the
 /// caller and given back with `release`; finding the same entry twice gives two references to it.
-/// A registry that cannot be reached has no entries.
+/// A registry that is not there has no entries.
 class ServiceRegistry : public KernelConnections {
   public:
     /// The entry at `path` (for example "IOService:/IOResources/Keystrand"), looked up anew on
-    /// every call, or kNoService.
+    /// every call, or kNoService; that too when the kernel service cannot be asked.
     [[nodiscard]] virtual ServiceHandle findByPath(std::string_view path) = 0;
 
-    /// The first entry whose class has this name, or kNoService.
+    /// The first entry whose class has this name, or kNoService. A kernel service that is there and
+    /// cannot be asked is found: to open it fails with the reason.
     [[nodiscard]] virtual ServiceHandle findByClassName(std::string_view name) = 0;
 
     /// A copy of the property as it stands now. None when the entry has no such property, is gone,

@@ -6,15 +6,37 @@
 #include "platform/linux/LinuxSystemLog.h"
 #include "platform/linux/Paths.h"
 
+#include <cerrno>
 #include <cstddef>
 #include <new>
+#include <string_view>
 
 namespace {
 
+/// The program that the library is part of, as it was called when the library was loaded.
+class ProgramName {
+  public:
+    ProgramName() {
+        const char* const name = program_invocation_short_name;
+        if (name != nullptr && *name != '\0') {
+            text_ = {kept_, std::string_view(name).copy(kept_, sizeof kept_)};
+        }
+    }
+
+    [[nodiscard]] std::string_view text() const { return text_; }
+
+  private:
+    // A copy: a program may write over its arguments.
+    char kept_[255];
+    std::string_view text_ = "KSTLib";
+};
+
 struct DefaultPlatform {
+    ProgramName program;
     platform::Paths paths{"/"};
     platform::LinuxSystemLog log{paths};
-    platform::LinuxServiceRegistry registry{platform::Paths::kKernelSocket, log};
+    platform::LinuxServiceRegistry registry{platform::Paths::kKernelSocket, log,
+                                            platform::kKernelTimeout, program.text()};
     platform::LinuxKernelChannel channel{platform::Paths::kKernelSocket, registry, log};
 };
 

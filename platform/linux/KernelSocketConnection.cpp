@@ -40,14 +40,6 @@ microseconds blockingTime(std::chrono::milliseconds timeout) {
     return duration_cast<microseconds>(timeout) / 2;
 }
 
-void writeRefusal(SystemLog& log, const char* path, uid_t stranger) {
-    std::array<char, 256> line{};
-    const int size =
-        std::snprintf(line.data(), line.size(),
-                      "kstd: KernelSocket: %s is served by user %u, refused.\n", path, stranger);
-    log.write(LogLevel::warning, {line.data(), static_cast<std::size_t>(std::max(size, 0))}, {});
-}
-
 } // namespace
 
 MessagePages::~MessagePages() {
@@ -137,6 +129,32 @@ Status KernelSocketConnection::connectAndGreet() {
 }
 
 Status KernelSocketConnection::openSocket() {
+    std::optional<uid_t> stranger;
+    const Status status = connectSocket(stranger);
+    if (std::exchange(connectStatus_, status) != status && status != kSuccess) {
+        tell(status, stranger);
+    }
+    return status;
+}
+
+/// The line is made on the stack: a client may have no memory left.
+void KernelSocketConnection::tell(Status status, std::optional<uid_t> stranger) {
+    // A program's name, a socket's path, the system's words.
+    std::array<char, 512> line;
+    const int nameSize = static_cast<int>(program_.size());
+    const int size = stranger
+                         ? std::snprintf(line.data(), line.size(),
+                                         "%.*s: KernelSocket: %s is served by user %u, refused.\n",
+                                         nameSize, program_.data(), path().data(), *stranger)
+                         : std::snprintf(line.data(), line.size(),
+                                         "%.*s: KernelSocket: cannot connect to %s: %s.\n",
+                                         nameSize, program_.data(), path().data(),
+                                         ::strerrordesc_np(errnoFromStatus(status)));
+    const auto written = std::min(static_cast<std::size_t>(std::max(size, 0)), line.size() - 1);
+    log_.write(LogLevel::warning, {line.data(), written}, {});
+}
+
+Status KernelSocketConnection::connectSocket(std::optional<uid_t>& stranger) {
     if (!address_) {
         return statusFromErrno(ENAMETOOLONG);
     }
@@ -156,9 +174,7 @@ Status KernelSocketConnection::openSocket() {
         pages_.setMark();
         return kSuccess;
     }
-    if (connection.stranger) {
-        writeRefusal(log_, address_->path(), *connection.stranger);
-    }
+    stranger = connection.stranger;
     return statusFromErrno(connection.error);
 }
 

@@ -14,11 +14,15 @@
 #include <optional>
 #include <span>
 #include <string_view>
+#include <sys/types.h>
 
 namespace platform {
 
 /// How long a kernel side may take to accept a request or to answer it.
 inline constexpr std::chrono::milliseconds kKernelTimeout{5000};
+
+/// Whose lines they are that tell of the kernel service, where a program gives no other name.
+inline constexpr std::string_view kDaemonName = "kstd";
 
 /// Pages for one message at a time, and a mark in them. In a child of the process both are zero.
 class MessagePages {
@@ -57,6 +61,9 @@ class MessagePages {
 ///
 /// A child of the process never uses the connection: its first request closes what was inherited
 /// and connects anew.
+///
+/// A connection that cannot be made leaves a warning with the socket's path and the reason, under
+/// the program's name. A reason is told once, until a connection was made.
 class KernelSocketConnection {
   public:
     using Deadline = KernelConnections::Deadline;
@@ -85,11 +92,14 @@ class KernelSocketConnection {
 
     /// `timeout` bounds each request, as long as no deadline is set. Without an address, or with a
     /// path that cannot be one, connecting gives the status of ENAMETOOLONG.
+    /// `program` outlives the connection.
     KernelSocketConnection(const std::optional<base::UnixAddress>& address, SystemLog& log,
-                           std::chrono::milliseconds timeout)
-        : address_(address), log_(log), timeout_(timeout) {}
-    KernelSocketConnection(std::string_view path, SystemLog& log, std::chrono::milliseconds timeout)
-        : KernelSocketConnection(base::UnixAddress::of(path), log, timeout) {}
+                           std::chrono::milliseconds timeout,
+                           std::string_view program = kDaemonName)
+        : address_(address), log_(log), timeout_(timeout), program_(program) {}
+    KernelSocketConnection(std::string_view path, SystemLog& log, std::chrono::milliseconds timeout,
+                           std::string_view program = kDaemonName)
+        : KernelSocketConnection(base::UnixAddress::of(path), log, timeout, program) {}
     KernelSocketConnection(const KernelSocketConnection&) = delete;
     KernelSocketConnection& operator=(const KernelSocketConnection&) = delete;
     virtual ~KernelSocketConnection() = default;
@@ -111,6 +121,15 @@ class KernelSocketConnection {
     /// Whether the next exchange goes over the connection as it is.
     [[nodiscard]] bool isConnected() const { return socket_.isOpen() && !expired_; }
 
+    /// Why the last attempt to connect failed, 0 when it did not.
+    [[nodiscard]] Status connectStatus() const { return connectStatus_; }
+
+    /// Of the socket, for a line of the log.
+    [[nodiscard]] std::string_view path() const {
+        return address_ ? address_->path() : "its socket";
+    }
+    [[nodiscard]] std::string_view program() const { return program_; }
+
     /// As KernelConnections. A connection whose answer did not come by the deadline ends when the
     /// deadline is taken away or when it is used again.
     void setDeadline(std::optional<Deadline> deadline);
@@ -130,6 +149,9 @@ class KernelSocketConnection {
     [[nodiscard]] bool isTimeUp() const;
     [[nodiscard]] Status connectAndGreet();
     [[nodiscard]] Status openSocket();
+    /// `stranger` becomes the user who serves and may not.
+    [[nodiscard]] Status connectSocket(std::optional<uid_t>& stranger);
+    void tell(Status status, std::optional<uid_t> stranger);
     /// Connects, and sends; once more when the peer had gone before.
     [[nodiscard]] Status handOver(wire::KernelOperation operation, Parts body);
     [[nodiscard]] Status send(wire::KernelOperation operation, Parts body);
@@ -145,6 +167,8 @@ class KernelSocketConnection {
     std::optional<base::UnixAddress> address_;
     SystemLog& log_;
     std::chrono::milliseconds timeout_;
+    std::string_view program_;
+    Status connectStatus_ = kSuccess;
     std::optional<Deadline> deadline_;
     /// When the time of the request under way is up.
     Deadline until_{};

@@ -56,6 +56,9 @@ LinuxKernelChannel::Opened* LinuxKernelChannel::find(ConnectionHandle connection
 
 Status LinuxKernelChannel::open(ServiceHandle service, std::uint32_t connectionType,
                                 ConnectionHandle* connection) {
+    if (const Status status = registry_.statusOf(service); status != kSuccess) {
+        return status;
+    }
     const auto path = RegistryPath::of(registry_.pathOf(service));
     if (!path) {
         return statusFromErrno(ENOENT);
@@ -65,7 +68,8 @@ Status LinuxKernelChannel::open(ServiceHandle service, std::uint32_t connectionT
     if (place == connections_.end()) {
         return statusFromErrno(EMFILE);
     }
-    Opened& opened = place->emplace(address_, log_, timeout_, connectionType, *path);
+    Opened& opened =
+        place->emplace(address_, log_, timeout_, registry_.program(), connectionType, *path);
     opened.setDeadline(deadline_);
     const Status status = opened.connect();
     if (status == kSuccess) {

@@ -17,7 +17,8 @@ class LinuxKernelChannel final : public KernelChannel {
     /// One more gives the status of EMFILE.
     static constexpr std::size_t kMaxConnections = 16;
 
-    /// The registry, which knows what the service handles stand for, outlives the channel.
+    /// The registry, which knows what the service handles stand for and which program asks,
+    /// outlives the channel.
     LinuxKernelChannel(std::string_view socketPath, const LinuxServiceRegistry& registry,
                        SystemLog& log, std::chrono::milliseconds timeout = kKernelTimeout);
 
@@ -42,8 +43,9 @@ class LinuxKernelChannel final : public KernelChannel {
     class Opened final : public KernelSocketConnection {
       public:
         Opened(const std::optional<base::UnixAddress>& address, SystemLog& log,
-               std::chrono::milliseconds timeout, std::uint32_t type, const RegistryPath& path)
-            : KernelSocketConnection(address, log, timeout), type_(type), path_(path) {}
+               std::chrono::milliseconds timeout, std::string_view program, std::uint32_t type,
+               const RegistryPath& path)
+            : KernelSocketConnection(address, log, timeout, program), type_(type), path_(path) {}
 
         /// Its handle means nothing any more.
         bool leftToParent = false;

@@ -20,21 +20,33 @@ std::optional<RegistryPath> RegistryPath::of(std::string_view text) {
 }
 
 LinuxServiceRegistry::LinuxServiceRegistry(std::string_view socketPath, SystemLog& log,
-                                           std::chrono::milliseconds timeout)
-    : log_(log), connection_(socketPath, log, timeout) {}
+                                           std::chrono::milliseconds timeout,
+                                           std::string_view program)
+    : log_(log), connection_(socketPath, log, timeout, program) {}
 
 ServiceHandle LinuxServiceRegistry::findByPath(std::string_view path) {
-    return path.size() > wire::kKernelMaxPathLength ? kNoService
-                                                    : find(wire::KernelOperation::findByPath, path);
+    if (path.size() > wire::kKernelMaxPathLength) {
+        return kNoService;
+    }
+    const Lookup found = lookUp(wire::KernelOperation::findByPath, path);
+    return found.path ? hold(found.path, kSuccess) : kNoService;
 }
 
 ServiceHandle LinuxServiceRegistry::findByClassName(std::string_view name) {
-    return name.size() > wire::kKernelMaxNameLength
-               ? kNoService
-               : find(wire::KernelOperation::findByClassName, name);
+    if (name.size() > wire::kKernelMaxNameLength) {
+        return kNoService;
+    }
+    const Lookup found = lookUp(wire::KernelOperation::findByClassName, name);
+    return found.path || isWithheld(found.outcome) ? hold(found.path, found.outcome) : kNoService;
 }
 
-ServiceHandle LinuxServiceRegistry::find(wire::KernelOperation operation, std::string_view key) {
+bool LinuxServiceRegistry::isWithheld(Outcome outcome) const {
+    return outcome != kSuccess && outcome != kNoEntry && outcome != statusFromErrno(ENOENT) &&
+           outcome != statusFromErrno(ENOTDIR);
+}
+
+LinuxServiceRegistry::Lookup LinuxServiceRegistry::lookUp(wire::KernelOperation operation,
+                                                          std::string_view key) {
     KernelSocketConnection::Reply reply;
     Outcome outcome = connection_.exchange(operation, {asBytes(key)}, reply);
     if (outcome == kSuccess) {
@@ -53,23 +65,24 @@ ServiceHandle LinuxServiceRegistry::find(wire::KernelOperation operation, std::s
         }
     }
     tell("find", key, outcome, lastFind_);
-    return path ? hold(*path) : kNoService;
+    return {outcome, path};
 }
 
-ServiceHandle LinuxServiceRegistry::hold(const RegistryPath& path) {
+ServiceHandle LinuxServiceRegistry::hold(const std::optional<RegistryPath>& path, Status status) {
     std::optional<Entry>* room = nullptr;
     for (auto& entry : entries_) {
         if (!entry) {
             room = &entry;
-        } else if (entry->path.text() == path.text()) {
+        } else if (path ? entry->path && entry->path->text() == path->text() : !entry->path) {
             ++entry->references;
+            entry->status = status;
             return entry->handle;
         }
     }
     if (room == nullptr) {
         return kNoService;
     }
-    room->emplace(Entry{++lastHandle_, 1, path});
+    room->emplace(Entry{++lastHandle_, 1, path, status});
     return lastHandle_;
 }
 
@@ -96,7 +109,8 @@ std::optional<std::vector<std::uint8_t>> LinuxServiceRegistry::copyProperty(Serv
 /// The line is made on the stack: a client may have no memory left.
 void LinuxServiceRegistry::tell(const char* what, std::string_view name, Outcome outcome,
                                 Outcome& last) {
-    if (outcome == std::exchange(last, outcome) || outcome == kSuccess) {
+    if (outcome == std::exchange(last, outcome) || outcome == kSuccess ||
+        outcome == connection_.connectStatus()) {
         return;
     }
     std::array<char, 32> number{};
@@ -110,11 +124,16 @@ void LinuxServiceRegistry::tell(const char* what, std::string_view name, Outcome
             std::snprintf(number.data(), number.size(), "refused with status %d", outcome));
     }
     constexpr std::size_t kMaxNameLength = wire::kKernelMaxNameLength;
-    std::array<char, kMaxNameLength + 128> line;
+    std::array<char, 2 * kMaxNameLength + 256> line;
+    const std::string_view program = connection_.program();
+    const std::string_view path = connection_.path();
     const int length = std::snprintf(
-        line.data(), line.size(), "kstd: ServiceRegistry: cannot %s %.*s: %s.\n", what,
-        static_cast<int>(std::min(name.size(), kMaxNameLength)), name.data(), reason);
-    log_.write(LogLevel::warning, {line.data(), static_cast<std::size_t>(length)}, {});
+        line.data(), line.size(), "%.*s: ServiceRegistry: cannot %s %.*s at %.*s: %s.\n",
+        static_cast<int>(program.size()), program.data(), what,
+        static_cast<int>(std::min(name.size(), kMaxNameLength)), name.data(),
+        static_cast<int>(path.size()), path.data(), reason);
+    const auto written = std::min(static_cast<std::size_t>(std::max(length, 0)), line.size() - 1);
+    log_.write(LogLevel::warning, {line.data(), written}, {});
 }
 
 void LinuxServiceRegistry::release(ServiceHandle entry) {
@@ -129,13 +148,21 @@ void LinuxServiceRegistry::setDeadline(std::optional<Deadline> deadline) noexcep
     connection_.setDeadline(deadline);
 }
 
+const LinuxServiceRegistry::Entry* LinuxServiceRegistry::find(ServiceHandle entry) const {
+    const auto held = std::find_if(entries_.begin(), entries_.end(), [entry](const auto& place) {
+        return place && place->handle == entry;
+    });
+    return held == entries_.end() ? nullptr : &**held;
+}
+
 std::string_view LinuxServiceRegistry::pathOf(ServiceHandle entry) const {
-    for (const auto& held : entries_) {
-        if (held && held->handle == entry) {
-            return held->path.text();
-        }
-    }
-    return {};
+    const Entry* const held = find(entry);
+    return held != nullptr && held->path ? held->path->text() : std::string_view();
+}
+
+Status LinuxServiceRegistry::statusOf(ServiceHandle entry) const {
+    const Entry* const held = find(entry);
+    return held != nullptr ? held->status : kSuccess;
 }
 
 } // namespace platform

@@ -29,16 +29,18 @@ class RegistryPath {
 
 /// ServiceRegistry over the kernel service's socket. Only a property is allocated.
 ///
-/// What cannot be found or copied leaves a warning with the reason: what the system says when the
-/// kernel service is not reached or does not answer, or what the service says. A reason is told
-/// once, until the same works again. That there is no such property is no failure.
+/// What cannot be found or copied leaves a warning with the socket's path and the reason, under the
+/// program's name: what the system says when the kernel service is not reached or does not answer,
+/// or what the service says. A reason is told once, until the same works again. That there is no
+/// such property is no failure.
 class LinuxServiceRegistry final : public ServiceRegistry {
   public:
     /// How many entries are held at the same time. One more is not found.
     static constexpr std::size_t kMaxEntries = 16;
 
     LinuxServiceRegistry(std::string_view socketPath, SystemLog& log,
-                         std::chrono::milliseconds timeout = kKernelTimeout);
+                         std::chrono::milliseconds timeout = kKernelTimeout,
+                         std::string_view program = kDaemonName);
 
     [[nodiscard]] ServiceHandle findByPath(std::string_view path) override;
     [[nodiscard]] ServiceHandle findByClassName(std::string_view name) override;
@@ -53,19 +55,37 @@ class LinuxServiceRegistry final : public ServiceRegistry {
     /// The registry path of an entry that is held, or an empty text. Stands until it is released.
     [[nodiscard]] std::string_view pathOf(ServiceHandle entry) const;
 
+    /// Why the kernel service could not be asked when this entry was found last; 0 when it was, or
+    /// when the entry is not held.
+    [[nodiscard]] Status statusOf(ServiceHandle entry) const;
+
+    /// Whose lines the registry's are.
+    [[nodiscard]] std::string_view program() const { return connection_.program(); }
+
   private:
     struct Entry {
         ServiceHandle handle;
         std::uint64_t references;
-        RegistryPath path;
+        /// None when the kernel service could not be asked for it.
+        std::optional<RegistryPath> path;
+        Status status;
     };
-
-    [[nodiscard]] ServiceHandle find(wire::KernelOperation operation, std::string_view key);
-    [[nodiscard]] ServiceHandle hold(const RegistryPath& path);
 
     /// How a request ended: as a status, or with no entry of that name.
     using Outcome = Status;
     static constexpr Outcome kNoEntry = kPlatformStatusBase;
+
+    /// What became of a lookup; with a path when the entry was found.
+    struct Lookup {
+        Outcome outcome;
+        std::optional<RegistryPath> path = std::nullopt;
+    };
+
+    [[nodiscard]] Lookup lookUp(wire::KernelOperation operation, std::string_view key);
+    /// Whether the kernel service is there and could not be asked.
+    [[nodiscard]] bool isWithheld(Outcome outcome) const;
+    [[nodiscard]] ServiceHandle hold(const std::optional<RegistryPath>& path, Status status);
+    [[nodiscard]] const Entry* find(ServiceHandle entry) const;
 
     /// Tells of a failure that is not the last one of its kind.
     void tell(const char* what, std::string_view name, Outcome outcome, Outcome& last);

@@ -105,10 +105,7 @@ TEST_F(Deadline, LookupAndOpening) {
     for (const int silent : {kFind, kOpen}) {
         silence(silent);
         KSTContextRef context = nullptr;
-        expectWithin([&] {
-            EXPECT_EQ(KSTContextCreate(&context),
-                      silent == kFind ? kKSTErrorUnexpected : kTimedOut);
-        });
+        expectWithin([&] { EXPECT_EQ(KSTContextCreate(&context), kTimedOut); });
         EXPECT_TRUE(commands().empty());
     }
     expectTheNextCallWorks();

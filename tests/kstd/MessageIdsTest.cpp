@@ -22,10 +22,12 @@
 #include "platform/linux/alarms/TimerAlarmWaker.h"
 #include "tests/kstd/Analytics/LoggerFixture.h"
 #include "tests/kstd/DaemonFixture.h"
+#include "tests/platform/linux/KernelReplies.h"
 #include "tests/platform/linux/RootDirectory.h"
 #include "tests/platform/linux/StandardErrorCapture.h"
 #include "tests/platform/linux/alarms/FakeAlarmHelper.h"
 #include "tests/support/ChildProcess.h"
+#include "tests/support/SeqpacketServer.h"
 
 #include <gtest/gtest.h>
 
@@ -59,6 +61,8 @@ namespace kstd {
 namespace {
 
 using Texts = std::vector<std::string>;
+
+constexpr std::chrono::seconds kPatient{30};
 
 /// The fixtures as plain objects, for one line each.
 struct DaemonParts : DaemonFixture {
@@ -132,6 +136,18 @@ Texts kernelThatNobodyServes() {
     return log.texts();
 }
 
+Texts kernelThatHasNoSuchEntry() {
+    const support::TemporaryDirectory directory;
+    platform::FakeSystemLog log;
+    const support::SeqpacketServer server(directory.file("socket"),
+                                          [](const support::SeqpacketServer::Peer& peer) {
+                                              peer.send(support::reply(peer.receive(), 0, 0, ""));
+                                          });
+    static_cast<void>(platform::LinuxServiceRegistry(directory.file("socket"), log, kPatient)
+                          .findByClassName("x"));
+    return log.texts();
+}
+
 Texts kernelOfAnotherUser() {
     const support::TemporaryDirectory directory;
     platform::FakeSystemLog log;
@@ -144,8 +160,7 @@ Texts kernelOfAnotherUser() {
     EXPECT_EQ(support::exitStatusOfChild(
                   [&] { return ::setuid(65534) == 0 && ::listen(listener.get(), 1) == 0 ? 0 : 1; }),
               0);
-    static_cast<void>(
-        platform::KernelSocketConnection(path, log, std::chrono::seconds(30)).connect());
+    static_cast<void>(platform::KernelSocketConnection(path, log, kPatient).connect());
     return log.texts();
 }
 
@@ -445,6 +460,7 @@ const std::vector<Example> kExamples = {
     {"kernelThatRefuses", message::kKernelServiceFailed, kernelThatRefuses},
     {"kernelThatIsNotThere", message::kKernelServiceFailed, kernelThatIsNotThere},
     {"kernelThatNobodyServes", message::kKernelServiceFailed, kernelThatNobodyServes},
+    {"kernelThatHasNoSuchEntry", message::kKernelServiceFailed, kernelThatHasNoSuchEntry},
     {"startThatIsNotTold", message::kKernelSideNotTold, startThatIsNotTold},
     {"settingThatIsNotTold", message::kKernelSideNotTold, kernelThatRefuses},
     {"fileThatCannotBeOpened", message::kStateFileFailed, fileThatCannotBeOpened},

@@ -1,17 +1,22 @@
 // The main job, on real programs: what ./run shows.
 
+#include "base/FileDescriptor.h"
+#include "base/UnixAddress.h"
 #include "tests/system/SystemFixture.h"
 
 #include <gmock/gmock.h>
 
 #include <chrono>
 #include <csignal>
+#include <filesystem>
+#include <sys/socket.h>
 
 namespace system_tests {
 namespace {
 
 using testing::ElementsAre;
 using testing::HasSubstr;
+using testing::IsSupersetOf;
 
 /// version 2, standardModeStartTimestamp 1700000000, lockedInRestrictedMode 1.
 const std::vector<std::uint8_t> kState{2, 0, 0, 0, 0x00, 0xf1, 0x53, 0x65, 0, 0, 0, 0, 1};
@@ -33,6 +38,22 @@ class RunSequenceTest : public SystemFixture {
         return std::chrono::duration_cast<std::chrono::seconds>(
                    std::chrono::system_clock::now().time_since_epoch())
             .count();
+    }
+
+    static constexpr char kKernelSocket[] = "/run/keystrand/service.sock";
+
+    [[nodiscard]] std::string cannotConnect(const std::string& reason) const {
+        return "kstd: KernelSocket: cannot connect to " + real(kKernelSocket) + ": " + reason + ".";
+    }
+
+    /// The lines, each of a failed check without the number of its line in the source.
+    static std::vector<std::string> withoutNumbers(std::vector<std::string> lines) {
+        for (std::string& line : lines) {
+            if (line.find(",  file: ") != std::string::npos) {
+                line.replace(line.rfind(':') + 1, std::string::npos, "<n>");
+            }
+        }
+        return lines;
     }
 };
 
@@ -132,32 +153,24 @@ TEST_F(RunSequenceTest, KernelAbsentAtTheStartAndPresentLater) {
     putFile(kAnalyticsFile, analytics(0x40));
     const auto daemon = startDaemon();
     // The order of the lines on the two outputs is part of it.
-    std::vector<std::string> lines = daemon->lines();
-    for (std::string& line : lines) {
-        const auto number =
-            line.find(",  file: ") == std::string::npos ? std::string::npos : line.rfind(':');
-        if (number != std::string::npos) {
-            line.replace(number + 1, std::string::npos, "<n>");
-        }
-    }
-    EXPECT_THAT(lines,
-                ElementsAre("kstd: main: Started service - <DeviceRestrictedModeService>.",
-                            "kstd: -[DeviceRestrictedModeService start]: called, .",
-                            "kstd: -[DeviceRestrictedModeService loadDataBlob:]: called, filePath "
-                            "= /var/root/.usbrestrictedmode_analytics.",
-                            "kstd: ServiceRegistry: cannot find Keystrand: No such file or "
-                            "directory.",
-                            "KSTLib: AssertMacros: service (value: 0x0),  file: KSTLib/KSTLib:<n>",
-                            "KST: AssertMacros: err == 0  (value: 0xfffffffffffffffb),  file: "
-                            "common/LibCallBlock:<n>",
-                            "KST: LibCall_KSTKernelControl_Block: returning, err = -5.",
-                            "KSTLib: KSTKernelControl: returning, err = -5.",
-                            "kstd: AssertMacros: err == 0  (value: 0xfffffffffffffffb),  file: "
-                            "kstd/DeviceRestrictedMode/DeviceRestrictedModeService:<n>",
-                            "kstd: -[DeviceRestrictedModeService notifyDaemonStarted]: returning, "
-                            "err = -5.",
-                            "kstd: -[DeviceRestrictedModeService start]: returning, .",
-                            "kstd: main: Entering the main runloop."));
+    EXPECT_THAT(
+        withoutNumbers(daemon->lines()),
+        ElementsAre(
+            "kstd: main: Started service - <DeviceRestrictedModeService>.",
+            "kstd: -[DeviceRestrictedModeService start]: called, .",
+            "kstd: -[DeviceRestrictedModeService loadDataBlob:]: called, filePath "
+            "= /var/root/.usbrestrictedmode_analytics.",
+            cannotConnect("No such file or directory"),
+            "KSTLib: AssertMacros: service (value: 0x0),  file: KSTLib/KSTLib:<n>",
+            "KST: AssertMacros: err == 0  (value: 0xfffffffffffffffb),  file: "
+            "common/LibCallBlock:<n>",
+            "KST: LibCall_KSTKernelControl_Block: returning, err = -5.",
+            "KSTLib: KSTKernelControl: returning, err = -5.",
+            "kstd: AssertMacros: err == 0  (value: 0xfffffffffffffffb),  file: "
+            "kstd/DeviceRestrictedMode/DeviceRestrictedModeService:<n>",
+            "kstd: -[DeviceRestrictedModeService notifyDaemonStarted]: returning, err = -5.",
+            "kstd: -[DeviceRestrictedModeService start]: returning, .",
+            "kstd: main: Entering the main runloop."));
     sendEvent("com.zerva.Keystrand.KSTRMSaveAnalytics");
     ASSERT_TRUE(daemon->awaitLine("XXX Daemon: EMPTY IGNORING KSTRMSaveAnalytics."));
 
@@ -165,6 +178,33 @@ TEST_F(RunSequenceTest, KernelAbsentAtTheStartAndPresentLater) {
     kernel("publish save-analytics " + hex(analytics(0x60)));
     kernel("wait acks=1");
     EXPECT_EQ(file(kAnalyticsFile), analytics(0x60));
+}
+
+TEST_F(RunSequenceTest, KernelSocketThatNobodyServes) {
+    std::filesystem::create_directories(root.path() / "run/keystrand");
+    {
+        const base::FileDescriptor socket(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
+        const auto address = base::UnixAddress::of(real(kKernelSocket)).value();
+        ASSERT_EQ(::bind(socket.get(), address.get(), address.size()), 0);
+    }
+    putFile(kAnalyticsFile, analytics(0x40));
+    const auto daemon = startDaemon();
+    // -1111, also as 64 bits in hexadecimal: not what an absent kernel side gives.
+    EXPECT_THAT(
+        withoutNumbers(daemon->lines()),
+        IsSupersetOf({
+            cannotConnect("Connection refused"),
+            std::string("KSTLib: AssertMacros: err == 0  (value: 0xfffffffffffffba9),  file: "
+                        "KSTLib/KSTLib:<n>"),
+            std::string("KSTLib: KSTKernelControl: returning, err = -1111."),
+            std::string("kstd: AssertMacros: err == 0  (value: 0xfffffffffffffba9),  file: "
+                        "kstd/DeviceRestrictedMode/DeviceRestrictedModeService:<n>"),
+            std::string("kstd: -[DeviceRestrictedModeService notifyDaemonStarted]: returning, "
+                        "err = -5."),
+        }));
+    startKernel();
+    kernel("publish save-analytics " + hex(analytics(0x60)));
+    kernel("wait acks=1");
 }
 
 TEST_F(RunSequenceTest, ModelOfTheTimerDrivesTheDaemonByItself) {

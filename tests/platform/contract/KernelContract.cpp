@@ -83,10 +83,14 @@ TEST_P(KernelContract, OtherNamesFindNothing) {
     EXPECT_NE(registry().findByPath(kPath), kNoService) << "the registry works on";
 }
 
-TEST_P(KernelContract, UnreachableRegistryHasNoEntries) {
+TEST_P(KernelContract, UnreachableRegistryHasNothingThatCanBeOpened) {
     fixture().setReachable(false);
     EXPECT_EQ(registry().findByPath(kPath), kNoService);
-    EXPECT_EQ(registry().findByClassName(kClass), kNoService);
+    const ServiceHandle service = registry().findByClassName(kClass);
+    ConnectionHandle connection = kNoConnection;
+    EXPECT_TRUE(isPlatformStatus(channel().open(service, 0, &connection)));
+    EXPECT_EQ(connection, kNoConnection);
+    registry().release(service);
 }
 
 TEST_P(KernelContract, EntryIsLookedUpAnewOnEveryCall) {

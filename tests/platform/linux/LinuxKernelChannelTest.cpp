@@ -152,7 +152,118 @@ TEST_F(LinuxKernelChannelTest, AbsentSocketIsENOENTAndAnUnservedOneECONNREFUSED)
     EXPECT_EQ(nobody.connect(), statusFromErrno(ECONNREFUSED));
     KernelSocketConnection tooLong(std::string(108, 'x'), log, kPatient);
     EXPECT_EQ(tooLong.connect(), statusFromErrno(ENAMETOOLONG));
-    EXPECT_THAT(log.texts(), ElementsAre());
+    const std::string line = "kstd: KernelSocket: cannot connect to ";
+    EXPECT_THAT(log.texts(), ElementsAre(line + path + ": No such file or directory.",
+                                         line + path + ": Connection refused.",
+                                         line + "its socket: File name too long."));
+}
+
+TEST_F(LinuxKernelChannelTest, ReasonIsToldOnceUntilAConnectionWasMade) {
+    KernelSocketConnection client(path, log, kPatient, "a-program");
+    const std::string line = "a-program: KernelSocket: cannot connect to " + path + ": ";
+    for (int i = 0; i < 2; ++i) {
+        EXPECT_EQ(client.connect(), statusFromErrno(ENOENT));
+        EXPECT_THAT(log.texts(), ElementsAre(line + "No such file or directory."));
+    }
+    serveAnswers([](const Packet& request) { return reply(request, 0, 0, ""); });
+    EXPECT_EQ(client.connect(), kSuccess);
+    EXPECT_EQ(client.connectStatus(), kSuccess);
+    client.disconnect();
+    server.reset();
+    EXPECT_EQ(client.connect(), statusFromErrno(ECONNREFUSED));
+    EXPECT_EQ(client.connectStatus(), statusFromErrno(ECONNREFUSED));
+    EXPECT_THAT(log.texts(),
+                ElementsAre(line + "No such file or directory.", line + "Connection refused."));
+}
+
+TEST_F(LinuxKernelChannelTest, LongestNamesAndPathsFitIntoALine) {
+    path.append(107 - path.size(), 'p');
+    const std::string program(255, 'n');
+    LinuxServiceRegistry named(path, log, kPatient, program);
+    const std::string service(255, 's');
+    EXPECT_EQ(named.findByClassName(service), kNoService);
+    server.emplace(path, [](const SeqpacketServer::Peer& peer) {
+        peer.send(reply(peer.receive(), statusFromErrno(ENOTRECOVERABLE), 0, ""));
+    });
+    EXPECT_NE(named.findByClassName(service), kNoService);
+    EXPECT_THAT(log.texts(), ElementsAre(program + ": KernelSocket: cannot connect to " + path +
+                                             ": No such file or directory.",
+                                         program + ": ServiceRegistry: cannot find " + service +
+                                             " at " + path + ": State not recoverable."));
+}
+
+/// What opening fails with when the service was looked up by its class.
+class WithheldServiceTest : public LinuxKernelChannelTest {
+  protected:
+    void expectOpening(Status status, const std::string& line) {
+        for (int i = 0; i < 2; ++i) {
+            EXPECT_EQ(registry.findByPath("/entry"), kNoService);
+            EXPECT_NE(registry.findByClassName("Keystrand"), kNoService);
+            EXPECT_EQ(open(), status);
+            EXPECT_EQ(connection, kNoConnection);
+        }
+        EXPECT_THAT(log.texts(), ElementsAre(line));
+    }
+};
+
+TEST_F(WithheldServiceTest, SocketThatNobodyServes) {
+    serveAnswers([](const Packet& request) { return reply(request, 0, 0, ""); });
+    server.reset();
+    expectOpening(statusFromErrno(ECONNREFUSED),
+                  "kstd: KernelSocket: cannot connect to " + path + ": Connection refused.");
+    serveAnswers([](const Packet& request) { return reply(request, 0, 0, ""); });
+    EXPECT_EQ(open(), kSuccess);
+}
+
+TEST_F(WithheldServiceTest, SocketThatIsNotThisUsers) {
+    if (::geteuid() != 0) {
+        GTEST_SKIP() << "needs root, to become a user who may not";
+    }
+    ASSERT_EQ(::chmod(directory.path().c_str(), 0755), 0);
+    serveAnswers([](const Packet& request) { return reply(request, 0, 0, ""); });
+    ASSERT_EQ(::chmod(path.c_str(), 0600), 0);
+    EXPECT_EQ(support::exitStatusOfChild([&] {
+                  constexpr uid_t kNobody = 65534;
+                  if (::setuid(kNobody) != 0) {
+                      return 1;
+                  }
+                  expectOpening(statusFromErrno(EACCES), "kstd: KernelSocket: cannot connect to " +
+                                                             path + ": Permission denied.");
+                  return HasFailure() ? 2 : 0;
+              }),
+              0);
+}
+
+TEST_F(WithheldServiceTest, ServiceThatRefusesTheLookup) {
+    server.emplace(path, [](const SeqpacketServer::Peer& peer) {
+        for (Packet request = peer.receive(); !request.empty(); request = peer.receive()) {
+            peer.send(reply(request, -6002, 0, ""));
+        }
+    });
+    EXPECT_NE(registry.findByClassName("Keystrand"), kNoService);
+    EXPECT_EQ(open(), -6002);
+    EXPECT_THAT(log.texts(), ElementsAre("kstd: ServiceRegistry: cannot find Keystrand at " + path +
+                                         ": refused with status -6002."));
+}
+
+TEST_F(WithheldServiceTest, ServiceThatSaysNothing) {
+    server.emplace(path, [](const SeqpacketServer::Peer& peer) { peer.stayingSilent(); });
+    LinuxServiceRegistry impatient(path, log, std::chrono::milliseconds(20));
+    LinuxKernelChannel on(path, impatient, log, kPatient);
+    EXPECT_EQ(on.open(impatient.findByClassName("Keystrand"), 0, &connection),
+              statusFromErrno(ETIMEDOUT));
+    EXPECT_THAT(log.texts(), ElementsAre("kstd: ServiceRegistry: cannot find Keystrand at " + path +
+                                         ": Connection timed out."));
+}
+
+TEST_F(WithheldServiceTest, LookupsThatFailDoNotUseUpTheEntries) {
+    serveAnswers([](const Packet& request) { return reply(request, 0, 0, ""); });
+    server.reset();
+    for (std::size_t i = 0; i < 2 * LinuxServiceRegistry::kMaxEntries; ++i) {
+        EXPECT_NE(registry.findByClassName("Keystrand"), kNoService);
+    }
+    serveAnswers([](const Packet& request) { return reply(request, 0, 0, ""); });
+    EXPECT_EQ(open(), kSuccess);
 }
 
 TEST_F(LinuxKernelChannelTest, HandleThatIsNotHeldCannotBeOpened) {
@@ -341,7 +452,7 @@ TEST_F(LinuxKernelChannelTest, ConnectionIsNotMadeAfterTheDeadline) {
     channel.setDeadline(std::chrono::steady_clock::now());
     EXPECT_EQ(channel.open(service, 0, &connection), statusFromErrno(ETIMEDOUT));
     registry.setDeadline(std::chrono::steady_clock::now());
-    EXPECT_EQ(registry.findByClassName("Keystrand"), kNoService);
+    EXPECT_EQ(open(), statusFromErrno(ETIMEDOUT));
     EXPECT_EQ(opens, 0);
     registry.setDeadline(std::nullopt);
     channel.setDeadline(std::nullopt);

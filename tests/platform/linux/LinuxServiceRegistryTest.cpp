@@ -177,15 +177,17 @@ class RegistryWarningsTest : public LinuxServiceRegistryTest {
         return texts;
     }
 
-    static std::vector<std::string> cannotFind(const std::string& reason) {
-        return {"kstd: ServiceRegistry: cannot find Keystrand: " + reason + "."};
+    [[nodiscard]] std::vector<std::string> cannotFind(const std::string& reason) const {
+        return {"kstd: ServiceRegistry: cannot find Keystrand at " + path + ": " + reason + "."};
     }
 
     const std::vector<std::string> none{};
 };
 
 TEST_F(RegistryWarningsTest, AbsentKernelSide) {
-    EXPECT_EQ(warningsOf(registry), cannotFind("No such file or directory"));
+    EXPECT_EQ(warningsOf(registry),
+              std::vector<std::string>{"kstd: KernelSocket: cannot connect to " + path +
+                                       ": No such file or directory."});
     EXPECT_EQ(warningsOf(registry), none);
 }
 
@@ -236,8 +238,8 @@ TEST_F(RegistryWarningsTest, CopyThatIsRefusedAndPropertyThatIsNotThere) {
     status = -7;
     EXPECT_EQ(registry.copyProperty(entry, "N"), std::nullopt);
     EXPECT_EQ(registry.copyProperty(entry, "N"), std::nullopt);
-    EXPECT_EQ(log.texts(), std::vector<std::string>{
-                               "kstd: ServiceRegistry: cannot copy N: refused with status -7."});
+    EXPECT_EQ(log.texts(), std::vector<std::string>{"kstd: ServiceRegistry: cannot copy N at " +
+                                                    path + ": refused with status -7."});
 }
 
 } // namespace
