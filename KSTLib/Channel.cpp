@@ -106,7 +106,7 @@ CallScope::CallScope() noexcept : outer_(call) {
     const LibraryPlatform* platform = installedPlatform();
     call = {};
     if (platform != nullptr) {
-        call.deadline = std::chrono::steady_clock::now() + platform->callLimit;
+        call.deadline = platform->callTime.now() + platform->callTime.limit;
     }
     setDeadline(call.deadline);
 }
@@ -117,7 +117,8 @@ CallScope::~CallScope() {
 }
 
 bool isTimeUp() noexcept {
-    return call.deadline && std::chrono::steady_clock::now() >= *call.deadline;
+    const LibraryPlatform* platform = installedPlatform();
+    return platform != nullptr && call.deadline && platform->callTime.now() >= *call.deadline;
 }
 
 bool isConnectionLost() noexcept {

@@ -22,7 +22,7 @@ struct CallState {
 };
 
 /// One call of an exported function: whatever it sends has one time limit, LibraryPlatform's
-/// `callLimit`. A call that a result block makes has its own.
+/// `callTime`. A call that a result block makes has its own.
 class CallScope {
   public:
     CallScope() noexcept;

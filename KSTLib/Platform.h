@@ -10,13 +10,20 @@
 /// What the library stands on: one set for the process. Not synchronised.
 namespace kst {
 
+/// How long an exported function may wait for the kernel side in all, and the clock that says when
+/// that is over.
+struct CallTime {
+    std::chrono::milliseconds limit{5000};
+    std::chrono::steady_clock::time_point (*now)() = std::chrono::steady_clock::now;
+};
+inline constexpr CallTime kUsualCallTime;
+
 /// Nothing is owned; each outlives its use by the library.
 struct LibraryPlatform {
     platform::SystemLog& log;
     platform::ServiceRegistry& registry;
     platform::KernelChannel& channel;
-    /// How long an exported function may wait for the kernel side in all.
-    std::chrono::milliseconds callLimit{5000};
+    const CallTime& callTime = kUsualCallTime;
 };
 
 /// Makes `platform` what the library stands on and starts the library anew: no connection, the

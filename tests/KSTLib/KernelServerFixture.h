@@ -1,5 +1,6 @@
 #pragma once
 
+#include "KSTLib/Channel.h"
 #include "KSTLib/KSTLib.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/Platform.h"
@@ -46,7 +47,9 @@ class KernelServerFixture : public LibraryFixture {
     void SetUp() override {
         LibraryFixture::SetUp();
         server_.emplace(path_, [this](const Peer& peer) { serve(peer); });
-        install(kPatient);
+        channel_.emplace(path_, registry_, log, kPatient);
+        ahead_.store({});
+        kst::installPlatform({log, registry_, *channel_, callTime_});
     }
 
     void TearDown() override {
@@ -55,10 +58,14 @@ class KernelServerFixture : public LibraryFixture {
         LibraryFixture::TearDown();
     }
 
-    /// Lets a call of the library wait no longer than that.
-    void install(std::chrono::milliseconds callLimit) {
-        channel_.emplace(path_, registry_, log, kPatient);
-        kst::installPlatform({log, registry_, *channel_, callLimit});
+    /// Lets a call of the library that begins from now on wait no longer than that.
+    void setCallLimit(std::chrono::milliseconds limit) { callTime_.limit = limit; }
+
+    /// From now on the time of each call that has begun is over.
+    static void outlastTheCall() {
+        while (!kst::isTimeUp()) {
+            ahead_.store(ahead_.load() + kPatient);
+        }
     }
 
     KSTContextRef openContext() {
@@ -182,9 +189,17 @@ class KernelServerFixture : public LibraryFixture {
         note({connection, kEnd, 0});
     }
 
+    static std::chrono::steady_clock::time_point now() {
+        return std::chrono::steady_clock::now() + ahead_.load();
+    }
+
+    /// How far the library's clock is ahead of the one by which the connection waits.
+    static inline std::atomic<std::chrono::milliseconds> ahead_{};
+
     TemporaryDirectory directory_;
     std::string path_ = directory_.file("service.sock");
     platform::LinuxServiceRegistry registry_{path_, log, kPatient};
+    kst::CallTime callTime_{kPatient, now};
     std::optional<platform::LinuxKernelChannel> channel_;
     std::mutex mutex_;
     std::condition_variable arrived_;
