@@ -1,7 +1,6 @@
 #include "common/CredentialTypes.h"
 
 #include "KSTLib/Credential.h"
-#include "base/ByteReader.h"
 
 #include <algorithm>
 #include <array>
@@ -58,46 +57,7 @@ const CredentialType* findCredentialType(std::uint32_t type) noexcept {
     return isCredentialType(type) ? &kTypes[type - 1] : nullptr;
 }
 
-std::uint32_t passphraseLength(const KSTCredential* credential) noexcept {
-    base::ByteReader reader(credentialData(credential));
-    std::uint32_t length = 0;
-    if (!reader.skip(offsetof(KSTCredentialDataPassphraseEntered, passphraseLength)) ||
-        !reader.readU32(length)) {
-        return 0;
-    }
-    const std::size_t room = std::min<std::size_t>(kKSTPassphraseMaxLength, reader.left());
-    return std::min(length, static_cast<std::uint32_t>(room));
-}
-
 namespace {
-
-using Place = CredentialProperty::Place;
-using Passcode = KSTCredentialDataPasscodeValidated;
-using Passphrase = KSTCredentialDataPassphraseEntered;
-using Biometry = KSTCredentialDataBiometryMatched;
-using Output = KSTCredentialDataUserOutputDisplayed;
-using Unlock = KSTCredentialDataContinuityUnlock;
-using Passcode2 = KSTCredentialDataPasscodeValidated2;
-using DenyList = KSTCredentialDataKextDenyList;
-
-template <std::uint32_t Type, std::size_t Offset>
-constexpr Place kOnlyPlace[] = {{Type, Offset}};
-
-template <std::size_t Offset>
-constexpr std::span<const Place> kHeader = kOnlyPlace<CredentialProperty::kEveryType, Offset>;
-
-constexpr Place kPlacesOf100[] = {
-    {kKSTCredentialTypePasscodeValidated, offsetof(Passcode, property100)},
-    {kKSTCredentialTypeBiometryMatched, offsetof(Biometry, property100)},
-    {kKSTCredentialTypeContinuityUnlock, offsetof(Unlock, property100)},
-};
-
-constexpr Place kPlacesOf101[] = {
-    {kKSTCredentialTypePasscodeValidated, offsetof(Passcode, property101)},
-    {kKSTCredentialTypeBiometryMatched, offsetof(Biometry, property101)},
-    {kKSTCredentialTypeContinuityUnlock, offsetof(Unlock, property101)},
-    {kKSTCredentialTypePasscodeValidated2, offsetof(Passcode2, property101)},
-};
 
 constexpr const char* kIsPasscode = "credential->type == kKSTCredentialTypePasscodeValidated";
 constexpr const char* kIsPassphrase = "credential->type == kKSTCredentialTypePassphraseEntered";
@@ -112,38 +72,39 @@ constexpr const char* kHas32 = "dataLength == 32";
 constexpr const char* kHasUuid = "dataLength == sizeof(uuid_t)";
 
 constexpr std::array<CredentialProperty, 19> kProperties = {{
-    {1, 8, nullptr, nullptr, kHeader<offsetof(KSTCredential, word16)>},
-    {2, 4, nullptr, nullptr, kHeader<offsetof(KSTCredential, word24)>},
-    {3, 4, nullptr, nullptr, kHeader<offsetof(KSTCredential, type)>},
-    {4, 4, nullptr, nullptr, kHeader<offsetof(KSTCredential, word4)>},
-    {5, 4, nullptr, "dataLength == sizeof(uid_t)", kHeader<offsetof(KSTCredential, userId)>},
-    {kIdentifierProperty, 16, kIsBiometry, kHas16, kPlacesOf100},
-    {101, 4, kIsPasscode2, "dataLength == sizeof(uint32_t)", kPlacesOf101},
-    {102, 4, kIsPasscode, "dataLength == sizeof(int32_t)",
-     kOnlyPlace<kKSTCredentialTypePasscodeValidated, offsetof(Passcode, property102)>},
-    {kPassphraseProperty, kKSTPassphraseMaxLength, kIsPassphrase, "dataLength <= 128",
-     kOnlyPlace<kKSTCredentialTypePassphraseEntered, offsetof(Passphrase, passphrase)>},
-    {201, 4, kIsPassphrase, "dataLength == sizeof(KSTPassphrasePurpose)",
-     kOnlyPlace<kKSTCredentialTypePassphraseEntered, offsetof(Passphrase, purpose)>},
-    {300, 16, kIsBiometry, kHas16,
-     kOnlyPlace<kKSTCredentialTypeBiometryMatched, offsetof(Biometry, property300)>},
-    {301, 32, kIsBiometry, kHas32,
-     kOnlyPlace<kKSTCredentialTypeBiometryMatched, offsetof(Biometry, property301)>},
-    {302, 16, kIsBiometry, kHas16,
-     kOnlyPlace<kKSTCredentialTypeBiometryMatched, offsetof(Biometry, property302)>},
-    {400, 32, kIsOutput, kHas32,
-     kOnlyPlace<kKSTCredentialTypeUserOutputDisplayed, offsetof(Output, property400)>},
-    {401, 24, kIsOutput, kHas24,
-     kOnlyPlace<kKSTCredentialTypeUserOutputDisplayed, offsetof(Output, property401)>},
-    {501, 16, kIsPasscode2, kHasUuid,
-     kOnlyPlace<kKSTCredentialTypePasscodeValidated2, offsetof(Passcode2, property501)>},
-    {502, 16, kIsPasscode2, kHasUuid,
-     kOnlyPlace<kKSTCredentialTypePasscodeValidated2, offsetof(Passcode2, property502)>},
-    {601, 4, kIsDenyList, "dataLength == sizeof(KSTKextDenyListFormat)",
-     kOnlyPlace<kKSTCredentialTypeKextDenyList, offsetof(DenyList, format)>},
-    {602, 4, kIsDenyList, "dataLength == sizeof(KSTKextDenyListRevision)",
-     kOnlyPlace<kKSTCredentialTypeKextDenyList, offsetof(DenyList, revision)>},
+    {1, 8, nullptr, nullptr, offsetof(KSTCredential, word16)},
+    {2, 4, nullptr, nullptr, offsetof(KSTCredential, word24)},
+    {3, 4, nullptr, nullptr, offsetof(KSTCredential, type)},
+    {4, 4, nullptr, nullptr, offsetof(KSTCredential, word4)},
+    {5, 4, nullptr, "dataLength == sizeof(uid_t)", offsetof(KSTCredential, userId)},
+    {kIdentifierProperty, 16, kIsBiometry, kHas16},
+    {101, 4, kIsPasscode2, "dataLength == sizeof(uint32_t)"},
+    {102, 4, kIsPasscode, "dataLength == sizeof(int32_t)"},
+    {kPassphraseProperty, kKSTPassphraseMaxLength, kIsPassphrase, "dataLength <= 128"},
+    {201, 4, kIsPassphrase, "dataLength == sizeof(KSTPassphrasePurpose)"},
+    {300, 16, kIsBiometry, kHas16},
+    {301, 32, kIsBiometry, kHas32},
+    {302, 16, kIsBiometry, kHas16},
+    {400, 32, kIsOutput, kHas32},
+    {401, 24, kIsOutput, kHas24},
+    {501, 16, kIsPasscode2, kHasUuid},
+    {502, 16, kIsPasscode2, kHasUuid},
+    {601, 4, kIsDenyList, "dataLength == sizeof(KSTKextDenyListFormat)"},
+    {602, 4, kIsDenyList, "dataLength == sizeof(KSTKextDenyListRevision)"},
 }};
+
+/// Both tables speak of the same properties, in the same lengths.
+static_assert(std::all_of(kProperties.begin(), kProperties.end(), [](const auto& property) {
+    const auto& fields = wire::kCredentialFields;
+    const auto has = [&property](const auto& field) {
+        return field.property == property.id;
+    };
+    return std::any_of(fields.begin(), fields.end(), has) !=
+               (property.headerOffset != CredentialProperty::kInData) &&
+           std::all_of(fields.begin(), fields.end(), [&](const auto& field) {
+               return !has(field) || field.length == property.length;
+           });
+}));
 
 } // namespace
 

@@ -1,11 +1,10 @@
 #pragma once
 
 #include "KSTLib/Credential.h"
+#include "wire/CredentialFields.h"
 
-#include <algorithm>
 #include <cstddef>
 #include <cstdint>
-#include <span>
 
 namespace kst {
 
@@ -23,24 +22,10 @@ struct CredentialType {
 /// Null for a type that does not exist.
 [[nodiscard]] const CredentialType* findCredentialType(std::uint32_t type) noexcept;
 
-/// The bytes of a credential whose data area has `dataLength` bytes.
-[[nodiscard]] constexpr std::size_t credentialSize(std::uint32_t dataLength) noexcept {
-    return sizeof(KSTCredential) + dataLength;
-}
-
-[[nodiscard]] inline std::span<const std::uint8_t>
-credentialBytes(const KSTCredential* credential) noexcept {
-    return {reinterpret_cast<const std::uint8_t*>(credential),
-            credentialSize(credential->dataLength)};
-}
-
-[[nodiscard]] inline std::span<const std::uint8_t>
-credentialData(const KSTCredential* credential) noexcept {
-    return credentialBytes(credential).subspan(sizeof(KSTCredential));
-}
-
-/// How much of the passphrase area is in use: never more than the area has.
-[[nodiscard]] std::uint32_t passphraseLength(const KSTCredential* credential) noexcept;
+using wire::credentialBytes;
+using wire::credentialData;
+using wire::credentialSize;
+using wire::passphraseLength;
 
 /// The passphrase, whose length may be less than its place has.
 inline constexpr std::uint32_t kPassphraseProperty = 200;
@@ -49,13 +34,7 @@ inline constexpr std::uint32_t kIdentifierProperty = 100;
 
 /// One property of a credential.
 struct CredentialProperty {
-    struct Place {
-        /// kEveryType: the place is in the header.
-        std::uint32_t type;
-        /// In the data area, or in the header.
-        std::size_t offset;
-    };
-    static constexpr std::uint32_t kEveryType = 0;
+    static constexpr std::size_t kInData = SIZE_MAX;
 
     std::uint32_t id;
     std::size_t length;
@@ -63,17 +42,10 @@ struct CredentialProperty {
     const char* typeCheck;
     /// The text of the check of a length to be set. Null: the property cannot be set.
     const char* lengthCheck;
-    std::span<const Place> places;
+    /// kInData: it is in the data area, where wire::kCredentialFields says.
+    std::size_t headerOffset = kInData;
 
-    [[nodiscard]] bool isInHeader() const { return places.front().type == kEveryType; }
-
-    /// Null when a credential of that type does not have it.
-    [[nodiscard]] const Place* placeIn(std::uint32_t type) const {
-        const auto place =
-            std::find_if(places.begin(), places.end(),
-                         [type](const Place& candidate) { return candidate.type == type; });
-        return place != places.end() ? &*place : nullptr;
-    }
+    [[nodiscard]] bool isInHeader() const { return headerOffset != kInData; }
 };
 
 /// Null when there is none of that number.

@@ -5,6 +5,7 @@
 #include "common/CredentialTypes.h"
 #include "common/Failure.h"
 #include "common/RequirementLayout.h"
+#include "wire/CredentialFields.h"
 
 #include <cstring>
 #include <string.h>
@@ -48,10 +49,10 @@ KSTStatus locate(const KSTCredential* credential, const CredentialProperty* prop
         return kst::fail(assertionContext(), "0", 0, kKSTErrorBadParameter);
     }
     if (property->isInHeader()) {
-        offset = property->places.front().offset;
+        offset = property->headerOffset;
         return kKSTErrorSuccess;
     }
-    const CredentialProperty::Place* place = property->placeIn(credential->type);
+    const wire::CredentialField* place = wire::findCredentialField(credential->type, property->id);
     if (place == nullptr) {
         return kst::fail(assertionContext(), property->typeCheck, 0, kKSTErrorBadParameter);
     }

@@ -3,7 +3,6 @@
 #include "KSTLib/Command.h"
 #include "base/ByteReader.h"
 #include "base/Concat.h"
-#include "common/ContextObject.h"
 #include "kstctl/decode/Decoders.h"
 #include "wire/CommandTable.h"
 #include "wire/RestrictedMode.h"
@@ -90,7 +89,7 @@ struct HandleAndNumbers {
 std::optional<HandleAndNumbers> read(Bytes bytes) {
     HandleAndNumbers payload;
     base::ByteReader reader(bytes);
-    if (!kst::readHandle(reader, payload.handle) || !reader.readU32(payload.first) ||
+    if (!reader.readBytes(payload.handle.bytes, kKSTHandleSize) || !reader.readU32(payload.first) ||
         !reader.readU32(payload.second)) {
         return std::nullopt;
     }
@@ -125,7 +124,7 @@ Result decodeNoPayload(Bytes /*bytes*/, Secrets /*secrets*/) {
 
 Result decodeHandle(Bytes bytes, Secrets /*secrets*/) {
     KSTHandle handle{};
-    if (base::ByteReader reader(bytes); !kst::readHandle(reader, handle)) {
+    if (base::ByteReader reader(bytes); !reader.readBytes(handle.bytes, kKSTHandleSize)) {
         return tooShort(kKSTHandleSize, bytes.size());
     }
     Decoded decoded{.fields = {}, .size = kKSTHandleSize};
