@@ -14,10 +14,10 @@
 #include "bench/support/SystemError.h"
 #include "kstd/Daemon.h"
 #include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
-#include "platform/HostWith.h"
 #include "platform/MainRunLoop.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"
+#include "tests/support/HostWith.h"
 #include "wire/EventDatagram.h"
 #include "wire/RestrictedMode.h"
 
@@ -130,7 +130,7 @@ class Series {
           linuxHost_(
               {.paths = paths_, .eventSocket = platform::makeEventSocket(paths_.eventSocket())}),
           loop_([this] { measure(); }),
-          host_(platform::hostWith(linuxHost_.interfaces(), {.log = otherLog, .runLoop = &loop_})),
+          host_(support::hostWith(linuxHost_.interfaces(), {.log = otherLog, .runLoop = &loop_})),
           handled_(std::make_shared<Handled>(host_)),
           sender_(paths_.eventSocket()) {}
 

@@ -9,8 +9,8 @@
 #include "bench/support/Quiet.h"
 #include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
 #include "kstd/DeviceRestrictedMode/StateFilePaths.h"
-#include "platform/HostWith.h"
 #include "platform/linux/LinuxHost.h"
+#include "tests/support/HostWith.h"
 #include "wire/RestrictedMode.h"
 
 #include <memory>
@@ -47,8 +47,7 @@ void measure(const bench::Options& options, const std::filesystem::path& directo
     platform::LinuxHost linuxHost({.paths = paths});
     const platform::Host host = linuxHost.interfaces();
     const auto service = DeviceRestrictedModeService::make(host);
-    const auto silent =
-        DeviceRestrictedModeService::make(platform::hostWith(host, {.log = &noLog}));
+    const auto silent = DeviceRestrictedModeService::make(support::hostWith(host, {.log = &noLog}));
 
     bench::printHead(base::concat("saveDataBlob of 13 bytes against a bare pwrite and fsync, ",
                                   options.rounds, " rounds, ",

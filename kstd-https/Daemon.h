@@ -1,7 +1,7 @@
 #pragma once
 
 #include "platform/HTTPSession.h"
-#include "platform/https/HTTPCaller.h"
+#include "platform/https/HTTPTransfer.h"
 #include "wire/HTTPConnection.h"
 
 #include <chrono>

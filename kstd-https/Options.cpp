@@ -30,9 +30,9 @@ void addLimit(CLI::App& app, const char* name, HTTPLimits::Time& limit, const ch
 
 } // namespace
 
-std::optional<platform::LinuxHTTPOptions> parseOptions(int argc, const char* const* argv,
-                                                       int& exitStatus) {
-    platform::LinuxHTTPOptions options;
+std::optional<platform::HTTPOptions> parseOptions(int argc, const char* const* argv,
+                                                  int& exitStatus) {
+    platform::HTTPOptions options;
     CLI::App app("Makes one HTTP or HTTPS request for the daemon, over the connection that is its "
                  "descriptor 3.",
                  "kstd-https");

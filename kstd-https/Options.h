@@ -1,6 +1,6 @@
 #pragma once
 
-#include "platform/https/LinuxHTTPSessions.h"
+#include "platform/https/HTTPTransfer.h"
 
 #include <optional>
 
@@ -8,7 +8,7 @@ namespace https {
 
 /// The options of the command line. None, with the status to end with, when there is nothing to do
 /// but end.
-[[nodiscard]] std::optional<platform::LinuxHTTPOptions>
-parseOptions(int argc, const char* const* argv, int& exitStatus);
+[[nodiscard]] std::optional<platform::HTTPOptions> parseOptions(int argc, const char* const* argv,
+                                                                int& exitStatus);
 
 } // namespace https

@@ -29,7 +29,7 @@ std::optional<wire::HTTPRequestFields> receiveRequest(wire::HTTPConnection& conn
 }
 
 platform::HTTPReply replyTo(wire::HTTPConnection& connection, const wire::HTTPRequestFields& fields,
-                            const platform::LinuxHTTPOptions& options) {
+                            const platform::HTTPOptions& options) {
     const platform::HTTPRequest request{.method = std::string(fields.method),
                                         .link = platform::Link{std::string(fields.link)},
                                         .maximumAnswerSize = fields.maximumAnswerSize};
@@ -42,7 +42,7 @@ platform::HTTPReply replyTo(wire::HTTPConnection& connection, const wire::HTTPRe
     if (fields.hasDelegate) {
         settings.delegate = daemon;
     }
-    return platform::HTTPTransfer(request, settings, daemon.get()).perform();
+    return platform::HTTPTransfer(request, settings, *daemon).perform();
 }
 
 /// As much of the text as a message takes, in one line.
@@ -81,7 +81,7 @@ void answer(wire::HTTPConnection& connection, const platform::HTTPReply& reply) 
 
 } // namespace
 
-bool serve(wire::HTTPConnection& connection, const platform::LinuxHTTPOptions& options) {
+bool serve(wire::HTTPConnection& connection, const platform::HTTPOptions& options) {
     const auto request = receiveRequest(connection);
     if (!request) {
         return false;

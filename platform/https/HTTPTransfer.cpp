@@ -110,7 +110,7 @@ const char* HTTPTransfer::wordsFor(Stage::Kind kind) {
 }
 
 HTTPTransfer::HTTPTransfer(const HTTPRequest& request, const HTTPTransferSettings& settings,
-                           HTTPCaller* caller)
+                           HTTPCaller& caller)
     : request_(request),
       settings_(settings),
       caller_(caller),
@@ -159,7 +159,7 @@ CURLcode HTTPTransfer::transferWith(CURLM* transfers) {
         if (isDecided()) {
             return CURLE_OK;
         }
-        if (caller_ != nullptr && !caller_->isWaiting()) {
+        if (!caller_.isWaiting()) {
             return CURLE_ABORTED_BY_CALLBACK;
         }
         noteProgress();
@@ -176,7 +176,7 @@ CURLcode HTTPTransfer::transferWith(CURLM* transfers) {
 void HTTPTransfer::enter(Stage::Kind kind) {
     const HTTPLimits& limits = settings_.options.limits;
     const HTTPLimits::Time kLimits[] = {limits.connecting, limits.fetching,
-                                        limits.toSend(bodySize()), limits.answering};
+                                        limits.toSend(caller_.bodySize()), limits.answering};
     const HTTPLimits::Time limit = kLimits[static_cast<std::size_t>(kind)];
     stage_ = {kind, limit, Clock::now() + limit};
 }
@@ -190,10 +190,6 @@ void HTTPTransfer::noteProgress() {
     }
 }
 
-std::uint64_t HTTPTransfer::bodySize() const {
-    return caller_ != nullptr ? caller_->bodySize() : request_.body.size();
-}
-
 bool HTTPTransfer::isConnected() const {
     curl_off_t when = 0;
     return curl_easy_getinfo(handle_.get(), CURLINFO_PRETRANSFER_TIME_T, &when) == CURLE_OK &&
@@ -202,7 +198,7 @@ bool HTTPTransfer::isConnected() const {
 
 bool HTTPTransfer::isSent() const {
     curl_off_t given = 0;
-    const auto size = static_cast<curl_off_t>(bodySize());
+    const auto size = static_cast<curl_off_t>(caller_.bodySize());
     if (curl_easy_getinfo(handle_.get(), CURLINFO_SIZE_UPLOAD_T, &given) != CURLE_OK ||
         given < size) {
         return false;
@@ -276,14 +272,14 @@ void HTTPTransfer::configureRequest() {
 }
 
 void HTTPTransfer::configureBody() {
-    const std::uint64_t size = bodySize();
+    const std::uint64_t size = caller_.bodySize();
     set(CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(size));
-    if (caller_ != nullptr && size > 0) {
+    if (size > 0) {
         set(CURLOPT_READFUNCTION, giveBody);
-        set(CURLOPT_READDATA, caller_);
+        set(CURLOPT_READDATA, &caller_);
     } else {
         // Without a buffer libcurl would ask a callback for the body.
-        set(CURLOPT_POSTFIELDS, size == 0 ? "" : request_.body.data());
+        set(CURLOPT_POSTFIELDS, "");
     }
 }
 

@@ -2,7 +2,6 @@
 
 #include "base/Concat.h"
 #include "platform/host/Challenges.h"
-#include "platform/https/CertificateTrust.h"
 
 #include <filesystem>
 #include <openssl/err.h>
@@ -11,6 +10,19 @@
 #include <utility>
 
 namespace platform {
+
+TrustResult CertificateTrust::evaluate() {
+    std::call_once(evaluated_, [this] {
+        const bool verified = X509_verify_cert(chain_) == 1;
+        const int error = X509_STORE_CTX_get_error(chain_);
+        ERR_clear_error();
+        if (verified && error == X509_V_OK) {
+            result_ = TrustResult::unspecified;
+        }
+        finding_ = X509_verify_cert_error_string(error);
+    });
+    return result_;
+}
 
 TrustCheck::TrustCheck(std::string host, std::string anchors,
                        std::weak_ptr<HTTPSessionDelegate> delegate)

@@ -3,17 +3,37 @@
 #include "platform/HTTPSession.h"
 
 #include <memory>
+#include <mutex>
 #include <openssl/ssl.h>
+#include <openssl/x509_vfy.h>
 #include <optional>
 #include <string>
 
 namespace platform {
 
+/// The certificates that a server has shown, with all that `chain` knows about the host and the
+/// trust anchors. Evaluated at most once, from whichever thread asks first.
+class CertificateTrust final : public ServerTrust {
+  public:
+    explicit CertificateTrust(X509_STORE_CTX* chain) : chain_(chain) {}
+
+    [[nodiscard]] TrustResult evaluate() override;
+
+    /// What the evaluation found, in words. Only after it.
+    [[nodiscard]] const std::string& finding() const { return finding_; }
+
+  private:
+    X509_STORE_CTX* chain_;
+    std::once_flag evaluated_;
+    TrustResult result_ = TrustResult::recoverableFailure;
+    std::string finding_;
+};
+
 /// Decides for a connection whether its server is trusted: evaluates, asks the delegate, and lets
 /// the handshake go on or fail.
 class TrustCheck {
   public:
-    /// `host` is a name or an address; `anchors` a file or a directory as in LinuxHTTPOptions.
+    /// `host` is a name or an address; `anchors` a file or a directory as in HTTPOptions.
     TrustCheck(std::string host, std::string anchors, std::weak_ptr<HTTPSessionDelegate> delegate);
     TrustCheck(const TrustCheck&) = delete;
     TrustCheck& operator=(const TrustCheck&) = delete;

@@ -37,7 +37,7 @@ struct RemoteHTTPOptions {
 
 /// HTTP and HTTPS through another process, so that this one has no code for either: of what comes
 /// from the network it sees a status and bytes, up to the request's limit. What the client is made
-/// of, and what servers it trusts, stands in platform/https/LinuxHTTPSessions.h.
+/// of, and what servers it trusts, stands in platform/https/HTTPTransfer.h.
 ///
 /// When the client cannot be reached, or runs as another user than root or this process's, a
 /// request ends with kCannotConnect; when it is silent or takes too long, with kTimedOut; when it

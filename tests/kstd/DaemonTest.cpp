@@ -1,8 +1,8 @@
 #include "kstd/Daemon.h"
 
 #include "platform/EventStream.h"
-#include "platform/HostWith.h"
 #include "tests/kstd/DaemonFixture.h"
+#include "tests/support/HostWith.h"
 
 #include <gmock/gmock.h>
 
@@ -124,7 +124,7 @@ class SubscriptionDiary final : public platform::EventStream {
 
 TEST_F(DaemonTest, ServicesAreStartedThenStreamsSubscribedThenTheRunLoopIsEntered) {
     SubscriptionDiary events(diary, fake);
-    const platform::Host host = platform::hostWith(fake.host(), {.events = &events});
+    const platform::Host host = support::hostWith(fake.host(), {.events = &events});
     fake.events.closeSources();
     EXPECT_EQ(Daemon(host, {witness("first"), witness("second")}).run(), 0);
     EXPECT_THAT(diary,
@@ -139,7 +139,7 @@ TEST_F(DaemonTest, ServicesAreStartedThenStreamsSubscribedThenTheRunLoopIsEntere
 
 TEST_F(DaemonTest, TheAlarmStreamIsSubscribedWhenTheListIsMade) {
     SubscriptionDiary events(diary, fake);
-    const platform::Host host = platform::hostWith(fake.host(), {.events = &events});
+    const platform::Host host = support::hostWith(fake.host(), {.events = &events});
     const auto services = makeServices(host);
     EXPECT_THAT(diary, ElementsAre("subscribe com.zerva.alarm after <>"));
 }

@@ -1,9 +1,9 @@
 // What one logged event does, by the state in which it finds the logger.
 
-#include "platform/HostWith.h"
 #include "tests/kstd/Analytics/LoggerFixture.h"
 #include "tests/kstd/Analytics/SQLite/LockHolder.h"
 #include "tests/kstd/Analytics/SQLite/SleeplessFiles.h"
+#include "tests/support/HostWith.h"
 
 #include <algorithm>
 #include <filesystem>
@@ -368,7 +368,7 @@ TEST_F(LoggerFixture, EventsAreDeletedOnceMoreAtTheEndOfAnUpload) {
             ++stored;
         }
     });
-    const auto watched = TestLogger::logger(platform::hostWith(fake.host(), {.log = &log}));
+    const auto watched = TestLogger::logger(support::hostWith(fake.host(), {.log = &log}));
     setDueDate(kNow - 1);
     watched->logEventNamed("event", nullptr);
     EXPECT_EQ(stored, 1);

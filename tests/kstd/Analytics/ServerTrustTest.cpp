@@ -1,5 +1,5 @@
-#include "platform/HostWith.h"
 #include "tests/kstd/Analytics/LoggerFixture.h"
+#include "tests/support/HostWith.h"
 
 #include <cstdio>
 
@@ -126,7 +126,7 @@ TEST_F(ServerTrustTest, MissingCompletionStopsTheProcess) {
     EXPECT_DEATH(
         {
             StandardErrorLog log;
-            TestLogger::logger(platform::hostWith(fake.host(), {.log = &log}))
+            TestLogger::logger(support::hostWith(fake.host(), {.log = &log}))
                 ->didReceiveChallenge({platform::kServerTrustMethod, 0, &trust}, nullptr);
         },
         "kstd: AssertMacros: completion \\(value: 0x0\\),  file: "

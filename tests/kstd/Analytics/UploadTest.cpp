@@ -1,5 +1,5 @@
-#include "platform/HostWith.h"
 #include "tests/kstd/Analytics/LoggerFixture.h"
+#include "tests/support/HostWith.h"
 
 #include <filesystem>
 #include <thread>
@@ -94,7 +94,7 @@ class RunningClock final : public platform::Clock {
 
 TEST_F(UploadTest, TheSummaryIsOfTheTimeOfTheDocument) {
     RunningClock clock;
-    const auto running = TestLogger::logger(platform::hostWith(fake.host(), {.clock = &clock}));
+    const auto running = TestLogger::logger(support::hostWith(fake.host(), {.clock = &clock}));
     const auto document = running->getLoggingJSON();
     ASSERT_TRUE(document);
     const auto read = fake.json.read(document.value().view());
@@ -190,7 +190,7 @@ TEST_F(UploadTest, RowThatBreaksInTheMiddleLeavesNoTrace) {
     };
     Breaking propertyLists(fake.propertyLists);
     const auto logger =
-        TestLogger::logger(platform::hostWith(fake.host(), {.propertyLists = &propertyLists}));
+        TestLogger::logger(support::hostWith(fake.host(), {.propertyLists = &propertyLists}));
     logger->logEventNamed("event", nullptr);
     const auto document = logger->getLoggingJSON();
     ASSERT_TRUE(document);

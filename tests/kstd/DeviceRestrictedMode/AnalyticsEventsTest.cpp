@@ -2,9 +2,9 @@
 
 #include "kstd/Analytics/Analytics.h"
 #include "kstd/Analytics/TQAnalyticsLoggerSQLiteStore.h"
-#include "platform/HostWith.h"
 #include "platform/PropertyLists.h"
 #include "tests/kstd/DaemonFixture.h"
+#include "tests/support/HostWith.h"
 
 #include <filesystem>
 
@@ -96,7 +96,7 @@ class RecordingPropertyLists final : public platform::PropertyLists {
 TEST_F(AnalyticsEventsTest, KindsOfNumbers) {
     RecordingPropertyLists propertyLists(fake.propertyLists);
     const auto service = DeviceRestrictedModeService::make(
-        platform::hostWith(fake.host(), {.propertyLists = &propertyLists}));
+        support::hostWith(fake.host(), {.propertyLists = &propertyLists}));
     const Bytes policy = policyRecord(4, 5, {1, 0, 2, 0});
     EXPECT_EQ(service->onKextAnalyticsCollected(*KSTDRMDeamonNotification::fromBytes(policy)), 0);
     const Bytes restarted = restartedRecord(119);

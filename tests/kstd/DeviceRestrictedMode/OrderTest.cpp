@@ -1,8 +1,8 @@
 // In which order the service logs, loads and saves, asks, sends and registers.
 
 #include "platform/EventStream.h"
-#include "platform/HostWith.h"
 #include "tests/kstd/DaemonFixture.h"
+#include "tests/support/HostWith.h"
 
 #include <gmock/gmock.h>
 
@@ -104,7 +104,7 @@ class OrderTest : public DaemonFixture {
     DiaryFiles files{diary, fake.files};
     DiaryAlarms alarms{diary};
     std::shared_ptr<DeviceRestrictedModeService> service =
-        DeviceRestrictedModeService::make(platform::hostWith(
+        DeviceRestrictedModeService::make(support::hostWith(
             fake.host(), {.log = &log, .alarms = &alarms, .settings = &settings, .files = &files}));
 };
 

@@ -4,6 +4,7 @@
 #include "platform/Host.h"
 #include "platform/linux/LinuxHost.h"
 #include "platform/linux/RemoteHTTPSessions.h"
+#include "tests/platform/https/ServerFaults.h"
 #include "tests/platform/linux/OpenDescriptors.h"
 #include "tests/platform/linux/ScriptedHTTPSClient.h"
 #include "tests/support/Collector.h"
@@ -74,30 +75,19 @@ TEST_F(RemoteHTTPSessionTest, LargeDocumentArrivesWhole) {
 
 TEST_F(RemoteHTTPSessionTest, ServersThatDoNotBehaveEndAsTheyDoWithoutAnotherProcess) {
     const std::string document(5'000'000, 'd');
-    control("body hallo");
-    const struct {
-        const char* fault;
-        const char* outcome;
-    } kCases[] = {
-        {"reset-on-connect", "transport 2"},
-        {"garbage-instead-of-tls", "transport 2"},
-        {"reset-in-request", "transport 6"},
-        {"hang-up", "transport 6"},
-        {"garbage-instead-of-http", "transport 6"},
-        {"huge-headers", "transport 5"},
-        {"endless-interim", "transport 5"},
-        {"reset-in-response", "200"},
-        {"hang-up-in-response", "200"},
-        {"endless-body", "200"},
-    };
-    for (const auto& [fault, outcome] : kCases) {
+    control("body-size 1000");
+    RemoteHTTPSessions hasty({.program = {KSTD_HTTPS, "--trust-anchors", collector_.authority(),
+                                          "--fetch-limit", "0.2"}});
+    for (const auto& [fault, ofAPost, ofAGet, isSlow] : support::kServerFaults) {
         SCOPED_TRACE(fault);
         control(base::concat("fault ", fault));
         const HTTPReply reply = postIt(document);
-        EXPECT_EQ(outcomeOf(reply), outcome);
+        EXPECT_EQ(outcomeOf(reply), ofAPost);
         EXPECT_TRUE(!reply.error || reply.error->description.size() > 16);
         EXPECT_EQ(reply.body, "");
+        EXPECT_EQ(outcomeOf(fetch(isSlow ? hasty : sessions_, get(link()))), ofAGet);
     }
+    control("body hallo");
     control("fault none");
     EXPECT_EQ(fetch(sessions_, get(link())).body, "hallo");
 }
@@ -184,14 +174,19 @@ TEST(RemoteHTTPProgramTest, WithoutAThreadTheCompletionComesAtOnce) {
     EXPECT_EQ(keeper.reply().error->description, "no thread for the request");
 }
 
-TEST(RemoteHTTPProgramTest, RequestsTakeNoSignals) {
+TEST(RemoteHTTPProgramTest, RequestsTakeNoSignalsAndTheCallerKeepsItsOwn) {
     RemoteHTTPSessions sessions({.program = {"/bin/false"}});
+    sigset_t before;
+    sigset_t after;
     sigset_t during;
     ::sigemptyset(&during);
+    ::pthread_sigmask(SIG_BLOCK, nullptr, &before);
     sessions.makeEphemeral({}, {})->start(
         get("file:///"), [&](const HTTPReply&) { ::pthread_sigmask(SIG_BLOCK, nullptr, &during); });
-    for (const int signal : {SIGTERM, SIGPIPE, SIGUSR1}) {
+    ::pthread_sigmask(SIG_BLOCK, nullptr, &after);
+    for (const int signal : {SIGTERM, SIGPIPE, SIGALRM, SIGUSR1}) {
         EXPECT_EQ(::sigismember(&during, signal), 1) << signal;
+        EXPECT_EQ(::sigismember(&after, signal), ::sigismember(&before, signal)) << signal;
     }
 }
 

@@ -1,35 +1,31 @@
 // What goes over the wire: requests, answers, and what the environment may not change about them.
 
-#include "tests/platform/https/LinuxHTTPFixture.h"
+#include "tests/platform/https/HTTPTransferFixture.h"
 #include "tests/platform/linux/OpenDescriptors.h"
 #include "tests/support/EnvironmentVariable.h"
-#include "tests/support/NoThreads.h"
 #include "tests/support/UnusedPort.h"
 
-#include <csignal>
 #include <fcntl.h>
 #include <fstream>
+#include <future>
 #include <malloc.h>
 
 namespace {
 
-using platform::ChallengeDisposition;
+using platform::HTTPOptions;
 using platform::HTTPReply;
 using platform::HTTPRequest;
-using platform::LinuxHTTPOptions;
-using platform::LinuxHTTPSessions;
 using support::acceptingDelegate;
 using support::Collector;
 using support::EnvironmentVariable;
-using support::fetch;
 using support::get;
 using support::outcomeOf;
 using support::post;
-using support::ReplyKeeper;
+using support::transfer;
 
-class LinuxHTTPSessionTest : public support::LinuxHTTPFixture {};
+class HTTPTransferTest : public support::HTTPTransferFixture {};
 
-TEST_F(LinuxHTTPSessionTest, EveryStatusIsGivenAsItIsAndNoRedirectFollowed) {
+TEST_F(HTTPTransferTest, EveryStatusIsGivenAsItIsAndNoRedirectFollowed) {
     control("header Location: /elsewhere");
     for (const int status : {199, 200, 201, 204, 299, 300, 301, 302, 303, 304, 307,
                              308, 400, 401, 407, 413, 429, 500, 503, 599, 999}) {
@@ -47,7 +43,7 @@ TEST_F(LinuxHTTPSessionTest, EveryStatusIsGivenAsItIsAndNoRedirectFollowed) {
     EXPECT_EQ(reply.body, "hallo");
 }
 
-TEST_F(LinuxHTTPSessionTest, HeaderBlockHoldsNothingElse) {
+TEST_F(HTTPTransferTest, HeaderBlockHoldsNothingElse) {
     const std::string host = base::concat("Host: 127.0.0.1:", collector_.port());
     using Lines = std::vector<std::string>;
     EXPECT_EQ(outcomeOf(getIt()), "200");
@@ -64,27 +60,20 @@ TEST_F(LinuxHTTPSessionTest, HeaderBlockHoldsNothingElse) {
     EXPECT_EQ(outcomeOf(getFrom(withUser)), "200");
     EXPECT_EQ(collector_.lastHead(),
               (Lines{"GET /%28null%29/(null)?a=b&c HTTP/1.1", host, "User-Agent: kstd/1.0", ""}));
-    ReplyKeeper keeper;
-    sessions_.makeEphemeral({}, {})->start(get(link()), keeper.completion());
+    EXPECT_EQ(outcomeOf(transfer(get(link()), {.options = options()})), "200");
     EXPECT_EQ(collector_.lastHead(), (Lines{"GET /2/kst HTTP/1.1", host, ""}));
 }
 
-TEST_F(LinuxHTTPSessionTest, CookiesAreNotSentBack) {
+TEST_F(HTTPTransferTest, CookiesAreNotSentBack) {
     control("header Set-Cookie: a=b; Path=/");
-    const auto session = sessions_.makeEphemeral({}, {});
+    const platform::HTTPTransferSettings settings{.options = options()};
     for (int i = 1; i <= 2; ++i) {
-        ReplyKeeper keeper;
-        session->start(get(link()), keeper.completion());
-        control(base::concat("await-requests ", i));
+        EXPECT_EQ(outcomeOf(transfer(get(link()), settings)), "200");
         EXPECT_EQ(collector_.lastHead().size(), 3U) << "request line, host, empty line";
-        while (keeper.calls() == 0) {
-            std::this_thread::yield();
-        }
-        EXPECT_EQ(outcomeOf(keeper.reply()), "200");
     }
 }
 
-TEST_F(LinuxHTTPSessionTest, LargeDocumentArrivesWhole) {
+TEST_F(HTTPTransferTest, LargeDocumentArrivesWhole) {
     std::string document;
     for (int i = 0; document.size() < 5'000'000; ++i) {
         base::append(document, i);
@@ -94,7 +83,7 @@ TEST_F(LinuxHTTPSessionTest, LargeDocumentArrivesWhole) {
     EXPECT_TRUE(collector_.body(1) == document);
 }
 
-TEST_F(LinuxHTTPSessionTest, BodyIsBoundedHoweverItIsFramed) {
+TEST_F(HTTPTransferTest, BodyIsBoundedHoweverItIsFramed) {
     constexpr std::size_t kLimit = 100'000;
     HTTPRequest request = get(link());
     request.maximumAnswerSize = kLimit;
@@ -103,18 +92,18 @@ TEST_F(LinuxHTTPSessionTest, BodyIsBoundedHoweverItIsFramed) {
         control(base::concat("framing ", framing));
         for (const std::size_t size : {std::size_t{0}, kLimit - 1, kLimit, kLimit + 1}) {
             control(base::concat("body-size ", size));
-            const HTTPReply reply = fetch(sessions_, request);
+            const HTTPReply reply = fetch(request);
             EXPECT_EQ(outcomeOf(reply), size > kLimit ? "transport 5" : "200");
             EXPECT_EQ(reply.body.size(), size > kLimit ? 0 : size);
         }
     }
     control("fault endless-body");
-    EXPECT_EQ(outcomeOf(fetch(sessions_, request)), "transport 5");
+    EXPECT_EQ(outcomeOf(fetch(request)), "transport 5");
     request.maximumAnswerSize = 0;
-    EXPECT_EQ(outcomeOf(fetch(sessions_, request)), "transport 5");
+    EXPECT_EQ(outcomeOf(fetch(request)), "transport 5");
 }
 
-TEST_F(LinuxHTTPSessionTest, EnvironmentChangesNothing) {
+TEST_F(HTTPTransferTest, EnvironmentChangesNothing) {
     const support::UnusedPort unused;
     const std::string proxy = base::concat("http://127.0.0.1:", unused.number());
     const std::string elsewhere = collector_.certificate("nothing");
@@ -130,13 +119,12 @@ TEST_F(LinuxHTTPSessionTest, EnvironmentChangesNothing) {
 
     const EnvironmentVariable file("SSL_CERT_FILE", collector_.authority());
     const EnvironmentVariable bundle("CURL_CA_BUNDLE", collector_.authority());
-    LinuxHTTPOptions others;
+    HTTPOptions others;
     others.trustAnchors = collector_.certificate("self-signed.pem");
-    LinuxHTTPSessions sessions(others);
-    EXPECT_EQ(outcomeOf(fetch(sessions, get(link()))), "transport 4");
+    EXPECT_EQ(outcomeOf(transfer(get(link()), {.options = others})), "transport 4");
 }
 
-TEST_F(LinuxHTTPSessionTest, SchemesInCapitalsAndWithoutTLS) {
+TEST_F(HTTPTransferTest, SchemesInCapitalsAndWithoutTLS) {
     std::string loud = link();
     EXPECT_EQ(outcomeOf(getFrom(loud.replace(0, 5, "HTTPS"))), "200");
     Collector plain(Collector::Protocol::http);
@@ -157,10 +145,9 @@ struct Usage {
     std::size_t memory = ::mallinfo2().uordblks;
 };
 
-TEST_F(LinuxHTTPSessionTest, NothingIsLeftBehind) {
+TEST_F(HTTPTransferTest, NothingIsLeftBehind) {
     control("body-size 100000");
     const std::string document(100'000, 'd');
-    const auto session = sessions_.makeEphemeral({}, {});
     const auto round = [&] {
         EXPECT_EQ(outcomeOf(postIt(document)), "200");
         EXPECT_EQ(outcomeOf(getFrom("http://127.0.0.1:1/")), "transport 2");
@@ -178,37 +165,9 @@ TEST_F(LinuxHTTPSessionTest, NothingIsLeftBehind) {
     EXPECT_LT(after.memory, before.memory + 50'000) << "less than a thousandth of what was moved";
 }
 
-TEST(LinuxHTTPSessionsTest, WithoutAThreadTheCompletionComesAtOnce) {
-    LinuxHTTPSessions sessions;
-    const auto session = sessions.makeEphemeral({}, {});
-    const support::NoThreads none;
-    ReplyKeeper keeper;
-    session->start(get("http://127.0.0.1:1/"), keeper.completion());
-    EXPECT_EQ(keeper.calls(), 1);
-    EXPECT_EQ(outcomeOf(keeper.reply()), "transport 6");
-    EXPECT_EQ(keeper.reply().error->description, "no thread for the request");
-}
-
-TEST(LinuxHTTPSessionsTest, RequestsTakeNoSignalsAndTheCallerKeepsItsOwn) {
-    LinuxHTTPSessions sessions;
-    sigset_t before;
-    sigset_t after;
-    sigset_t during;
-    ::pthread_sigmask(SIG_BLOCK, nullptr, &before);
-    sessions.makeEphemeral({}, {})->start(
-        get("file:///"), [&](const HTTPReply&) { ::pthread_sigmask(SIG_BLOCK, nullptr, &during); });
-    ::pthread_sigmask(SIG_BLOCK, nullptr, &after);
-    for (const int signal : {SIGTERM, SIGPIPE, SIGALRM, SIGUSR1}) {
-        EXPECT_EQ(::sigismember(&during, signal), 1) << signal;
-        EXPECT_EQ(::sigismember(&after, signal), ::sigismember(&before, signal)) << signal;
-    }
-}
-
-TEST_F(LinuxHTTPSessionTest, ConnectionsAreClosedInProgramsThatAreStarted) {
+TEST_F(HTTPTransferTest, ConnectionsAreClosedInProgramsThatAreStarted) {
     control("hold");
-    ReplyKeeper keeper;
-    auto session = sessions_.makeEphemeral({}, {});
-    session->start(get(link()), keeper.completion());
+    auto reply = std::async(std::launch::async, [this] { return getIt(); });
     control("await-requests 1");
     int connections = 0;
     for (int descriptor = 3; descriptor < 100; ++descriptor) {
@@ -222,8 +181,7 @@ TEST_F(LinuxHTTPSessionTest, ConnectionsAreClosedInProgramsThatAreStarted) {
     }
     EXPECT_EQ(connections, 1);
     control("release");
-    session.reset();
-    EXPECT_EQ(outcomeOf(keeper.reply()), "200");
+    EXPECT_EQ(outcomeOf(reply.get()), "200");
 }
 
 } // namespace

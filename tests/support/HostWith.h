@@ -2,22 +2,22 @@
 
 #include "platform/Host.h"
 
-namespace platform {
+namespace support {
 
 /// What goes into the place of a host's own; null leaves the host's own.
 struct HostParts {
-    SystemLog* log = nullptr;
-    EventStream* events = nullptr;
-    AlarmEvent* alarms = nullptr;
-    MainRunLoop* runLoop = nullptr;
-    ManagedSettings* settings = nullptr;
-    Files* files = nullptr;
-    Clock* clock = nullptr;
-    PropertyLists* propertyLists = nullptr;
+    platform::SystemLog* log = nullptr;
+    platform::EventStream* events = nullptr;
+    platform::AlarmEvent* alarms = nullptr;
+    platform::MainRunLoop* runLoop = nullptr;
+    platform::ManagedSettings* settings = nullptr;
+    platform::Files* files = nullptr;
+    platform::Clock* clock = nullptr;
+    platform::PropertyLists* propertyLists = nullptr;
 };
 
 /// `host` with other parts, which must outlive its use too.
-[[nodiscard]] inline Host hostWith(const Host& host, const HostParts& parts) {
+[[nodiscard]] inline platform::Host hostWith(const platform::Host& host, const HostParts& parts) {
     const auto chosen = [](auto* part, auto& own) -> auto& {
         return part != nullptr ? *part : own;
     };
@@ -41,4 +41,4 @@ struct HostParts {
             .https = host.https};
 }
 
-} // namespace platform
+} // namespace support

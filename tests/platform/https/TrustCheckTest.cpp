@@ -1,6 +1,6 @@
 // Which servers are trusted, and what the delegate changes about that.
 
-#include "tests/platform/https/LinuxHTTPFixture.h"
+#include "tests/platform/https/HTTPTransferFixture.h"
 
 #include <filesystem>
 #include <fstream>
@@ -9,28 +9,22 @@ namespace {
 
 using platform::ChallengeDisposition;
 using platform::HTTPReply;
-using platform::LinuxHTTPOptions;
-using platform::LinuxHTTPSessions;
 using platform::TrustResult;
 using support::acceptingDelegate;
 using support::answeringDelegate;
-using support::fetch;
 using support::get;
 using support::outcomeOf;
 using support::ScriptedDelegate;
 
-class LinuxHTTPTrustTest : public support::LinuxHTTPFixture {
+class TrustCheckTest : public support::HTTPTransferFixture {
   protected:
     [[nodiscard]] HTTPReply getWithAnchors(const std::string& anchors,
                                            const Delegate& delegate = nullptr) {
-        LinuxHTTPOptions others;
-        others.trustAnchors = anchors;
-        LinuxHTTPSessions sessions(others);
-        return fetch(sessions, get(link()), delegate);
+        return support::transfer(get(link()), {.delegate = delegate, .options = {anchors}});
     }
 };
 
-TEST_F(LinuxHTTPTrustTest, WhatIsWrongWithACertificateIsOneVerdict) {
+TEST_F(TrustCheckTest, WhatIsWrongWithACertificateIsOneVerdict) {
     const struct {
         const char* name;
         const char* finding;
@@ -72,7 +66,7 @@ TEST_F(LinuxHTTPTrustTest, WhatIsWrongWithACertificateIsOneVerdict) {
     EXPECT_EQ(collector_.requestCount(), 12U);
 }
 
-TEST_F(LinuxHTTPTrustTest, HostIsTheOneOfTheLink) {
+TEST_F(TrustCheckTest, HostIsTheOneOfTheLink) {
     const struct {
         const char* name;
         const char* host;
@@ -97,25 +91,18 @@ TEST_F(LinuxHTTPTrustTest, HostIsTheOneOfTheLink) {
     }
 }
 
-TEST_F(LinuxHTTPTrustTest, EveryConnectionIsCheckedAnew) {
+TEST_F(TrustCheckTest, EveryConnectionIsCheckedAnew) {
     const auto delegate = acceptingDelegate();
-    auto session = sessions_.makeEphemeral({}, delegate);
     for (int i = 1; i <= 3; ++i) {
-        support::ReplyKeeper keeper;
-        session->start(get(link()), keeper.completion());
-        while (keeper.calls() == 0) {
-            std::this_thread::yield();
-        }
+        EXPECT_EQ(outcomeOf(getIt(delegate)), "200");
         EXPECT_EQ(delegate->challenges(), i);
     }
-    EXPECT_EQ(outcomeOf(getIt(delegate)), "200");
-    EXPECT_EQ(delegate->challenges(), 4) << "another session";
-    EXPECT_EQ(collector_.connectionCount(), 4U);
+    EXPECT_EQ(collector_.connectionCount(), 3U);
     control("certificate expired");
     EXPECT_EQ(outcomeOf(getIt()), "transport 4") << "what was good before counts for nothing";
 }
 
-TEST_F(LinuxHTTPTrustTest, AnchorsAreAFileOrADirectory) {
+TEST_F(TrustCheckTest, AnchorsAreAFileOrADirectory) {
     const std::string directory = collector_.certificate("hashed");
     std::filesystem::create_directory(directory);
     EXPECT_EQ(outcomeOf(getWithAnchors(directory)), "transport 4") << "an empty one";
