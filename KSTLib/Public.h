@@ -31,6 +31,13 @@
 #define KST_PUBLIC KST_VISIBLE
 #endif
 
+/** Marks a function that is in its header alone, made of those of the library. */
+#ifdef __cplusplus
+#define KST_INLINE inline
+#else
+#define KST_INLINE static inline
+#endif
+
 /** Marks a function whose result must be looked at: a failure would be lost otherwise, or memory.
  *  The compiler warns. C++ ignores such a result on purpose by a cast to void, C by storing it.
  *

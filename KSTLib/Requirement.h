@@ -127,4 +127,23 @@ void KSTRequirementGetSubrequirements(const KSTRequirement* requirement,
 }
 #endif
 
+#ifndef __cplusplus
+static inline void kstCountOne(void* captured, const KSTRequirement* child) {
+    (void)child;
+    ++*(size_t*)captured;
+}
+#endif
+
+/** How many children `requirement` has: as often KSTRequirementGetSubrequirements calls its block.
+ */
+KST_INLINE size_t KSTRequirementGetSubrequirementsCount(const KSTRequirement* requirement) {
+    size_t count = 0;
+#ifdef __cplusplus
+    KSTRequirementGetSubrequirements(requirement, [&count](const KSTRequirement*) { ++count; });
+#else
+    KSTRequirementGetSubrequirements(requirement, (KSTRequirementBlock){kstCountOne, &count});
+#endif
+    return count;
+}
+
 #endif

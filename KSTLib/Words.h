@@ -185,6 +185,7 @@ KST_WORDS const char* KSTStatusText(KSTStatus status) KST_WORDS_END {
     case KST_STATUS_OF_ERRNO(EPERM):
         return "the socket of the kernel service belongs to another user";
     case KST_STATUS_OF_ERRNO(ENOENT):
+    case KST_STATUS_OF_ERRNO(ENOTDIR):
         return "the kernel service has no socket";
     case KST_STATUS_OF_ERRNO(EACCES):
         return "this user may not reach the kernel service";

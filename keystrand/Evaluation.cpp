@@ -136,9 +136,12 @@ std::uint32_t typeOf(const Requirement& requirement) {
     case Requirement::Kind::someOf:
         return kKSTRequirementTypeKofN;
     case Requirement::Kind::leaf:
+        return requirement.type->requirement;
+    case Requirement::Kind::always:
         break;
     }
-    return requirement.type->requirement;
+    // What is always met is never missing.
+    return 0;
 }
 
 /// A node whose data are zeros.

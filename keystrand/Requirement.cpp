@@ -90,6 +90,10 @@ std::string headText(const Requirement& composite) {
 } // namespace
 
 std::size_t wireSize(const Requirement& requirement) {
+    if (requirement.kind == Requirement::Kind::always) {
+        // It is met, so it is missing in no answer.
+        return 0;
+    }
     if (requirement.kind == Requirement::Kind::leaf) {
         return sizeof(KSTRequirement) + requirement.type->dataSize;
     }
@@ -103,6 +107,9 @@ std::size_t wireSize(const Requirement& requirement) {
 }
 
 std::string toText(const Requirement& requirement) {
+    if (requirement.kind == Requirement::Kind::always) {
+        return std::string(kAlways);
+    }
     if (requirement.kind == Requirement::Kind::leaf) {
         return base::concat(requirement.type->name, optionsText(requirement));
     }

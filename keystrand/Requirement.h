@@ -29,9 +29,13 @@ struct LeafType {
 /// Null when there is none of that name.
 [[nodiscard]] const LeafType* findLeafType(std::string_view name);
 
-/// What a policy asks for: a leaf, which one credential meets, or a number of its children.
+/// The word for what is met without any credential.
+inline constexpr std::string_view kAlways = "always";
+
+/// What a policy asks for: a leaf, which one credential meets, a number of its children, or
+/// nothing.
 struct Requirement {
-    enum class Kind { leaf, allOf, anyOf, someOf };
+    enum class Kind { leaf, allOf, anyOf, someOf, always };
 
     Kind kind = Kind::leaf;
 
@@ -44,9 +48,9 @@ struct Requirement {
     /// The credential that meets the leaf is used up by it.
     bool once = false;
 
-    /// Of the others; at least one.
+    /// At least one of allOf, anyOf and someOf.
     std::vector<Requirement> children;
-    /// How many of the children are asked for, 1 to all of them.
+    /// How many of the children are asked for, 1 to all of them; 0 of always.
     std::uint32_t needed = 0;
 };
 

@@ -136,6 +136,10 @@ std::optional<Requirement> parseNode(TextParser& parser, std::size_t depth) {
         return isWhole ? std::move(composite) : std::nullopt;
     }
     Requirement leaf;
+    if (*word == kAlways) {
+        leaf.kind = Kind::always;
+        return leaf;
+    }
     leaf.type = findLeafType(*word);
     if (leaf.type == nullptr) {
         parser.fail(base::concat("unknown requirement ", *word));

@@ -123,6 +123,9 @@ int32_t walkRequirementFromC(const void* bytes, size_t size, struct Seen* proper
     if (err == kKSTErrorSuccess) {
         err = KSTRequirementGetProperties(tree, (KSTPropertyBlock){keepProperty, properties});
         KSTRequirementGetSubrequirements(tree, (KSTRequirementBlock){addType, children});
+        if (KSTRequirementGetSubrequirementsCount(tree) != (size_t)children->calls) {
+            err = kKSTErrorUnexpected;
+        }
         DeallocRequirement(tree);
     }
     return err;

@@ -46,6 +46,7 @@ class RequirementObjects : public support::ChannelFixture {
         std::vector<const KSTRequirement*> children;
         KSTRequirementGetSubrequirements(
             asRequirement(bytes), [&](const KSTRequirement* child) { children.push_back(child); });
+        EXPECT_EQ(KSTRequirementGetSubrequirementsCount(asRequirement(bytes)), children.size());
         return children;
     }
 
@@ -205,6 +206,9 @@ TEST_F(RequirementObjects, Failures) {
     KSTRequirementGetSubrequirements(requirement, nullptr);
     EXPECT_EQ(newLines(),
               (Lines{failedCheck("requirement"), failedCheck("processSubrequirement")}));
+
+    EXPECT_EQ(KSTRequirementGetSubrequirementsCount(nullptr), 0U);
+    EXPECT_EQ(newLines(), Lines{failedCheck("requirement")});
 
     EXPECT_EQ(KSTRequirementGetType(nullptr), 0U);
     EXPECT_EQ(KSTRequirementGetState(nullptr), 0U);

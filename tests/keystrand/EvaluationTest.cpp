@@ -99,6 +99,21 @@ TEST_F(EvaluationTest, EveryTypeOfCredentialMeetsItsOwnLeafOnly) {
     }
 }
 
+TEST_F(EvaluationTest, AlwaysIsMetByNothingAndNeverMissing) {
+    expect({{"always", "met"},
+            {"all-of(always, always)", "met"},
+            {"any-of(never, always)", "met"},
+            {"all-of(always, passcode)", "1(passcode)"},
+            {"any-of(all-of(always, never), passcode)", "1(1(never) passcode)"},
+            {"2-of(passcode, always, biometry)", "1(passcode biometry)"}});
+    using Types = std::vector<std::uint32_t>;
+    EXPECT_EQ(used("always"), Types());
+    EXPECT_EQ(used("any-of(always, passcode(once))"), Types());
+    add(own_, plainCredential(1), 0);
+    EXPECT_EQ(used("any-of(always, passcode(once))"), Types());
+    EXPECT_EQ(used("all-of(always, passcode(once))"), Types{1});
+}
+
 TEST_F(EvaluationTest, CompositesOfWhatIsThereAndWhatIsNot) {
     add(own_, plainCredential(1), 0);
     add(own_, plainCredential(3), 0);
@@ -224,6 +239,9 @@ TEST(CharacteristicsTest, UsableAndIndispensableTypes) {
         {"passcode", 1U << 1U, 1U << 1U},
         {"user-output", 1U << 7U, 1U << 7U},
         {"never", 0, kAll},
+        {"always", 0, 0},
+        {"any-of(passcode, always)", 0x02, 0},
+        {"all-of(passcode, always)", 0x02, 0x02},
         {"all-of(passcode, kext-deny-list)", 0x1002, 0x1002},
         {"any-of(passcode, biometry)", 0x0a, 0},
         {"any-of(passcode, never)", 0x02, 0x02},

@@ -57,7 +57,7 @@ TEST_F(PolicyTableTest, ExampleFile) {
     ASSERT_EQ(table_.load(EXAMPLE_POLICIES), std::nullopt);
     EXPECT_EQ(lines(), (Lines{"com.example.pay = 2-of(passcode(user=1000), biometry(user=1000, "
                               "priority=1), passphrase(user=1000, purpose=2, once))",
-                              "com.example.retired = never",
+                              "com.example.public = always", "com.example.retired = never",
                               "com.example.settings = any-of(passcode(age=300), all-of(biometry, "
                               "passphrase))",
                               "unlock = passphrase(purpose=1)"}));

@@ -44,6 +44,8 @@ TEST(RequirementParserTest, TextsAndTheirPlainForm) {
         {"all-of(passcode)", "all-of(passcode)"},
         {"any-of(passcode,\n  # or\n  biometry)", "any-of(passcode, biometry)"},
         {"1-of(never)", "1-of(never)"},
+        {"always", "always"},
+        {"2-of(always, never, all-of(always))", "2-of(always, never, all-of(always))"},
         {"2-of(passcode, passphrase, all-of(user-output, kext-deny-list))",
          "2-of(passcode, passphrase, all-of(user-output, kext-deny-list))"},
     };
@@ -89,6 +91,7 @@ TEST(RequirementParserTest, TextsThatAreRefused) {
         {"3-of(passcode,\nbiometry)", 2, "3 of 2 cannot be asked for"},
         {"x-of(passcode)", 1, "unknown requirement x-of"},
         {"4294967296-of(passcode)", 1, "unknown requirement 4294967296-of"},
+        {"any-of(always(once))", 1, ") expected before ("},
         {"passcode()", 1, "option expected before )"},
         {"passcode(user)", 1, "= expected before )"},
         {"passcode(user=)", 1, "user expected before )"},
