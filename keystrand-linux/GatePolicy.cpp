@@ -19,13 +19,6 @@ bool letsIn(AuthorizedDefault value, const UsbDevice& device) {
     return value == kEverybody || (value == kHardWiredOnly && device.hardWired);
 }
 
-const UsbDevice* deviceAt(const BusView& view, const Attachment& attachment) {
-    const auto found =
-        std::find_if(view.devices.begin(), view.devices.end(),
-                     [&](const UsbDevice& device) { return device.attachment == attachment; });
-    return found == view.devices.end() ? nullptr : &*found;
-}
-
 const RootHub* rootHubOf(const BusView& view, const UsbDevice& device) {
     const std::uint32_t bus = busOf(device.port());
     const auto found = std::find_if(view.rootHubs.begin(), view.rootHubs.end(),
@@ -52,6 +45,13 @@ std::uint32_t busOf(std::string_view port) {
     const auto [end, error] = std::from_chars(port.data(), port.data() + port.size(), bus);
     const bool isPort = error == std::errc() && end != port.data() + port.size() && *end == '-';
     return isPort ? bus : 0;
+}
+
+const UsbDevice* BusView::find(const Attachment& attachment) const {
+    const auto found = std::find_if(devices.begin(), devices.end(), [&](const UsbDevice& device) {
+        return device.attachment == attachment;
+    });
+    return found == devices.end() ? nullptr : &*found;
 }
 
 GatePolicy::GatePolicy(GateRules rules)
@@ -126,9 +126,8 @@ std::vector<GateAction> GatePolicy::decide(const BusView& view, BootTime now) {
 }
 
 void GatePolicy::forgetWhatWent(const BusView& view) {
-    std::erase_if(state_.devices, [&](const KnownDevice& known) {
-        return deviceAt(view, known.attachment) == nullptr;
-    });
+    std::erase_if(state_.devices,
+                  [&](const KnownDevice& known) { return view.find(known.attachment) == nullptr; });
     std::erase_if(state_.hubs, [&](const WrittenHub& known) {
         return std::none_of(view.rootHubs.begin(), view.rootHubs.end(),
                             [&](const RootHub& hub) { return hub.inode == known.inode; });

@@ -68,6 +68,9 @@ struct BusView {
     std::vector<RootHub> rootHubs;
     /// Each hub before what is behind it.
     std::vector<UsbDevice> devices;
+
+    /// Null when it is not there.
+    [[nodiscard]] const UsbDevice* find(const Attachment& attachment) const;
 };
 
 /// Whether `port` lies behind the hub at `hub`.

@@ -1,0 +1,360 @@
+#include "keystrand-linux/UsbGate.h"
+
+#include "base/Concat.h"
+#include "base/Digits.h"
+
+#include <utility>
+
+namespace keystrand::usb {
+
+namespace {
+
+using Kind = GateAction::Kind;
+
+/// Enough for hubs within hubs within hubs; more is a bus that never comes to rest, which is looked
+/// at again with its next event.
+constexpr int kMostRounds = 64;
+
+std::string hexOfTwoBytes(std::uint16_t number) {
+    const std::uint8_t bytes[] = {static_cast<std::uint8_t>(number >> 8U),
+                                  static_cast<std::uint8_t>(number)};
+    return base::hexDigits(bytes);
+}
+
+std::string quoted(const std::string& text) {
+    std::string quoted = "\"";
+    for (const char each : text) {
+        const auto byte = static_cast<std::uint8_t>(each);
+        const bool isPlain = byte >= 0x20 && byte < 0x7F && each != '"' && each != '\\';
+        quoted += isPlain ? std::string(1, each) : base::concat("\\x", base::hexDigits({&byte, 1}));
+    }
+    return quoted + '"';
+}
+
+std::string classesOf(const UsbFunctions& functions) {
+    std::string text;
+    for (const UsbClass& each : functions.classes) {
+        const std::uint8_t bytes[] = {each.number, each.subclass, each.protocol};
+        const std::span all(bytes);
+        text += base::concat(text.empty() ? "" : " ", base::hexDigits(all.subspan(0, 1)), '/',
+                             base::hexDigits(all.subspan(1, 1)), '/',
+                             base::hexDigits(all.subspan(2, 1)));
+    }
+    return text;
+}
+
+std::string_view reasonFor(Standing standing) {
+    switch (standing) {
+    case Standing::keyboard:
+        return "no other keyboard is attached";
+    case Standing::probe:
+        return "for a few seconds, to look for a keyboard behind it";
+    case Standing::administrator:
+        return "an administrator said so";
+    default:
+        return "the gate is open again";
+    }
+}
+
+} // namespace
+
+std::string describe(const UsbDevice& device) {
+    std::string text = base::concat(device.port(), " (", hexOfTwoBytes(device.vendor), ':',
+                                    hexOfTwoBytes(device.product), ' ', quoted(device.manufacturer),
+                                    ' ', quoted(device.name));
+    if (!device.serial.empty()) {
+        text += base::concat(", serial ", quoted(device.serial));
+    }
+    return text + (device.functions.understood
+                       ? base::concat(", classes ", classesOf(device.functions), ')')
+                       : std::string(", unknown)"));
+}
+
+UsbGate::UsbGate(Parts parts, GateRules rules)
+    : parts_(std::move(parts)), policy_(std::move(rules)) {}
+
+UsbGate::~UsbGate() {
+    parts_.bus.watch(nullptr);
+}
+
+std::optional<GateRecord> UsbGate::resume() {
+    std::string problem;
+    const auto text = parts_.record.read(problem);
+    auto record = text ? decodeGateRecord(*text) : std::nullopt;
+    if (!record && (text || !problem.empty())) {
+        parts_.log.write(GateLine::recordFailed,
+                         base::concat("keystrand: ", parts_.record.path(), ": ",
+                                      problem.empty() ? "not a record of the gate" : problem,
+                                      "; what is attached counts as accepted"));
+    }
+    record_ = record.value_or(GateRecord());
+    savedRecord_ = record ? *text : std::string();
+    policy_.resume(record_.gate);
+    watchAsNeeded();
+    return record;
+}
+
+void UsbGate::setClosed(bool closed) {
+    if (closed == policy_.closed()) {
+        return;
+    }
+    if (!closed) {
+        policy_.open();
+    } else if (const auto view = lookAtBus()) {
+        // First of all what is there now: whatever comes from here on is new.
+        watchAsNeeded();
+        policy_.close(*view, parts_.now());
+        saveDevices(*view);
+    } else {
+        return;
+    }
+    settle();
+    parts_.log.write(closed ? GateLine::closed : GateLine::opened,
+                     closed ? "keystrand: the gate is closed" : "keystrand: the gate is open");
+    watchAsNeeded();
+}
+
+void UsbGate::setLocked(bool locked) {
+    locked_ = locked;
+    watchAsNeeded();
+    if (locked_) {
+        look();
+    }
+}
+
+void UsbGate::keepDevices() {
+    keepsDevices_ = true;
+    if (const auto view = locked_ || policy_.closed() ? lookAtBus() : std::nullopt) {
+        saveDevices(*view);
+    }
+}
+
+void UsbGate::remember(bool restricted, std::optional<BootTime> openUntil) {
+    record_.restricted = restricted;
+    record_.openUntil = openUntil;
+    save();
+}
+
+void UsbGate::keepOnlyKnown() {
+    std::string problem;
+    const auto text = parts_.devices.read(problem);
+    const auto known = text ? decodeKnownDevices(*text) : std::nullopt;
+    if (!known) {
+        parts_.log.write(GateLine::recordFailed,
+                         base::concat("keystrand: ", parts_.devices.path(), ": ",
+                                      !problem.empty() ? problem
+                                      : text           ? "not a list of devices"
+                                                       : "there is none",
+                                      "; what is attached counts as accepted"));
+        return;
+    }
+    if (const auto view = lookAtBus()) {
+        policy_.keepOnly(
+            [&](const UsbDevice& device) { return known->contains(acrossStarts(device)); }, *view,
+            parts_.now());
+        settle();
+    }
+}
+
+std::optional<std::string> UsbGate::accept(const Attachment& attachment) {
+    const auto view = lookAtBus();
+    const UsbDevice* const found = view ? view->find(attachment) : nullptr;
+    if (found == nullptr) {
+        return "the device is not there any more";
+    }
+    if (found->authorized) {
+        return "the device is accepted already";
+    }
+    if (policy_.accept(attachment, parts_.now())) {
+        settle();
+    } else {
+        const GateAction action{
+            .kind = Kind::accept, .hub = {}, .device = *found, .standing = Standing::administrator};
+        tell(action, parts_.bus.accept(*found));
+    }
+    const auto after = lookAtBus();
+    const UsbDevice* const now = after ? after->find(attachment) : nullptr;
+    return now != nullptr && now->authorized
+               ? std::nullopt
+               : std::optional<std::string>("the device could not be accepted");
+}
+
+void UsbGate::look() {
+    if (policy_.state().phase != GateState::Phase::open) {
+        settle();
+    } else if (locked_) {
+        if (const auto view = lookAtBus()) {
+            saveDevices(*view);
+        }
+    }
+}
+
+std::vector<UsbGate::Listed> UsbGate::list() {
+    std::vector<Listed> listed;
+    const BusView view = lookAtBus().value_or(BusView());
+    for (const UsbDevice& device : view.devices) {
+        const KnownDevice* const known = policy_.find(device.attachment);
+        listed.push_back({.device = device,
+                          .standing = known ? std::optional(known->standing) : std::nullopt,
+                          .since = known ? known->since : BootTime(0)});
+    }
+    return listed;
+}
+
+std::optional<BusView> UsbGate::lookAtBus() {
+    std::string problem;
+    auto view = parts_.bus.look(problem);
+    if (!view && problem != toldProblem_) {
+        parts_.log.write(GateLine::cannotGuard,
+                         base::concat("keystrand: no port is guarded: ", problem));
+    }
+    toldProblem_ = view ? std::string() : problem;
+    return view;
+}
+
+void UsbGate::settle() {
+    // A write may be told to be an event before it has returned.
+    if (std::exchange(settling_, true)) {
+        return;
+    }
+    for (int round = 0; round < kMostRounds && step(); ++round) {
+    }
+    settling_ = false;
+    save();
+    parts_.rearm();
+}
+
+bool UsbGate::step() {
+    const auto view = lookAtBus();
+    if (!view) {
+        return false;
+    }
+    const BootTime now = parts_.now();
+    const auto actions = policy_.decide(*view, now);
+    if (actions.empty() && locked_) {
+        saveDevices(*view);
+    }
+    save();
+    for (const GateAction& action : actions) {
+        const GateOutcome outcome = carryOut(action);
+        policy_.carriedOut(action, outcome, now);
+        tell(action, outcome);
+    }
+    return !actions.empty();
+}
+
+GateOutcome UsbGate::carryOut(const GateAction& action) {
+    switch (action.kind) {
+    case Kind::setParameter:
+        return parts_.bus.setParameter(action.value);
+    case Kind::setRootHub:
+        return parts_.bus.setRootHub(action.hub, action.value);
+    case Kind::accept:
+        return parts_.bus.accept(action.device);
+    case Kind::refuse:
+        return parts_.bus.refuse(action.device);
+    case Kind::stayOut:
+        return {};
+    }
+    return {};
+}
+
+void UsbGate::tell(const GateAction& action, const GateOutcome& outcome) {
+    if (action.kind != Kind::setParameter && action.kind != Kind::setRootHub) {
+        tellDevice(action, outcome);
+        return;
+    }
+    if (outcome.kind == GateOutcome::Kind::vanished) {
+        return;
+    }
+    const bool isParameter = action.kind == Kind::setParameter;
+    const std::string what = isParameter
+                                 ? "the parameter authorized_default"
+                                 : base::concat("root hub usb", std::to_string(action.hub.bus));
+    if (outcome.kind == GateOutcome::Kind::failed) {
+        parts_.log.write(GateLine::writeFailed,
+                         base::concat("keystrand: ", what, " cannot be set to ",
+                                      std::to_string(action.value), ": ", outcome.reason));
+    } else if (outcome.readBack != action.value) {
+        parts_.log.write(GateLine::writeFailed,
+                         base::concat("keystrand: ", what, " was set to ",
+                                      std::to_string(action.value), " and reads ",
+                                      std::to_string(outcome.readBack)));
+    }
+}
+
+void UsbGate::tellDevice(const GateAction& action, const GateOutcome& outcome) {
+    const std::string device = describe(action.device);
+    const bool isAccepted = action.kind == Kind::accept;
+    switch (outcome.kind) {
+    case GateOutcome::Kind::done:
+        parts_.log.write(isAccepted ? GateLine::accepted : GateLine::refused,
+                         isAccepted ? base::concat("keystrand: accepted ", device, ": ",
+                                                   reasonFor(action.standing))
+                                    : base::concat("keystrand: refused ", device));
+        return;
+    case GateOutcome::Kind::inUse:
+        parts_.log.write(GateLine::left,
+                         base::concat("keystrand: left ", device, ": in use: ", outcome.reason));
+        return;
+    case GateOutcome::Kind::failed:
+        parts_.log.write(GateLine::writeFailed,
+                         base::concat("keystrand: cannot ", isAccepted ? "accept " : "refuse ",
+                                      device, ": ", outcome.reason));
+        return;
+    case GateOutcome::Kind::vanished:
+        return;
+    }
+}
+
+void UsbGate::save() {
+    record_.gate = policy_.state();
+    const std::string text = encodeGateRecord(record_);
+    if (text == savedRecord_) {
+        return;
+    }
+    std::string problem;
+    if (!parts_.record.replace(text, problem)) {
+        // The gate closes all the same; only the next service knows less.
+        parts_.log.write(GateLine::recordFailed, base::concat("keystrand: ", problem));
+    }
+    savedRecord_ = text;
+}
+
+void UsbGate::saveDevices(const BusView& view) {
+    if (!keepsDevices_) {
+        return;
+    }
+    KnownDevices known;
+    for (const UsbDevice& device : view.devices) {
+        const KnownDevice* const entry = policy_.find(device.attachment);
+        if (device.authorized && (entry == nullptr || isIn(entry->standing))) {
+            known.insert(acrossStarts(device));
+        }
+    }
+    std::string text = encodeKnownDevices(known);
+    if (text == savedDevices_) {
+        return;
+    }
+    std::string problem;
+    if (!parts_.devices.replace(text, problem)) {
+        parts_.log.write(GateLine::recordFailed, base::concat("keystrand: ", problem));
+    }
+    savedDevices_ = std::move(text);
+}
+
+void UsbGate::watchAsNeeded() {
+    // Nothing wakes the service while the gate is open and nobody will ask what was attached.
+    const bool wanted = locked_ || policy_.state().phase != GateState::Phase::open;
+    if (wanted == watching_) {
+        return;
+    }
+    watching_ = wanted;
+    if (wanted) {
+        parts_.bus.watch([this] { look(); });
+    } else {
+        parts_.bus.watch(nullptr);
+    }
+}
+
+} // namespace keystrand::usb

@@ -1,0 +1,353 @@
+// The gate on a bus: what it writes, in which order, what it says, and what the next service finds.
+
+#include "keystrand-linux/UsbGate.h"
+
+#include "tests/keystrand-linux/FakeUsbBus.h"
+#include "tests/support/TemporaryDirectory.h"
+
+#include <gtest/gtest.h>
+
+namespace keystrand::usb {
+namespace {
+
+using namespace std::chrono_literals;
+using Lines = std::vector<std::string>;
+
+class Log : public GateLog {
+  public:
+    void write(GateLine about, const std::string& text) override {
+        lines.push_back(text);
+        abouts.push_back(about);
+    }
+    Lines take() { return std::exchange(lines, {}); }
+
+    Lines lines;
+    std::vector<GateLine> abouts;
+};
+
+/// The end of the process at a write.
+struct Killed {};
+
+class UsbGateTest : public testing::Test {
+  protected:
+    UsbGateTest() {
+        bus.addRootHub(1, "pci0");
+        bus.addRootHub(2, "pci1");
+        start();
+    }
+
+    std::optional<GateRecord> start(const GateRules& rules = {}) {
+        gate.emplace(UsbGate::Parts{.bus = bus,
+                                    .record = record,
+                                    .devices = devices,
+                                    .log = log,
+                                    .now = [this] { return now; },
+                                    .rearm =
+                                        [this] {
+                                            ++rearmed;
+                                        }},
+                     rules);
+        return gate->resume();
+    }
+
+    std::optional<GateRecord> recordOnDisk() {
+        std::string problem;
+        const auto text = record.read(problem);
+        return text ? decodeGateRecord(*text) : std::nullopt;
+    }
+    std::set<std::string> pathsOnDisk() {
+        std::string problem;
+        const auto text = devices.read(problem);
+        const auto known = text ? decodeKnownDevices(*text) : std::nullopt;
+        std::set<std::string> paths;
+        for (const KnownAcrossStarts& device : known.value_or(KnownDevices())) {
+            paths.insert(device.controller + " " + device.path);
+        }
+        return paths;
+    }
+
+    support::TemporaryDirectory directory;
+    StateFile record{directory.file("gate"), StateFile::Durability::none};
+    StateFile devices{directory.file("devices"), StateFile::Durability::synced};
+    FakeUsbBus bus;
+    Log log;
+    BootTime now = 1000s;
+    int rearmed = 0;
+    std::optional<UsbGate> gate;
+};
+
+TEST_F(UsbGateTest, ClosesAndOpensWithALineEach) {
+    gate->setClosed(true);
+    EXPECT_EQ(log.take(), Lines{"keystrand: the gate is closed"});
+    gate->setClosed(true);
+    gate->setClosed(false);
+    EXPECT_EQ(log.take(), Lines{"keystrand: the gate is open"});
+    EXPECT_EQ(recordOnDisk(), GateRecord());
+    gate->setClosed(false);
+    EXPECT_EQ(log.take(), Lines());
+}
+
+TEST_F(UsbGateTest, EachRefusalAndEachAcceptanceHasALine) {
+    gate->setClosed(true);
+    log.take();
+    Plug plug = aDisk();
+    plug.name = "Stick \"\x01\xff\\";
+    plug.serial = "A1";
+    bus.plug("1-1", plug);
+    Plug unknown = aDisk();
+    unknown.descriptors.resize(7);
+    bus.plug("2-3", unknown);
+    EXPECT_EQ(
+        log.take(),
+        (Lines{R"(keystrand: refused 1-1 (1111:2222 "maker" "Stick \x22\x01\xff\x5c", serial )"
+               R"("A1", classes 08/06/50))",
+               R"(keystrand: refused 2-3 (1111:2222 "maker" "disk", unknown))"}));
+    bus.plug("1-2", aKeyboard());
+    EXPECT_EQ(log.take(),
+              (Lines{R"(keystrand: accepted 1-2 (1111:2222 "maker" "keyboard", classes )"
+                     R"(03/01/01 03/00/00): no other keyboard is attached)"}));
+    gate->setClosed(false);
+    EXPECT_EQ(
+        log.take(),
+        (Lines{R"(keystrand: accepted 1-1 (1111:2222 "maker" "Stick \x22\x01\xff\x5c", serial )"
+               R"("A1", classes 08/06/50): the gate is open again)",
+               R"(keystrand: accepted 2-3 (1111:2222 "maker" "disk", unknown): the gate is open )"
+               R"(again)",
+               "keystrand: the gate is open"}));
+}
+
+TEST_F(UsbGateTest, RecordIsThereBeforeEachWrite) {
+    int writes = 0;
+    const std::function<void()> check = [&] {
+        const auto kept = recordOnDisk();
+        // The look comes first; from the second on something is to be written.
+        if (++writes > 2) {
+            ASSERT_TRUE(kept);
+            EXPECT_EQ(kept->gate.phase, GateState::Phase::closed);
+            EXPECT_TRUE(kept->gate.parameter);
+            EXPECT_EQ(kept->gate.hubs.size(), 2U);
+        }
+        if (writes < 8) {
+            bus.setMeanwhile(check);
+        }
+    };
+    bus.setMeanwhile(check);
+    gate->setClosed(true);
+    EXPECT_GE(writes, 5);
+}
+
+TEST_F(UsbGateTest, KilledAtEachMomentTheNextServiceGoesOn) {
+    int moment = 1;
+    for (bool reached = true; reached; ++moment) {
+        ASSERT_LT(moment, 60);
+        bus.plug("1-1", aMouse());
+        int left = moment;
+        const std::function<void()> kill = [&] {
+            if (--left == 0) {
+                throw Killed();
+            }
+            bus.setMeanwhile(kill);
+        };
+        bus.setMeanwhile(kill);
+        bool wasClosing = false;
+        try {
+            gate->setClosed(true);
+            bus.plug("1-2", aDisk());
+            bus.plug("1-3", aHub());
+            wasClosing = true;
+            gate->setClosed(false);
+        } catch (const Killed&) {
+        }
+        reached = left <= 0;
+        bus.setMeanwhile(nullptr);
+        // What it was to do, the next one does: close in the first half, open in the second.
+        const auto kept = start();
+        gate->setClosed(!wasClosing);
+        gate->look();
+        const AuthorizedDefault wanted = wasClosing ? kEverybody : kHardWiredOnly;
+        EXPECT_EQ(bus.rootHubDefault(1), wanted) << moment;
+        EXPECT_EQ(bus.rootHubDefault(2), wanted) << moment;
+        EXPECT_TRUE(bus.isAuthorized("1-1")) << moment;
+        gate->setClosed(false);
+        gate->look();
+        EXPECT_EQ(bus.parameter(), kAsTheControllerHasIt) << moment;
+        EXPECT_EQ(bus.rootHubDefault(1), kEverybody) << moment;
+        for (const char* port : {"1-2", "1-3"}) {
+            EXPECT_EQ(bus.isAuthorized(port), bus.isPlugged(port)) << moment;
+            bus.unplug(port);
+        }
+        bus.unplug("1-1");
+        EXPECT_EQ(recordOnDisk(), GateRecord()) << moment;
+    }
+    EXPECT_GT(moment, 15);
+}
+
+TEST_F(UsbGateTest, RecordThatCannotBeUnderstoodIsTold) {
+    std::string problem;
+    ASSERT_TRUE(record.replace("nonsense\n", problem));
+    log.take();
+    EXPECT_EQ(start(), std::nullopt);
+    EXPECT_EQ(log.take(), Lines{"keystrand: " + record.path() +
+                                ": not a record of the gate; what is attached counts as accepted"});
+}
+
+TEST_F(UsbGateTest, RecordThatCannotBeWrittenLeavesNothingOpen) {
+    const StateFile nowhere(directory.file("none/gate"), StateFile::Durability::none);
+    gate.emplace(UsbGate::Parts{.bus = bus,
+                                .record = nowhere,
+                                .devices = devices,
+                                .log = log,
+                                .now = [this] { return now; },
+                                .rearm =
+                                    [] {
+                                    }},
+                 GateRules{});
+    gate->setClosed(true);
+    EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
+    ASSERT_FALSE(log.lines.empty());
+    EXPECT_EQ(log.lines.front(),
+              "keystrand: " + nowhere.path() + ": cannot be written: No such file or directory");
+}
+
+TEST_F(UsbGateTest, WithoutUsbThatIsSaidOnce) {
+    bus.setMissing(true);
+    gate->setClosed(true);
+    gate->setClosed(true);
+    EXPECT_EQ(log.take(), Lines{"keystrand: no port is guarded: no USB here"});
+    EXPECT_FALSE(gate->closed());
+    // It comes later.
+    bus.setMissing(false);
+    gate->setClosed(true);
+    EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
+}
+
+TEST_F(UsbGateTest, NothingIsWatchedWhileTheMachineIsUnlocked) {
+    EXPECT_FALSE(bus.isWatched());
+    gate->setLocked(true);
+    EXPECT_TRUE(bus.isWatched());
+    gate->setClosed(true);
+    gate->setLocked(false);
+    EXPECT_TRUE(bus.isWatched());
+    gate->setClosed(false);
+    EXPECT_FALSE(bus.isWatched());
+}
+
+TEST_F(UsbGateTest, DevicesThatAreInAreKeptWhileLocked) {
+    bus.plug("1-1", aMouse());
+    gate->setLocked(true);
+    EXPECT_EQ(pathsOnDisk(), std::set<std::string>());
+    gate->keepDevices();
+    EXPECT_EQ(pathsOnDisk(), std::set<std::string>{"pci0 1"});
+    bus.plug("2-1", aDisk());
+    EXPECT_EQ(pathsOnDisk(), (std::set<std::string>{"pci0 1", "pci1 1"}));
+    gate->setClosed(true);
+    bus.plug("2-2", aDisk());
+    bus.unplug("1-1");
+    EXPECT_EQ(pathsOnDisk(), std::set<std::string>{"pci1 1"});
+    gate->setClosed(false);
+    gate->setLocked(false);
+    bus.plug("1-1", aMouse());
+    EXPECT_EQ(pathsOnDisk(), (std::set<std::string>{"pci1 1", "pci1 2"}));
+}
+
+TEST_F(UsbGateTest, AfterARestartOnlyWhatWasThereStays) {
+    bus.plug("1-1", aMouse());
+    bus.plug("2-1", aDisk());
+    gate->setLocked(true);
+    gate->keepDevices();
+    gate->setClosed(true);
+    // The machine is off: buses may be counted in another order, and a device is added.
+    std::string problem;
+    ASSERT_TRUE(record.remove(problem));
+    FakeUsbBus next;
+    next.addRootHub(1, "pci1");
+    next.addRootHub(2, "pci0");
+    next.plug("1-1", aDisk());
+    next.plug("2-1", aMouse());
+    next.plug("2-2", aDisk());
+    Plug changed = aDisk();
+    changed.serial = "other";
+    next.plug("1-2", changed);
+    UsbGate after(UsbGate::Parts{.bus = next,
+                                 .record = record,
+                                 .devices = devices,
+                                 .log = log,
+                                 .now = [this] { return now; },
+                                 .rearm =
+                                     [] {
+                                     }},
+                  GateRules{});
+    EXPECT_EQ(after.resume(), std::nullopt);
+    after.setClosed(true);
+    EXPECT_TRUE(next.isAuthorized("2-2"));
+    after.keepOnlyKnown();
+    EXPECT_TRUE(next.isAuthorized("1-1"));
+    EXPECT_TRUE(next.isAuthorized("2-1"));
+    EXPECT_FALSE(next.isAuthorized("2-2"));
+    EXPECT_FALSE(next.isAuthorized("1-2"));
+}
+
+TEST_F(UsbGateTest, WithoutAListNothingIsTaken) {
+    bus.plug("1-1", aDisk());
+    gate->setClosed(true);
+    log.take();
+    gate->keepOnlyKnown();
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+    EXPECT_EQ(log.take(), Lines{"keystrand: " + devices.path() +
+                                ": there is none; what is attached counts as accepted"});
+}
+
+TEST_F(UsbGateTest, AdministratorAcceptsWhatWasListed) {
+    gate->setClosed(true);
+    bus.plug("1-1", aDisk());
+    const auto listed = gate->list();
+    ASSERT_EQ(listed.size(), 1U);
+    EXPECT_EQ(listed[0].standing, Standing::refused);
+    EXPECT_EQ(listed[0].since, now);
+    EXPECT_EQ(gate->accept(listed[0].device.attachment), std::nullopt);
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+    EXPECT_EQ(gate->accept(listed[0].device.attachment), "the device is accepted already");
+    bus.replug("1-1");
+    EXPECT_EQ(gate->accept(listed[0].device.attachment), "the device is not there any more");
+    // With an open gate, too: somebody else may have refused it.
+    gate->setClosed(false);
+    bus.setAuthorized("1-1", false);
+    EXPECT_EQ(gate->list()[0].standing, std::nullopt);
+    EXPECT_EQ(gate->accept(bus.attachmentAt("1-1")), std::nullopt);
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+}
+
+TEST_F(UsbGateTest, AcceptanceThatFailsIsTold) {
+    gate->setClosed(true);
+    bus.plug("1-1", aDisk());
+    log.take();
+    bus.failWrites(1);
+    EXPECT_EQ(gate->accept(bus.attachmentAt("1-1")), "the device could not be accepted");
+    EXPECT_EQ(log.take(),
+              Lines{R"(keystrand: cannot accept 1-1 (1111:2222 "maker" "disk", classes )"
+                    R"(08/06/50): Input/output error)"});
+}
+
+TEST_F(UsbGateTest, WhatIsRememberedIsInTheRecord) {
+    gate->setClosed(true);
+    gate->remember(true, 1234us);
+    const auto kept = start();
+    ASSERT_TRUE(kept);
+    EXPECT_TRUE(kept->restricted);
+    EXPECT_EQ(kept->openUntil, 1234us);
+    EXPECT_TRUE(gate->closed());
+}
+
+TEST_F(UsbGateTest, NextLookIsMadeKnown) {
+    gate->setClosed(true);
+    rearmed = 0;
+    bus.plug("1-1", aHub());
+    EXPECT_GE(rearmed, 1);
+    EXPECT_EQ(gate->nextLook(), now + GatePolicy::kProbeTime);
+    now += GatePolicy::kProbeTime;
+    gate->look();
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+}
+
+} // namespace
+} // namespace keystrand::usb
