@@ -2,6 +2,7 @@
 
 #include "base/Concat.h"
 #include "kstctl/Output.h"
+#include "kstctl/commands/Inputs.h"
 #include "kstctl/decode/Kinds.h"
 
 #include <CLI/CLI.hpp>
@@ -102,11 +103,10 @@ void addUpload(CLI::App& app, CommandLine& options) {
 void addSend(CLI::App& app, CommandLine& options) {
     CLI::App* const send = addCommand(app, "send", "Send an event to the daemon");
     auto& command = chosenBy<SendCommand>(send, options);
-    send->add_option("name", command.name,
-                     "settings, timer-restarted, analytics-collected, save-analytics, "
-                     "timer-restarted-analytics, alarm, or a whole name")
+    send->add_option("name", command.name, base::concat(eventShortNames(), ", or a whole name"))
         ->required();
-    send->add_option("--stream", command.stream, "notifyd, corvid, alarm, or a whole name");
+    send->add_option("--stream", command.stream,
+                     base::concat(streamShortNames(), ", or a whole name"));
     CLI::Option* const payload =
         send->add_option("--payload", command.payload, "The payload, in hexadecimal");
     send->add_option("--date", command.date, "The payload is this date")->excludes(payload);

@@ -217,7 +217,23 @@ platform::Result<std::string> wholeName(std::span<const ShortName> names, const 
                                                    "; --exact sends it all the same"));
 }
 
+std::string listed(std::span<const ShortName> names) {
+    std::string list;
+    for (const ShortName& name : names) {
+        list += base::concat(list.empty() ? "" : ", ", name.name);
+    }
+    return list;
+}
+
 } // namespace
+
+std::string eventShortNames() {
+    return listed(kEvents);
+}
+
+std::string streamShortNames() {
+    return listed(kStreams);
+}
 
 platform::Result<EventName> findEventName(const SendCommand& command) {
     auto name = wholeName(kEvents, command.name, "event", command.isExact);

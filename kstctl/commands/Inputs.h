@@ -34,6 +34,10 @@ struct EventName {
     std::string name;
 };
 
+/// The short names of events and of streams, as help and messages list them: "one, other".
+[[nodiscard]] std::string eventShortNames();
+[[nodiscard]] std::string streamShortNames();
+
 /// The names that a `send` means. A short name stands for its event and, unless the command says
 /// otherwise, the stream on which that comes. Any other name must have a point in it or be sent
 /// with --exact: it is a mistake otherwise (ExitStatus::usage), because the daemon drops what it

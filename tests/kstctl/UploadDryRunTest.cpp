@@ -102,11 +102,11 @@ TEST_F(UploadDryRunTest, NothingIsLeftBehindWhenTheDaemonHasEnded) {
     configure({});
     launch();
     publishEvent();
-    kstctl({"events", "list"});
+    EXPECT_EQ(kstctl({"events", "list"}).status, 0);
     daemon->signal(SIGTERM);
-    EXPECT_EQ(daemon->awaitEnd(), 0);
+    EXPECT_EQ(daemon->awaitEnd(), 0) << testing::PrintToString(daemon->lines());
     const auto before = files();
-    EXPECT_FALSE(before.contains(database() + "-wal"));
+    EXPECT_FALSE(before.contains(database() + "-wal")) << testing::PrintToString(daemon->lines());
     EXPECT_EQ(at(json({"events", "list"}), "stored"), Value(std::int64_t{1}));
     EXPECT_EQ(at(json({"status"}, 3), "database.events"), Value(std::int64_t{1}));
     kstctl({"upload", "--dry-run"});
