@@ -81,13 +81,18 @@ TEST(Words, EveryStatusOfTheLibraryHasAText) {
 // What the connection's sources say an error is must have words of its own; what the system may say
 // besides has at least the words of a connection that failed.
 TEST(Words, EveryErrorThatTheConnectionNamesHasAText) {
-    const fs::path folder = fs::path(SOURCE_ROOT) / "platform/linux";
+    const std::set<std::string> sources = {"KernelSocketConnection.cpp", "LinuxKernelChannel.cpp",
+                                           "LinuxServiceRegistry.cpp", "LocalConnection.cpp"};
     const auto numbers = errorNumbers();
     const std::string other = KSTStatusText(KST_STATUS_OF_ERRNO(kLastErrno));
+    std::set<std::string> seen;
     std::size_t count = 0;
-    for (const char* const file : {"KernelSocketConnection.cpp", "LinuxKernelChannel.cpp",
-                                   "LinuxServiceRegistry.cpp", "LocalConnection.cpp"}) {
-        for (const std::string& name : found(contentOf(folder / file), R"(\b(E[A-Z0-9]{3,})\b)")) {
+    for (const auto& file : fs::recursive_directory_iterator(fs::path(SOURCE_ROOT) / "platform")) {
+        if (sources.count(file.path().filename()) == 0) {
+            continue;
+        }
+        seen.insert(file.path().filename());
+        for (const std::string& name : found(contentOf(file.path()), R"(\b(E[A-Z0-9]{3,})\b)")) {
             if (name == "EINTR") { // never the end of a call
                 continue;
             }
@@ -96,6 +101,7 @@ TEST(Words, EveryErrorThatTheConnectionNamesHasAText) {
             ++count;
         }
     }
+    EXPECT_EQ(seen, sources);
     EXPECT_GE(count, 12U);
 }
 
