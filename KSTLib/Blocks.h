@@ -34,7 +34,7 @@ struct BlockOf<void(Arguments...)> {
 
     template <typename Callable,
               typename = std::enable_if_t<std::is_invocable_v<Callable&, Arguments...>>>
-    BlockOf(Callable&& callable) noexcept : BlockOf() {
+    BlockOf(Callable&& callable KST_LIFETIMEBOUND) noexcept : BlockOf() {
         using Target = std::remove_reference_t<Callable>;
         if constexpr (std::is_function_v<Target>) {
             invoke = callFunction<Target>;
@@ -106,8 +106,9 @@ typedef struct KSTRequirement KSTRequirement;
  *
  *  C fills in both members. C++ may instead pass nullptr or anything that can be called with what
  *  the block is handed. The callable is held by its address and must live until the library
- *  function has returned, which an argument written in the call does; an exception that leaves it
- *  ends the program. A null function pointer and an empty std::function give a null block. */
+ *  function has returned, which an argument written in the call does; clang warns of a block that
+ *  is stored without its callable. An exception that leaves it ends the program. A null function
+ * pointer and an empty std::function give a null block. */
 
 #ifdef __cplusplus
 #define KST_BLOCK(name, ...)                                                                       \

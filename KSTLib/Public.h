@@ -53,4 +53,15 @@
 #define KST_CHECKED
 #endif
 
+/** Marks what a result keeps pointing to: a compiler that knows the mark warns when the result is
+ *  stored and what it points to is gone. */
+#if defined(__cplusplus) && defined(__has_cpp_attribute)
+#if __has_cpp_attribute(clang::lifetimebound)
+#define KST_LIFETIMEBOUND [[clang::lifetimebound]]
+#endif
+#endif
+#ifndef KST_LIFETIMEBOUND
+#define KST_LIFETIMEBOUND
+#endif
+
 #endif

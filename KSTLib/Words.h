@@ -183,20 +183,21 @@ KST_WORDS const char* KSTStatusText(KSTStatus status) KST_WORDS_END {
     case kKSTKernelErrorBadConstraint:
         return "a constraint or an access-control list that cannot be understood";
     case KST_STATUS_OF_ERRNO(EPERM):
-        return "the socket of the kernel service belongs to another user";
+        return "the socket of the kernel service is served by another user";
     case KST_STATUS_OF_ERRNO(ENOENT):
     case KST_STATUS_OF_ERRNO(ENOTDIR):
         return "the kernel service has no socket";
     case KST_STATUS_OF_ERRNO(EACCES):
-        return "this user may not reach the kernel service";
+        return "this user may not connect to the kernel service";
     case KST_STATUS_OF_ERRNO(ECONNREFUSED):
-        return "nobody listens on the socket of the kernel service";
+        return "nobody serves the socket of the kernel service";
     case KST_STATUS_OF_ERRNO(ETIMEDOUT):
         return "the kernel service did not answer in time";
     case KST_STATUS_OF_ERRNO(ECONNRESET):
+        return "the kernel service hung up instead of answering";
     case KST_STATUS_OF_ERRNO(EPIPE):
     case KST_STATUS_OF_ERRNO(ENOTCONN):
-        return "the kernel service hung up";
+        return "the kernel service hung up before anything was sent";
     case KST_STATUS_OF_ERRNO(EPROTO):
         return "the kernel service broke the rules of the connection";
     case KST_STATUS_OF_ERRNO(EMSGSIZE):

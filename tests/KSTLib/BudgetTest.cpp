@@ -1,20 +1,24 @@
 // What one kernel control may cost on its way down. The test program's operator new counts, so this
 // is a program of its own.
 
-#include "KSTLib/KSTLib.h"
+#include "KSTLib/KSTLib.hpp"
 #include "KSTLib/Platform.h"
+#include "tests/common/RequirementSamples.h"
 #include "tests/support/RecordingLog.h"
 #include "tests/support/ScriptedGate.h"
 
 #include <gtest/gtest.h>
 
 #include <array>
+#include <cstdint>
 #include <cstdlib>
 #include <new>
 
 namespace {
 
 std::size_t newCalls = 0;
+/// How many more succeed.
+std::size_t newCallsLeft = SIZE_MAX;
 
 /// Counts calls and keeps nothing, so that it allocates nothing.
 class CountingChannel : public platform::KernelChannel {
@@ -82,8 +86,11 @@ class CountingGate : public kst::AllocationGate {
 
 void* operator new(std::size_t size) {
     ++newCalls;
-    if (void* memory = std::malloc(size == 0 ? 1 : size)) {
-        return memory;
+    if (newCallsLeft > 0) {
+        newCallsLeft -= newCallsLeft == SIZE_MAX ? 0 : 1;
+        if (void* memory = std::malloc(size == 0 ? 1 : size)) {
+            return memory;
+        }
     }
     throw std::bad_alloc();
 }
@@ -133,4 +140,24 @@ TEST(Budget, TheCounterCounts) {
     const auto* number = new int(1);
     EXPECT_EQ(newCalls, before + 1);
     delete number;
+}
+
+// Each allocation of a copied tree in turn is the one that is not to be had.
+TEST(Budget, ACopiedRequirementThatHasNoMemoryIsAStatus) {
+    support::Bytes one = support::leafBytes(3, 68);
+    support::Bytes other = support::leafBytes(13, 32);
+    support::Bytes both =
+        support::compositeInMemory(4, {support::asRequirement(one), support::asRequirement(other)});
+    std::size_t needed = 0;
+    for (;; ++needed) {
+        newCallsLeft = needed;
+        const auto copy = kst::Requirement::of(support::asRequirement(both));
+        newCallsLeft = SIZE_MAX;
+        if (copy) {
+            break;
+        }
+        ASSERT_EQ(copy.error().value(), kKSTErrorOutOfMemory) << needed;
+        ASSERT_LT(needed, 100U);
+    }
+    EXPECT_GE(needed, 7U);
 }
