@@ -57,6 +57,9 @@ class EventLoop {
     [[nodiscard]] bool run();
     void stop();
 
+    /// For what brings sources of its own, as a connection to the message bus does.
+    [[nodiscard]] sd_event* handle() const { return event_.get(); }
+
   private:
     struct Release {
         void operator()(sd_event* event) const { sd_event_unref(event); }

@@ -22,8 +22,6 @@ namespace keystrand {
 
 namespace {
 
-constexpr mode_t kSocketMode = 0600;
-
 std::string reason(const std::string& path, const char* what) {
     return base::concat(path, ": ", what, ": ", std::generic_category().message(errno));
 }
@@ -62,7 +60,7 @@ bool clearPath(const std::string& path, const base::UnixAddress& address, int ty
 } // namespace
 
 std::optional<ListeningSocket> ListeningSocket::open(const std::string& path, int type,
-                                                     std::string& error) {
+                                                     std::string& error, mode_t mode) {
     const auto address = base::UnixAddress::of(path);
     if (!address) {
         error = base::concat(path, ": too long for a socket");
@@ -72,14 +70,16 @@ std::optional<ListeningSocket> ListeningSocket::open(const std::string& path, in
         return std::nullopt;
     }
     base::FileDescriptor fd(::socket(AF_UNIX, type | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
-    // The file takes over the mode that the descriptor has when it is bound.
-    if (!fd.isOpen() || ::fchmod(fd.get(), kSocketMode) != 0 ||
+    // The file takes over the mode that the descriptor has when it is bound, without what the umask
+    // takes away.
+    if (!fd.isOpen() || ::fchmod(fd.get(), mode) != 0 ||
         ::bind(fd.get(), address->get(), address->size()) != 0) {
         error = reason(path, "cannot make the socket");
         return std::nullopt;
     }
     struct stat made {};
-    if (::lstat(path.c_str(), &made) != 0 || ::listen(fd.get(), SOMAXCONN) != 0) {
+    if (::lstat(path.c_str(), &made) != 0 || ::listen(fd.get(), SOMAXCONN) != 0 ||
+        ::chmod(path.c_str(), mode) != 0) {
         error = reason(path, "cannot listen");
         return std::nullopt;
     }
@@ -148,20 +148,18 @@ bool isOutOfRoom(int error) {
     return error == EMFILE || error == ENFILE || error == ENOBUFS || error == ENOMEM;
 }
 
-/// Whether the process at the other end runs as root or as this process's user.
-bool isTrustedPeer(int fd) {
-    ucred peer{};
-    socklen_t length = sizeof peer;
-    if (::getsockopt(fd, SOL_SOCKET, SO_PEERCRED, &peer, &length) != 0) {
-        return false;
-    }
-    return peer.uid == 0 || peer.uid == ::geteuid();
-}
-
 } // namespace
 
 Acceptor::Acceptor(EventLoop& loop, ListeningSocket socket, Handler handler)
+    : Acceptor(loop, std::move(socket), std::nullopt, std::move(handler)) {}
+
+Acceptor::Acceptor(EventLoop& loop, ListeningSocket socket, uid_t user, Handler handler)
+    : Acceptor(loop, std::move(socket), std::optional(user), std::move(handler)) {}
+
+Acceptor::Acceptor(EventLoop& loop, ListeningSocket socket, std::optional<uid_t> user,
+                   Handler handler)
     : socket_(std::move(socket)),
+      user_(user),
       handler_(std::move(handler)),
       source_(loop.watch(socket_.fd(), EPOLLIN, [this](std::uint32_t /*events*/) { accept(); })),
       retry_(loop.timer(CLOCK_MONOTONIC, [this] { resume(); })) {}
@@ -185,9 +183,18 @@ void Acceptor::accept() {
         }
         return;
     }
-    if (isTrustedPeer(connection.get())) {
+    if (isTrusted(connection.get())) {
         handler_(std::move(connection));
     }
+}
+
+bool Acceptor::isTrusted(int connection) const {
+    ucred peer{};
+    socklen_t length = sizeof peer;
+    if (::getsockopt(connection, SOL_SOCKET, SO_PEERCRED, &peer, &length) != 0) {
+        return false;
+    }
+    return user_ ? peer.uid == *user_ : peer.uid == 0 || peer.uid == ::geteuid();
 }
 
 } // namespace keystrand

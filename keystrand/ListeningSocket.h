@@ -15,14 +15,17 @@
 
 namespace keystrand {
 
-/// A Unix socket that listens. One of its own making has mode 0600, and its file goes when it goes,
-/// unless somebody has put another file in its place. The file of an adopted one is its owner's.
+/// A Unix socket that listens. The file of one of its own making goes when it goes, unless somebody
+/// has put another file in its place. The file of an adopted one is its owner's.
 class ListeningSocket {
   public:
+    static constexpr mode_t kOwnersOnly = 0600;
+
     /// `type` is SOCK_SEQPACKET or SOCK_STREAM. A socket file that nobody listens on is replaced.
-    /// None, with a reason for people in `error`, when somebody does or the file cannot be made.
-    [[nodiscard]] static std::optional<ListeningSocket> open(const std::string& path, int type,
-                                                             std::string& error);
+    /// Who may connect is up to `mode`, and then to the acceptor. None, with a reason for people in
+    /// `error`, when somebody listens there or the file cannot be made.
+    [[nodiscard]] static std::optional<ListeningSocket>
+    open(const std::string& path, int type, std::string& error, mode_t mode = kOwnersOnly);
 
     /// A socket that listens already and does not block.
     [[nodiscard]] static ListeningSocket adopt(base::FileDescriptor fd);
@@ -61,16 +64,22 @@ class Acceptor {
   public:
     using Handler = std::function<void(base::FileDescriptor connection)>;
 
-    /// The loop outlives it.
+    /// The loop outlives it. Root and this process's user are heard.
     Acceptor(EventLoop& loop, ListeningSocket socket, Handler handler);
+    /// One user is heard, and nobody else.
+    Acceptor(EventLoop& loop, ListeningSocket socket, uid_t user, Handler handler);
 
     void pause();
     void resume();
 
   private:
+    Acceptor(EventLoop& loop, ListeningSocket socket, std::optional<uid_t> user, Handler handler);
+
     void accept();
+    [[nodiscard]] bool isTrusted(int connection) const;
 
     ListeningSocket socket_;
+    std::optional<uid_t> user_;
     Handler handler_;
     EventSource source_;
     /// Runs when the system had no room for one more connection.
