@@ -1,108 +1,112 @@
-// Asks whether a context satisfies a policy, adds the passphrases that are missing, asks again.
+// Asks whether a context satisfies a policy, shows what is missing, adds a passphrase that is asked
+// for, and asks again, until the policy is satisfied or nothing changes any more.
 //
 //     verify_policy POLICY
 
+#define _DEFAULT_SOURCE // explicit_bzero, which -std=c11 alone hides
+
 #include <KSTLib/KSTLib.h>
+#include <KSTLib/Words.h>
 #include <inttypes.h>
 #include <stdio.h>
 #include <string.h>
+#include <termios.h>
 #include <unistd.h>
 
-// Properties of credentials; 200 of a requirement is the purpose that it asks for.
-enum { kUserProperty = 5, kPassphraseProperty = 200, kPurposeProperty = 201, kMaxPurposes = 8 };
-
-// What the blocks take out of the answer: the requirement is gone when the call has returned.
+// What the blocks take out of an answer: the requirement is gone when the call has returned.
 typedef struct Answer {
-    bool satisfied;
+    uint64_t missing; // differs when something else is missing; 0 when nothing is
     int depth;
-    KSTPassphrasePurpose purposes[kMaxPurposes];
-    size_t purposesCount;
+    bool wantsPassphrase;
+    KSTPassphrasePurpose purpose;
 } Answer;
 
 static void takeMissing(void* captured, const KSTRequirement* requirement) {
     Answer* answer = captured;
     const uint32_t type = KSTRequirementGetType(requirement);
+    const uint32_t state = KSTRequirementGetState(requirement);
     const void* data = NULL;
     size_t length = 0;
-    printf("%*s", 2 * ++answer->depth, "");
+    printf("%*s%s%s", 2 * ++answer->depth, "", KSTRequirementTypeText(type),
+           state == kKSTRequirementStateTooOld ? " (too old)" : "");
     if (type == kKSTRequirementTypePassphraseEntered &&
-        KSTRequirementGetPropertyData(requirement, kPassphraseProperty, &data, &length) == 0) {
-        KSTPassphrasePurpose purpose = 0;
-        memcpy(&purpose, data, sizeof purpose);
-        printf("a passphrase for purpose %" PRIu32 "\n", purpose);
-        if (answer->purposesCount < kMaxPurposes) {
-            answer->purposes[answer->purposesCount++] = purpose;
-        }
-    } else {
-        printf("a requirement of type %" PRIu32 "\n", type);
-        KSTRequirementGetSubrequirements(requirement, (KSTRequirementBlock){takeMissing, answer});
+        KSTRequirementGetPropertyData(requirement, kKSTRequirementPropertyPurpose, &data,
+                                      &length) == kKSTErrorSuccess) {
+        memcpy(&answer->purpose, data, sizeof answer->purpose);
+        answer->wantsPassphrase = true;
+        printf(" for purpose %" PRIu32, answer->purpose);
     }
+    putchar('\n');
+    answer->missing = answer->missing * 31 + type * 7 + state + answer->purpose + 1;
+    KSTRequirementGetSubrequirements(requirement, (KSTRequirementBlock){takeMissing, answer});
     --answer->depth;
 }
 
 static void takeAnswer(void* captured, bool policySatisfied, const KSTRequirement* requirement) {
-    Answer* answer = captured;
-    answer->satisfied = policySatisfied;
-    answer->purposesCount = 0;
     puts(policySatisfied ? "satisfied" : "not satisfied, missing:");
     if (!policySatisfied) {
-        takeMissing(answer, requirement);
+        takeMissing(captured, requirement);
     }
 }
 
-static KSTStatus ask(KSTContextRef context, const char* policy, Answer* answer) {
-    printf("asking about the policy %s\n", policy);
-    return KSTContextVerifyPolicy(context, policy, (KSTPolicyBlock){takeAnswer, answer});
+static void setEcho(bool isOn) {
+    struct termios terminal;
+    if (tcgetattr(STDIN_FILENO, &terminal) == 0) {
+        terminal.c_lflag = isOn ? terminal.c_lflag | ECHO : terminal.c_lflag & ~(tcflag_t)ECHO;
+        tcsetattr(STDIN_FILENO, TCSAFLUSH, &terminal);
+    }
 }
 
 static KSTStatus addPassphrase(KSTContextRef context, KSTPassphrasePurpose purpose) {
-    static const char passphrase[] = "open sesame"; // a real client asks its user
     const uint32_t user = getuid();
-    KSTCredential* credential = NULL;
+    char text[128];
+    size_t length = 0;
+    KSTCredential* made = NULL;
     printf("adding a passphrase for purpose %" PRIu32 "\n", purpose);
-    KSTStatus err = KSTCredentialCreate(kKSTCredentialTypePassphraseEntered, &credential);
-    if (err != kKSTErrorSuccess) {
-        return err;
+    fputs("passphrase: ", stderr);
+    setEcho(false);
+    // Byte by byte: a buffer of the C library's would keep a copy that nobody wipes.
+    while (length < sizeof text && read(STDIN_FILENO, text + length, 1) == 1 &&
+           text[length] != '\n') {
+        ++length;
     }
-    err = KSTCredentialSetProperty(credential, kUserProperty, &user, sizeof user);
-    if (err == kKSTErrorSuccess) {
-        err = KSTCredentialSetProperty(credential, kPurposeProperty, &purpose, sizeof purpose);
+    setEcho(true);
+    fputc('\n', stderr);
+    KSTStatus err = KSTCredentialCreate(kKSTCredentialTypePassphraseEntered, &made);
+    if (err == 0 &&
+        (err = KSTCredentialSetProperty(made, kKSTCredentialPropertyUserId, &user, 4)) == 0 &&
+        (err = KSTCredentialSetProperty(made, kKSTCredentialPropertyPurpose, &purpose, 4)) == 0 &&
+        (err = KSTCredentialSetProperty(made, kKSTCredentialPropertyPassphrase, text, length)) ==
+            0) {
+        err = KSTContextAddCredential(context, made);
     }
-    if (err == kKSTErrorSuccess) {
-        err = KSTCredentialSetProperty(credential, kPassphraseProperty, passphrase,
-                                       strlen(passphrase));
-    }
-    if (err == kKSTErrorSuccess) {
-        err = KSTContextAddCredential(context, credential);
-    }
-    KSTCredentialDelete(credential);
+    explicit_bzero(text, sizeof text);
+    KSTCredentialDelete(made); // which wipes it
     return err;
 }
 
 int main(int argc, char** argv) {
+    const char* policy = argc == 2 ? argv[1] : "";
     KSTContextRef context = NULL;
     Answer answer = {0};
-    if (argc != 2) {
-        fprintf(stderr, "usage: verify_policy POLICY\n");
-        return 2;
-    }
+    uint64_t missingBefore = 0;
     KSTStatus err = KSTContextCreate(&context);
-    if (err == kKSTErrorSuccess) {
-        err = ask(context, argv[1], &answer);
-    }
-    const size_t missing = answer.purposesCount;
-    for (size_t i = 0; err == kKSTErrorSuccess && i < missing; ++i) {
-        err = addPassphrase(context, answer.purposes[i]);
-    }
-    if (err == kKSTErrorSuccess && missing > 0) {
-        err = ask(context, argv[1], &answer);
-    }
+    do {
+        if (err == kKSTErrorSuccess && answer.wantsPassphrase) {
+            err = addPassphrase(context, answer.purpose);
+        }
+        missingBefore = answer.missing;
+        answer = (Answer){0};
+        if (err == kKSTErrorSuccess) {
+            printf("asking about the policy %s\n", policy);
+            err = KSTContextVerifyPolicy(context, policy, (KSTPolicyBlock){takeAnswer, &answer});
+        }
+    } while (err == kKSTErrorSuccess && answer.wantsPassphrase && answer.missing != missingBefore);
     if (context != NULL && KSTContextDelete(context, true) != kKSTErrorSuccess) {
         (void)KSTContextDelete(context, false);
     }
     if (err != kKSTErrorSuccess) {
-        fprintf(stderr, "verify_policy: status %" PRId32 "\n", err);
-        return 1;
+        fprintf(stderr, "verify_policy: %s (%" PRId32 ")\n", KSTStatusText(err), err);
     }
-    return answer.satisfied ? 0 : 1;
+    return err == kKSTErrorSuccess && answer.missing == 0 ? 0 : 1;
 }
