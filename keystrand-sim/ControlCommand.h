@@ -2,11 +2,11 @@
 
 #include "keystrand-sim/ControlArguments.h"
 #include "keystrand-sim/FaultScript.h"
-#include "keystrand-sim/ManualClock.h"
 #include "keystrand-sim/RequestLog.h"
+#include "keystrand/Clock.h"
+#include "keystrand/Commands.h"
 #include "keystrand/EventSender.h"
 #include "keystrand/KernelSocketServer.h"
-#include "keystrand/KernelState.h"
 #include "keystrand/NotificationPublisher.h"
 #include "keystrand/RestrictedModeController.h"
 
@@ -19,6 +19,20 @@
 #include <vector>
 
 namespace keystrand::sim {
+
+/// The system's clock, until it is set by hand: then it stands still where it was set.
+class ManualClock final : public SystemClock {
+  public:
+    explicit ManualClock(std::optional<Seconds> manual) : manual_(manual) {}
+
+    [[nodiscard]] bool isManual() const { return manual_.has_value(); }
+    [[nodiscard]] Seconds now() const override { return manual_ ? *manual_ : SystemClock::now(); }
+    void set(Seconds time) { manual_ = time; }
+    void setReal() { manual_.reset(); }
+
+  private:
+    std::optional<Seconds> manual_;
+};
 
 /// What control commands work on.
 struct ControlContext {

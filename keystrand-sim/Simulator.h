@@ -1,18 +1,15 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "keystrand-sim/ControlCommand.h"
 #include "keystrand-sim/ControlSocket.h"
 #include "keystrand-sim/FaultScript.h"
 #include "keystrand-sim/FaultyRequestHandler.h"
-#include "keystrand-sim/ManualClock.h"
-#include "keystrand-sim/Paths.h"
 #include "keystrand-sim/RequestLog.h"
 #include "keystrand/Commands.h"
 #include "keystrand/EventLoop.h"
 #include "keystrand/EventSender.h"
-#include "keystrand/KernelControls.h"
 #include "keystrand/KernelSocketServer.h"
-#include "keystrand/KernelState.h"
 #include "keystrand/ListeningSocket.h"
 #include "keystrand/NotificationPublisher.h"
 #include "keystrand/RestrictedModeController.h"
@@ -23,6 +20,17 @@
 #include <string>
 
 namespace keystrand::sim {
+
+/// Where the program's sockets are, under its root directory.
+struct Paths {
+    explicit Paths(const std::string& root);
+
+    std::string runDirectory;
+    std::string serviceDirectory;
+    std::string serviceSocket;
+    std::string controlSocket;
+    std::string eventSocket;
+};
 
 /// The kernel side as a whole, under one root directory.
 class Simulator {

@@ -6,8 +6,7 @@
 #include "base/ByteWriter.h"
 #include "base/Concat.h"
 #include "keystrand/Commands.h"
-#include "keystrand/Received.h"
-#include "keystrand/RequirementParser.h"
+#include "keystrand/Requirement.h"
 
 #include <algorithm>
 #include <cassert>

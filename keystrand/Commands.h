@@ -1,19 +1,42 @@
 #pragma once
 
 #include "KSTLib/Contexts.h"
+#include "KSTLib/PolicyVerification.h"
+#include "KSTLib/RequestSerialization.h"
+#include "KSTLib/Serialization.h"
 #include "base/ByteReader.h"
+#include "keystrand/ContextTable.h"
+#include "keystrand/CredentialSet.h"
 #include "keystrand/DispatchTable.h"
-#include "keystrand/KernelState.h"
+#include "keystrand/PolicyTable.h"
+#include "keystrand/Registry.h"
+#include "keystrand/RestrictedModeController.h"
 
 #include <cassert>
+#include <cstddef>
 #include <cstdint>
 #include <functional>
+#include <optional>
 #include <span>
+#include <string_view>
 
 namespace keystrand {
 
+/// What the kernel service holds besides the restricted-mode timer.
+struct KernelState {
+    Registry registry;
+    NumberedValues environment;
+    ContextTable contexts;
+    CredentialSet globalCredentials;
+    PolicyTable policies;
+    std::uint8_t logLevel = 40;
+};
+
 /// The time in seconds, which ages are counted in.
 using Now = std::function<CredentialSet::Seconds()>;
+
+/// The control codes of the kernel-control command. The table refers to its argument.
+[[nodiscard]] DispatchTable makeKernelControls(RestrictedModeController& restrictedMode);
 
 /// All commands of a frame. The table refers to the state and to the controls.
 [[nodiscard]] DispatchTable makeCommands(KernelState& kernel, const Now& now,
@@ -58,6 +81,45 @@ struct HandlePayload {
 
     KSTHandle handle{};
     base::ByteReader rest;
+};
+
+/// Bytes that a deserialiser handed out.
+struct ReceivedText {
+    ReceivedText() = default;
+    ReceivedText(const ReceivedText&) = delete;
+    ReceivedText& operator=(const ReceivedText&) = delete;
+    ~ReceivedText() { DeallocDataBlob(data, length); }
+
+    [[nodiscard]] std::string_view view() const {
+        return data == nullptr ? std::string_view()
+                               : std::string_view(static_cast<const char*>(data), length);
+    }
+
+    void* data = nullptr;
+    std::uint32_t length = 0;
+};
+
+/// Parameters that a deserialiser handed out.
+struct ReceivedParameters {
+    static constexpr KSTParameterType kUser = 4;
+    static constexpr std::size_t kHeaderSize = sizeof(KSTParameterType) + sizeof(std::uint32_t);
+    static constexpr std::size_t kMaxWireSize =
+        kKSTMaxParameters * (kHeaderSize + kKSTParameterMaxDataLength);
+
+    ReceivedParameters() = default;
+    ReceivedParameters(const ReceivedParameters&) = delete;
+    ReceivedParameters& operator=(const ReceivedParameters&) = delete;
+    ~ReceivedParameters() { DeallocParameters(items, count); }
+
+    [[nodiscard]] std::size_t wireSize() const;
+
+    /// The user that the parameters name.
+    [[nodiscard]] std::optional<std::uint32_t> user() const;
+    /// Whether they name more than one.
+    [[nodiscard]] bool disagreeAboutUser() const;
+
+    KSTParameter* items = nullptr;
+    std::uint32_t count = 0;
 };
 
 } // namespace keystrand

@@ -2,7 +2,7 @@
 
 #include "base/FileDescriptor.h"
 #include "keystrand/EventLoop.h"
-#include "keystrand/EventPoster.h"
+#include "keystrand/NotificationPublisher.h"
 
 #include <cstddef>
 #include <cstdint>

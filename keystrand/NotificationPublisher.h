@@ -1,6 +1,5 @@
 #pragma once
 
-#include "keystrand/EventPoster.h"
 #include "keystrand/NotificationRecord.h"
 #include "keystrand/Registry.h"
 
@@ -10,6 +9,19 @@
 #include <vector>
 
 namespace keystrand {
+
+/// Where events for the daemon go.
+class EventPoster {
+  public:
+    EventPoster() = default;
+    EventPoster(const EventPoster&) = delete;
+    EventPoster& operator=(const EventPoster&) = delete;
+    virtual ~EventPoster() = default;
+
+    /// Takes the event over, to be delivered after all those taken earlier. False, with nothing
+    /// taken, when the names are not those of an event or too many events wait already.
+    virtual bool post(std::string_view stream, std::string_view name) = 0;
+};
 
 /// Puts records into their properties and posts the events that announce them. The registry and
 /// the poster outlive it.

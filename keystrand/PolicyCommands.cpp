@@ -3,7 +3,6 @@
 #include "keystrand/AccessLists.h"
 #include "keystrand/Commands.h"
 #include "keystrand/Evaluation.h"
-#include "keystrand/Received.h"
 #include "keystrand/Requirement.h"
 
 #include <cstring>

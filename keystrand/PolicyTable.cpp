@@ -2,7 +2,7 @@
 
 #include "KSTLib/RequestSerialization.h"
 #include "base/Concat.h"
-#include "keystrand/RequirementParser.h"
+#include "keystrand/Requirement.h"
 
 #include <fstream>
 #include <sys/stat.h>

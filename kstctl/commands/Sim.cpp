@@ -1,6 +1,6 @@
 #include "base/Concat.h"
 #include "keystrand-sim/ControlClient.h"
-#include "keystrand-sim/Paths.h"
+#include "keystrand-sim/Simulator.h"
 #include "kstctl/CommandLine.h"
 #include "kstctl/ExitStatus.h"
 #include "kstctl/Forms.h"

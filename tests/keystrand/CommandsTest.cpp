@@ -1,7 +1,6 @@
 #include "keystrand/Commands.h"
 
 #include "keystrand/DispatchTable.h"
-#include "keystrand/KernelControls.h"
 #include "tests/keystrand/Bytes.h"
 #include "tests/keystrand/SetClock.h"
 #include "wire/CommandTable.h"

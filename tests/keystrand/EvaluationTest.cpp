@@ -1,7 +1,7 @@
 #include "keystrand/Evaluation.h"
 
 #include "keystrand/AccessLists.h"
-#include "keystrand/RequirementParser.h"
+#include "keystrand/Requirement.h"
 #include "tests/keystrand/Credentials.h"
 
 #include <gtest/gtest.h>

@@ -2,7 +2,7 @@
 
 #include "KSTLib/AllocatedBytes.h"
 #include "keystrand/Commands.h"
-#include "keystrand/RequirementParser.h"
+#include "keystrand/Requirement.h"
 #include "tests/keystrand/Credentials.h"
 
 #include <gtest/gtest.h>

@@ -1,4 +1,4 @@
-#include "keystrand/NumberedValues.h"
+#include "keystrand/ContextTable.h"
 
 #include <gtest/gtest.h>
 

@@ -4,7 +4,6 @@
 #include "base/UnixAddress.h"
 #include "keystrand/Commands.h"
 #include "keystrand/EventSender.h"
-#include "keystrand/KernelControls.h"
 #include "keystrand/KernelSocketServer.h"
 #include "tests/keystrand/Bytes.h"
 #include "tests/support/TemporaryDirectory.h"

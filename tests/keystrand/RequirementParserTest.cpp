@@ -1,4 +1,4 @@
-#include "keystrand/RequirementParser.h"
+#include "keystrand/Requirement.h"
 
 #include <gtest/gtest.h>
 
