@@ -5,6 +5,7 @@
 #include "KSTLib/Platform.h"
 #include "common/Allocation.h"
 #include "common/CommandHeader.h"
+#include "wire/RestrictedMode.h"
 
 #include <cerrno>
 #include <chrono>
@@ -15,7 +16,6 @@ namespace kst {
 
 namespace {
 
-constexpr const char* kServiceClass = "Keystrand";
 constexpr std::uint32_t kConnectionType = 0;
 
 CallState call;
@@ -140,9 +140,9 @@ KSTStatus init() noexcept {
         return fail(libraryContext(), "watchForks()", 0, kKSTErrorOutOfMemory);
     }
     const LibraryPlatform* platform = installedPlatform();
-    const platform::ServiceHandle service = platform != nullptr
-                                                ? platform->registry.findByClassName(kServiceClass)
-                                                : platform::kNoService;
+    const platform::ServiceHandle service =
+        platform != nullptr ? platform->registry.findByClassName(wire::rm::kKernelServiceClass)
+                            : platform::kNoService;
     if (service == platform::kNoService) {
         return fail(libraryContext(), "service", 0, kKSTErrorUnexpected);
     }

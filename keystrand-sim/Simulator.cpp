@@ -1,6 +1,7 @@
 #include "keystrand-sim/Simulator.h"
 
 #include "base/Concat.h"
+#include "wire/SystemPaths.h"
 
 #include <cerrno>
 #include <csignal>
@@ -11,24 +12,6 @@
 #include <utility>
 
 namespace keystrand::sim {
-
-namespace {
-
-std::string withoutTrailingSlashes(std::string root) {
-    while (!root.empty() && root.back() == '/') {
-        root.pop_back();
-    }
-    return root;
-}
-
-} // namespace
-
-Paths::Paths(const std::string& root)
-    : runDirectory(withoutTrailingSlashes(root) + "/run"),
-      serviceDirectory(runDirectory + "/keystrand"),
-      serviceSocket(serviceDirectory + "/service.sock"),
-      controlSocket(serviceDirectory + "/control.sock"),
-      eventSocket(runDirectory + "/kstd/events.sock") {}
 
 namespace {
 
@@ -65,9 +48,11 @@ std::unique_ptr<Simulator> Simulator::create(const Settings& settings,
             return nullptr;
         }
     }
-    const Paths paths(settings.root);
-    if (!makeDirectory(paths.runDirectory, error) ||
-        !makeDirectory(paths.serviceDirectory, error)) {
+    const auto path = [&](const char* name) {
+        return wire::underRoot(settings.root, name);
+    };
+    if (!makeDirectory(path(wire::kRunDirectory), error) ||
+        !makeDirectory(path(wire::kKernelDirectory), error)) {
         return nullptr;
     }
     auto loop = EventLoop::create();
@@ -75,17 +60,16 @@ std::unique_ptr<Simulator> Simulator::create(const Settings& settings,
         error = "cannot make an event loop";
         return nullptr;
     }
-    auto service = serviceSocket(std::move(activated), paths.serviceSocket, error);
+    auto service = serviceSocket(std::move(activated), path(wire::kKernelSocket), error);
     if (!service) {
         return nullptr;
     }
-    auto control = ListeningSocket::open(paths.controlSocket, SOCK_STREAM, error);
+    auto control = ListeningSocket::open(path(wire::kSimulatorControlSocket), SOCK_STREAM, error);
     if (!control) {
         return nullptr;
     }
-    std::unique_ptr<Simulator> simulator(new Simulator(settings, paths, std::move(policies),
-                                                       std::move(loop), std::move(*service),
-                                                       std::move(*control)));
+    std::unique_ptr<Simulator> simulator(new Simulator(
+        settings, std::move(policies), std::move(loop), std::move(*service), std::move(*control)));
     if (!simulator->deadline_ || !simulator->terminate_ || !simulator->interrupt_) {
         error = "cannot watch for signals and time";
         return nullptr;
@@ -93,11 +77,11 @@ std::unique_ptr<Simulator> Simulator::create(const Settings& settings,
     return simulator;
 }
 
-Simulator::Simulator(const Settings& settings, const Paths& paths, PolicyTable policies,
+Simulator::Simulator(const Settings& settings, PolicyTable policies,
                      std::unique_ptr<EventLoop> loop, ListeningSocket service,
                      ListeningSocket control)
     : loop_(std::move(loop)),
-      events_(*loop_, paths.eventSocket),
+      events_(*loop_, wire::underRoot(settings.root, wire::kEventSocket)),
       clock_(settings.clock),
       publisher_(kernel_.registry, events_),
       restrictedMode_(settings.periods, clock_, kernel_.registry, publisher_),

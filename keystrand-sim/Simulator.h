@@ -21,17 +21,6 @@
 
 namespace keystrand::sim {
 
-/// Where the program's sockets are, under its root directory.
-struct Paths {
-    explicit Paths(const std::string& root);
-
-    std::string runDirectory;
-    std::string serviceDirectory;
-    std::string serviceSocket;
-    std::string controlSocket;
-    std::string eventSocket;
-};
-
 /// The kernel side as a whole, under one root directory.
 class Simulator {
   public:
@@ -57,8 +46,8 @@ class Simulator {
     [[nodiscard]] bool run();
 
   private:
-    Simulator(const Settings& settings, const Paths& paths, PolicyTable policies,
-              std::unique_ptr<EventLoop> loop, ListeningSocket service, ListeningSocket control);
+    Simulator(const Settings& settings, PolicyTable policies, std::unique_ptr<EventLoop> loop,
+              ListeningSocket service, ListeningSocket control);
     void armDeadline();
 
     std::unique_ptr<EventLoop> loop_;

@@ -2,6 +2,7 @@
 #include "keystrand-sim/ControlClient.h"
 #include "keystrand-sim/Simulator.h"
 #include "keystrand/ListeningSocket.h"
+#include "wire/SystemPaths.h"
 
 #include <CLI/CLI.hpp>
 #include <systemd/sd-daemon.h>
@@ -83,10 +84,11 @@ std::string joined(const std::vector<std::string>& words) {
     return line;
 }
 
-int sendControlCommand(const keystrand::sim::Paths& paths, const std::vector<std::string>& words) {
-    auto client = keystrand::sim::ControlClient::connect(paths.controlSocket);
+int sendControlCommand(const std::string& root, const std::vector<std::string>& words) {
+    const std::string path = wire::underRoot(root, wire::kSimulatorControlSocket);
+    auto client = keystrand::sim::ControlClient::connect(path);
     if (!client) {
-        std::fprintf(stderr, "keystrand-sim: nobody listens at %s\n", paths.controlSocket.c_str());
+        std::fprintf(stderr, "keystrand-sim: nobody listens at %s\n", path.c_str());
         return kUnreachable;
     }
     const auto answer = client->command(joined(words));
@@ -125,8 +127,7 @@ int main(int argc, char** argv) {
         return exitStatus;
     }
     if (options->controlWords) {
-        return sendControlCommand(keystrand::sim::Paths(options->settings.root),
-                                  *options->controlWords);
+        return sendControlCommand(options->settings.root, *options->controlWords);
     }
     return simulate(options->settings);
 }

@@ -8,6 +8,7 @@
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"
 #include "platform/linux/StopRequest.h"
+#include "wire/SystemPaths.h"
 
 #include <CLI/CLI.hpp>
 
@@ -54,8 +55,9 @@ std::vector<std::string> httpsClient(const Options& options) {
 /// What the package makes on a real system.
 void makeDirectories(const platform::Paths& paths) {
     using std::filesystem::perms;
-    for (const auto& path : {paths.under("/run/kstd"), paths.under("/run/keystrand"),
-                             paths.managedSettingsDirectory(), paths.alarmDirectory()}) {
+    for (const auto& path :
+         {paths.under(wire::kDaemonDirectory), paths.under(wire::kKernelDirectory),
+          paths.managedSettingsDirectory(), paths.alarmDirectory()}) {
         std::filesystem::create_directories(path);
     }
     std::filesystem::create_directories(paths.stateDirectory());

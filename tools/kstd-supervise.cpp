@@ -3,6 +3,7 @@
 
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/Paths.h"
+#include "wire/SystemPaths.h"
 
 #include <CLI/CLI.hpp>
 
@@ -89,7 +90,7 @@ bool waitForEnd(pid_t program, int signals, const sigset_t& ending) {
 
 int supervise(const Options& options) {
     const platform::Paths paths(options.root);
-    std::filesystem::create_directories(paths.under("/run/kstd"));
+    std::filesystem::create_directories(paths.under(wire::kDaemonDirectory));
     const base::FileDescriptor socket = platform::makeEventSocket(paths.eventSocket());
     if (!socket.isOpen()) {
         std::cerr << "kstd-supervise: cannot make the event socket " << paths.eventSocket() << '\n';

@@ -1,10 +1,10 @@
 #include "base/Concat.h"
 #include "keystrand-sim/ControlClient.h"
-#include "keystrand-sim/Simulator.h"
 #include "kstctl/CommandLine.h"
 #include "kstctl/ExitStatus.h"
 #include "kstctl/Forms.h"
 #include "kstctl/Output.h"
+#include "wire/SystemPaths.h"
 
 #include <unistd.h>
 
@@ -30,7 +30,7 @@ platform::Error unreachable(const std::string& path) {
 } // namespace
 
 ExitStatus run(const SimCommand& command, const Environment& environment) {
-    const std::string path = keystrand::sim::Paths(environment.paths.under("/")).controlSocket;
+    const std::string path = environment.paths.under(wire::kSimulatorControlSocket);
     auto client = keystrand::sim::ControlClient::connect(path);
     if (!client) {
         return environment.output.finish(unreachable(path));

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "wire/SystemPaths.h"
+
 #include <string>
 #include <string_view>
 
@@ -10,7 +12,7 @@ namespace platform {
 class Paths {
   public:
     /// Where clients look for the kernel service, who know no other root than "/".
-    static constexpr std::string_view kKernelSocket = "/run/keystrand/service.sock";
+    static constexpr std::string_view kKernelSocket = wire::kKernelSocket;
 
     /// `root` is absolute; slashes at its end do not matter.
     explicit Paths(std::string_view root);
@@ -20,9 +22,9 @@ class Paths {
 
     [[nodiscard]] bool isSystemRoot() const { return prefix_.empty(); }
 
-    [[nodiscard]] std::string eventSocket() const { return under("/run/kstd/events.sock"); }
-    [[nodiscard]] std::string alarmHelperSocket() const { return under("/run/kstd/alarms.sock"); }
-    [[nodiscard]] std::string httpsSocket() const { return under("/run/kstd/https.sock"); }
+    [[nodiscard]] std::string eventSocket() const { return under(wire::kEventSocket); }
+    [[nodiscard]] std::string alarmHelperSocket() const { return under(wire::kAlarmHelperSocket); }
+    [[nodiscard]] std::string httpsSocket() const { return under(wire::kHTTPSSocket); }
     [[nodiscard]] std::string kernelSocket() const { return under(kKernelSocket); }
     [[nodiscard]] std::string managedSettingsDirectory() const { return under("/etc/kstd"); }
     [[nodiscard]] std::string managedSettings() const {
