@@ -11,7 +11,7 @@
 #include <span>
 #include <vector>
 
-/// What the targets for payloads have in common.
+/// What the targets have in common.
 namespace fuzz {
 
 inline void require(bool condition) {
@@ -63,10 +63,16 @@ inline bool isBeginningOf(std::vector<std::uint8_t> written, std::span<const std
     return std::memcmp(written.data(), input.data(), written.size()) == 0;
 }
 
-/// The input, with an address even when it is empty.
-inline std::span<const std::uint8_t> inputOf(const std::uint8_t* data, std::size_t size) {
+/// Lets `check` have the input, and requires that nothing stays allocated.
+template <typename Check>
+int checkInput(const std::uint8_t* data, std::size_t size, Check check) {
+    // An empty input may come without an address, which is another failure than one without bytes.
     static const std::uint8_t kNothing = 0;
-    return {size > 0 ? data : &kNothing, size};
+    const SizeLimit limit;
+    const std::int64_t allocatedBefore = gAllocatedBytes;
+    check(std::span<const std::uint8_t>(size > 0 ? data : &kNothing, size));
+    require(gAllocatedBytes == allocatedBefore);
+    return 0;
 }
 
 } // namespace fuzz

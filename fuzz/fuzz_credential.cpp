@@ -1,22 +1,13 @@
 // Credentials from outside: what can be read comes back the same, can be copied, compared and
 // looked at, and nothing stays allocated.
 
-#include "KSTLib/AllocatedBytes.h"
 #include "KSTLib/CredentialSerialization.h"
 #include "KSTLib/LibCall.h"
-
-#include <cstdint>
-#include <cstdlib>
-#include <cstring>
-#include <vector>
+#include "fuzz/Payloads.h"
 
 namespace {
 
-void require(bool condition) {
-    if (!condition) {
-        std::abort();
-    }
-}
+using fuzz::require;
 
 void checkBytes(const KSTCredential* credential, const std::uint8_t* bytes, std::size_t consumed) {
     std::size_t size = 0;
@@ -68,25 +59,23 @@ void checkComparison(const KSTCredential* credential, const std::uint8_t* rest, 
     DeallocCredential(other);
 }
 
-} // namespace
-
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-    // An empty input may come without an address, which is another failure than one without bytes.
-    static const std::uint8_t kNothing = 0;
-    const std::uint8_t* bytes = size > 0 ? data : &kNothing;
-    const std::int64_t allocatedBefore = gAllocatedBytes;
+void check(std::span<const std::uint8_t> input) {
     KSTCredential* credential = nullptr;
     std::size_t consumed = 0;
-    if (DeserializeCredential(bytes, size, &credential, &consumed) == 0) {
-        require(consumed <= size);
-        checkBytes(credential, bytes, consumed);
+    if (DeserializeCredential(input.data(), input.size(), &credential, &consumed) == 0) {
+        require(consumed <= input.size());
+        checkBytes(credential, input.data(), consumed);
         checkCopy(credential);
         checkProperties(credential);
-        checkComparison(credential, bytes + consumed, size - consumed);
+        checkComparison(credential, input.data() + consumed, input.size() - consumed);
         DeallocCredential(credential);
     } else {
         require(credential == nullptr && consumed == 0);
     }
-    require(gAllocatedBytes == allocatedBefore);
-    return 0;
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+    return fuzz::checkInput(data, size, check);
 }

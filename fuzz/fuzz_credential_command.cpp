@@ -50,12 +50,7 @@ void checkProperty(std::span<const std::uint8_t> input) {
     requireBeginning(input, written, size);
 }
 
-} // namespace
-
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-    const fuzz::SizeLimit limit;
-    const std::span<const std::uint8_t> input = fuzz::inputOf(data, size);
-    const std::int64_t allocatedBefore = gAllocatedBytes;
+void check(std::span<const std::uint8_t> input) {
     checkCommand(input, GetSerializedAddCredentialSize, SerializeAddCredential,
                  DeserializeAddCredential);
     checkCommand(input, GetSerializedRemoveCredentialSize, SerializeRemoveCredential,
@@ -63,6 +58,10 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     checkCommand(input, GetSerializedReplacePassphraseCredentialSize,
                  SerializeReplacePassphraseCredential, DeserializeReplacePassphraseCredential);
     checkProperty(input);
-    require(gAllocatedBytes == allocatedBefore);
-    return 0;
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+    return fuzz::checkInput(data, size, check);
 }

@@ -1,21 +1,12 @@
 // Lists of credentials from outside: what can be read comes back the same, and nothing stays
 // allocated.
 
-#include "KSTLib/AllocatedBytes.h"
 #include "KSTLib/CredentialSerialization.h"
-
-#include <cstdint>
-#include <cstdlib>
-#include <cstring>
-#include <vector>
+#include "fuzz/Payloads.h"
 
 namespace {
 
-void require(bool condition) {
-    if (!condition) {
-        std::abort();
-    }
-}
+using fuzz::require;
 
 void checkBytes(KSTCredential* const* list, std::uint32_t count, const std::uint8_t* bytes,
                 std::size_t size) {
@@ -33,24 +24,22 @@ void checkBytes(KSTCredential* const* list, std::uint32_t count, const std::uint
     require(std::memcmp(written.data(), bytes, expected) == 0);
 }
 
-} // namespace
-
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-    // An empty input may come without an address, which is another failure than one without bytes.
-    static const std::uint8_t kNothing = 0;
-    const std::uint8_t* bytes = size > 0 ? data : &kNothing;
-    const std::int64_t allocatedBefore = gAllocatedBytes;
+void check(std::span<const std::uint8_t> input) {
     KSTCredential** list = nullptr;
     std::uint32_t count = 0;
-    if (DeserializeCredentialList(bytes, size, &list, &count) == 0) {
+    if (DeserializeCredentialList(input.data(), input.size(), &list, &count) == 0) {
         require((list == nullptr) == (count == 0) && count <= kKSTCredentialListMaxCount);
-        checkBytes(list, count, bytes, size);
+        checkBytes(list, count, input.data(), input.size());
         if (list != nullptr) {
             DeallocCredentialList(list, count);
         }
     } else {
         require(list == nullptr && count == 0);
     }
-    require(gAllocatedBytes == allocatedBefore);
-    return 0;
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+    return fuzz::checkInput(data, size, check);
 }

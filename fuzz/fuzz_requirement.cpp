@@ -1,21 +1,13 @@
 // Trees of requirements from outside: what can be read can be walked, comes back the same after it
 // was written, and nothing stays allocated.
 
-#include "KSTLib/AllocatedBytes.h"
 #include "KSTLib/Requirement.h"
 #include "KSTLib/RequirementSerialization.h"
-
-#include <cstdint>
-#include <cstdlib>
-#include <vector>
+#include "fuzz/Payloads.h"
 
 namespace {
 
-void require(bool condition) {
-    if (!condition) {
-        std::abort();
-    }
-}
+using fuzz::require;
 
 /// The properties are inside the node.
 void checkProperties(const KSTRequirement* node) {
@@ -63,23 +55,21 @@ void checkBytes(const KSTRequirement* tree, std::size_t consumed) {
     DeallocRequirement(again);
 }
 
-} // namespace
-
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-    // An empty input may come without an address, which is another failure than one without bytes.
-    static const std::uint8_t kNothing = 0;
-    const std::uint8_t* bytes = size > 0 ? data : &kNothing;
-    const std::int64_t allocatedBefore = gAllocatedBytes;
+void check(std::span<const std::uint8_t> input) {
     KSTRequirement* tree = nullptr;
     std::size_t consumed = 0;
-    if (DeserializeRequirement(bytes, size, &tree, &consumed) == 0) {
-        require(consumed <= size);
+    if (DeserializeRequirement(input.data(), input.size(), &tree, &consumed) == 0) {
+        require(consumed <= input.size());
         walk(tree, consumed);
         checkBytes(tree, consumed);
         DeallocRequirement(tree);
     } else {
         require(tree == nullptr && consumed == 0);
     }
-    require(gAllocatedBytes == allocatedBefore);
-    return 0;
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+    return fuzz::checkInput(data, size, check);
 }

@@ -40,12 +40,7 @@ void checkBytes(const Payload& payload, std::span<const std::uint8_t> input) {
     require(fuzz::isBeginningOf(written, input, kKSTHandleSize + 4 + payload.length));
 }
 
-} // namespace
-
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-    const fuzz::SizeLimit limit;
-    const std::span<const std::uint8_t> input = fuzz::inputOf(data, size);
-    const std::int64_t allocatedBefore = gAllocatedBytes;
+void check(std::span<const std::uint8_t> input) {
     Payload payload;
     if (DeserializeVerifyAclConstraint(input.data(), static_cast<std::uint32_t>(input.size()),
                                        &payload.handle, &payload.constraint, &payload.length,
@@ -57,6 +52,10 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     } else {
         require(payload.constraint == nullptr && payload.parameters == nullptr);
     }
-    require(gAllocatedBytes == allocatedBefore);
-    return 0;
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+    return fuzz::checkInput(data, size, check);
 }

@@ -36,12 +36,7 @@ void checkBytes(const Payload& payload, std::span<const std::uint8_t> input) {
     require(fuzz::isBeginningOf(written, input, preflight));
 }
 
-} // namespace
-
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-    const fuzz::SizeLimit limit;
-    const std::span<const std::uint8_t> input = fuzz::inputOf(data, size);
-    const std::int64_t allocatedBefore = gAllocatedBytes;
+void check(std::span<const std::uint8_t> input) {
     Payload payload;
     if (DeserializeVerifyPolicy(input.data(), input.size(), &payload.handle, &payload.policyId,
                                 &payload.preflight, &payload.age, &payload.parameters,
@@ -52,6 +47,10 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     } else {
         require(payload.policyId == nullptr && payload.parameters == nullptr);
     }
-    require(gAllocatedBytes == allocatedBefore);
-    return 0;
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+    return fuzz::checkInput(data, size, check);
 }
