@@ -101,6 +101,7 @@ std::optional<platform::Error> NewFile::finish() {
     if (const int error = content_.finish(); error != 0) {
         return writeError(path_, error);
     }
+    // What is still open at the end is removed.
     file_.reset();
     return std::nullopt;
 }

@@ -111,6 +111,7 @@ ExitStatus run(const SendCommand& command, const Environment& environment) {
         return environment.output.finish(failure(
             ExitStatus::malformed, "an event of these names and this payload cannot be expressed"));
     }
+    // Last, so that a mistake is told whether a daemon is there or not.
     const EventSocketFile socket = EventSocketFile::look(environment.paths);
     if (socket.problem) {
         return environment.output.finish(*socket.problem);

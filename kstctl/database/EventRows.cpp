@@ -146,6 +146,7 @@ bool EventRows::moveToFile() {
             problem_ = cannotKeep(directory, errno);
             return false;
         }
+        // Without a name it goes with the process, however that ends.
         ::unlink(path.c_str());
     }
     if (!writeWhole(file_.get(), inMemory_)) {

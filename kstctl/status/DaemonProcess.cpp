@@ -115,6 +115,8 @@ DaemonState findDaemonProcess(const std::string& path) {
          entry.increment(error)) {
         const std::string process = entry->path().string();
         const std::string name = entry->path().filename().string();
+        // By name first: the descriptors of most processes are closed to the caller, and each of
+        // those would make the answer doubtful.
         if (sockets.empty() || !isProcess(name) || !isDaemon(process)) {
             continue;
         }
@@ -211,6 +213,7 @@ DaemonState askInitSystem(sd_bus* bus) {
         return unknownBecause(unit.error());
     }
     DaemonState state{.source = "init system"};
+    // The init system answers for units that it does not have, too.
     if (load == "not-found") {
         state.problem = failure(ExitStatus::missing, "there is no unit kstd.service");
         return state;

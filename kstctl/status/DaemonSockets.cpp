@@ -56,6 +56,7 @@ EventSocketFile EventSocketFile::look(const platform::Paths& paths) {
         socket.problem = connectionError(socket.path, ENOTSOCK);
         return socket;
     }
+    // Connecting sends nothing: a daemon that waits to be launched by an event is not.
     base::FileDescriptor connection(
         ::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
     if (!connection.isOpen() || ::connect(connection.get(), address->get(), address->size()) != 0) {
@@ -75,7 +76,8 @@ bool isSameFile(const std::string& one, const struct stat& other) {
            status.st_ino == other.st_ino;
 }
 
-/// Among a socket's flags, in hexadecimal digits.
+/// Among a socket's flags, in hexadecimal digits. The connections that a socket has taken bear its
+/// path as well, and this alone tells it from them.
 bool hasListeningFlag(const std::string& flags) {
     constexpr unsigned kAcceptsConnections = 0x10000;
     constexpr int kHexadecimal = 16;

@@ -27,6 +27,7 @@ namespace fs = std::filesystem;
 std::vector<std::string> namesIn(const std::string& directory, int& error) {
     std::vector<std::string> names;
     std::error_code code;
+    // Its ++ would throw, whatever it was made with.
     for (fs::directory_iterator entry(directory, code), end; !code && entry != end;
          entry.increment(code)) {
         names.push_back(entry->path().filename().string());

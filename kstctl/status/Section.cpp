@@ -104,6 +104,7 @@ std::string problemOf(const std::string& path, const platform::RegularFile& file
 Section fileSection(const Environment& environment, const char* path, std::size_t leastSize,
                     void (*addFields)(Report& report, decode::Bytes bytes)) {
     const std::string real = environment.paths.under(path);
+    // As the daemon reads it.
     const platform::RegularFile file = platform::readRegularFile(
         real, platform::kMaxLoadSize, {.takesBeginning = true, .followsLink = false});
     Section section;
