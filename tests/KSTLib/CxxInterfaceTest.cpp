@@ -277,8 +277,8 @@ TEST_F(CxxInterface, CredentialsAreOwnedAndMoved) {
 
 TEST_F(CxxInterface, RequirementsAreCopiedOut) {
     support::Bytes biometry = leafBytes(3, 68);
-    support::Bytes output = leafBytes(13, 32);
-    auto list = compositeInMemory(5, {asRequirement(biometry), nullptr, asRequirement(output)});
+    support::Bytes displayed = leafBytes(13, 32);
+    auto list = compositeInMemory(5, {asRequirement(biometry), nullptr, asRequirement(displayed)});
     const auto copied = kst::Requirement::of(asRequirement(list));
     ASSERT_TRUE(copied);
     std::fill(list.begin(), list.end(), 0xff);
