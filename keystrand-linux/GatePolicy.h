@@ -100,9 +100,9 @@ struct WrittenHub {
 struct GateState {
     enum class Phase : std::uint8_t { open, closed, opening };
     Phase phase = Phase::open;
-    std::optional<WrittenDefault> parameter;
-    std::vector<WrittenHub> hubs;
-    std::vector<KnownDevice> devices;
+    std::optional<WrittenDefault> parameter = std::nullopt;
+    std::vector<WrittenHub> hubs = {};
+    std::vector<KnownDevice> devices = {};
 
     bool operator==(const GateState&) const = default;
 };

@@ -152,9 +152,11 @@ bool takeGateLine(GateRecord& record, Line line) {
     if (what == "phase") {
         record.gate.phase = line.named(kPhases);
     } else if (what == "restricted") {
-        record.restricted = true;
+        record.service.restricted = true;
+    } else if (what == "starting") {
+        record.service.starting = true;
     } else if (what == "open-until") {
-        record.openUntil = BootTime(line.number<BootTime::rep>());
+        record.service.openUntil = BootTime(line.number<BootTime::rep>());
     } else if (what == "parameter") {
         record.gate.parameter = takeDefault(line);
     } else if (what == "hub") {
@@ -191,11 +193,15 @@ std::optional<Standing> standingNamed(std::string_view name) {
 std::string encodeGateRecord(const GateRecord& record) {
     std::string text =
         base::concat(kGateHead, "\nphase ", nameIn(kPhases, record.gate.phase), '\n');
-    if (record.restricted) {
+    if (record.service.restricted) {
         text += "restricted\n";
     }
-    if (record.openUntil) {
-        text += base::concat("open-until ", std::to_string(record.openUntil->count()), '\n');
+    if (record.service.starting) {
+        text += "starting\n";
+    }
+    if (record.service.openUntil) {
+        text +=
+            base::concat("open-until ", std::to_string(record.service.openUntil->count()), '\n');
     }
     if (record.gate.parameter) {
         text += base::concat("parameter ", words(*record.gate.parameter), '\n');

@@ -12,11 +12,18 @@ namespace keystrand::usb {
 
 /// What one start of the machine remembers of the gate, whichever service guards it.
 struct GateRecord {
-    GateState gate;
-    /// Restricted mode was on.
-    bool restricted = false;
-    /// Until when an administrator has opened the gate.
-    std::optional<BootTime> openUntil;
+    GateState gate = {};
+    struct Service {
+        /// Restricted mode was on.
+        bool restricted = false;
+        /// Whether it was on when the machine went off was not known yet.
+        bool starting = false;
+        /// Until when an administrator has opened the gate.
+        std::optional<BootTime> openUntil = std::nullopt;
+
+        bool operator==(const Service&) const = default;
+    };
+    Service service = {};
 
     bool operator==(const GateRecord&) const = default;
 };

@@ -129,9 +129,8 @@ void UsbGate::keepDevices() {
     }
 }
 
-void UsbGate::remember(bool restricted, std::optional<BootTime> openUntil) {
-    record_.restricted = restricted;
-    record_.openUntil = openUntil;
+void UsbGate::remember(const GateRecord::Service& service) {
+    record_.service = service;
     save();
 }
 

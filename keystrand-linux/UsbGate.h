@@ -48,7 +48,7 @@ class UsbGate {
     /// what the last one has left is not touched.
     void keepDevices();
     /// To be kept in the record, from the next write on.
-    void remember(bool restricted, std::optional<BootTime> openUntil);
+    void remember(const GateRecord::Service& service);
 
     /// Of what is in, only what was attached and in when the machine went off stays. For a closed
     /// gate; nothing, with a line, when that is not known.

@@ -63,7 +63,7 @@ std::function<void()> RestrictedModeController::daemonStarted(bool allowed,
                                                               const StateBytes& state) {
     // What is published from here on has its event already.
     auto unacknowledged = publisher_.unacknowledged();
-    takeUp(allowed, state);
+    takeUp(allowed, hooks_.adaptState ? hooks_.adaptState(state) : state);
     call(hooks_.daemonStarted, allowed, state);
     return [this, unacknowledged = std::move(unacknowledged)] {
         publisher_.postAgain(unacknowledged);
@@ -93,10 +93,26 @@ void RestrictedModeController::takeUp(bool allowed, const StateBytes& state) {
     publish(timer_.restoreState(clock_.now(), allowed, decodeState(state)));
 }
 
-void RestrictedModeController::restoreAnalytics(const AnalyticsBytes& blob) {
+void RestrictedModeController::restoreAnalytics(const AnalyticsBytes& handedBack) {
+    const AnalyticsBytes blob = hooks_.adaptFigures ? hooks_.adaptFigures(handedBack) : handedBack;
     if (isNews(blob, publisher_.lastAnalytics(), registry_, wire::rm::kSaveAnalyticsProperty)) {
         publish(timer_.restoreAnalytics(clock_.now(), blob));
     }
+}
+
+void RestrictedModeController::announceState() {
+    publish({makeTimerRestarted(timer_.timerRestarted())});
+}
+
+void RestrictedModeController::announceFigures() {
+    publish({makeSaveAnalytics(encodeFigures(timer_.figures()))});
+}
+
+void RestrictedModeController::clockMoved(std::int64_t seconds) {
+    for (auto& [property, awaited] : awaited_) {
+        awaited.until = RestrictedModeTimer::moved(awaited.until, seconds);
+    }
+    publish(timer_.clockMoved(seconds));
 }
 
 void RestrictedModeController::acknowledge(std::string_view name) {
@@ -130,6 +146,9 @@ void RestrictedModeController::publish(const RestrictedModeTimer::Notifications&
     }
     if (!quiet_) {
         for (const Notification& notification : notifications) {
+            if (hooks_.publishes && !hooks_.publishes(notification)) {
+                continue;
+            }
             publisher_.publish(notification);
             awaitAcknowledgement(wire::rm::findNotificationKind(notification.type)->property);
         }

@@ -5,6 +5,7 @@
 #include "keystrand/Registry.h"
 #include "keystrand/RestrictedModeTimer.h"
 
+#include <cstdint>
 #include <functional>
 #include <limits>
 #include <map>
@@ -39,6 +40,11 @@ class RestrictedModeController {
         /// a daemon that started was told again. Once for each time.
         std::function<void(const Record& record)> unacknowledged = nullptr;
         Seconds patience = kForever;
+        /// What is taken up of a state, or of figures, that a daemon hands back; as it is without.
+        std::function<StateBytes(const StateBytes& handedBack)> adaptState = nullptr;
+        std::function<AnalyticsBytes(const AnalyticsBytes& handedBack)> adaptFigures = nullptr;
+        /// Whether a record is published; each is without.
+        std::function<bool(const Notification& notification)> publishes = nullptr;
     };
 
     RestrictedModeController(RestrictedModeTimer::Periods periods, const Clock& clock,
@@ -68,6 +74,14 @@ class RestrictedModeController {
 
     /// Drops the record that the name stands for if it was read; nothing otherwise.
     void acknowledge(std::string_view name);
+
+    /// Publishes the present state, or the present figures, whatever was published before.
+    void announceState();
+    void announceFigures();
+
+    /// The clock shows `seconds` more than it would if nobody had set it: what is counted goes on
+    /// from where it was, and a running timer's alarm has another date.
+    void clockMoved(std::int64_t seconds);
 
     /// Does what became due on the clock, each thing at its own time.
     void catchUp();

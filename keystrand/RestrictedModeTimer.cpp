@@ -102,6 +102,31 @@ RestrictedModeTimer::restoreAnalytics(Seconds now, const AnalyticsBytes& blob) {
     return notifications;
 }
 
+RestrictedModeTimer::Seconds RestrictedModeTimer::moved(Seconds time, std::int64_t seconds) {
+    if (seconds < 0) {
+        const Seconds back = Seconds{0} - static_cast<Seconds>(seconds);
+        return time > back ? time - back : 1;
+    }
+    return std::min(later(time, static_cast<Seconds>(seconds)), kLatestTime);
+}
+
+RestrictedModeTimer::Notifications RestrictedModeTimer::clockMoved(std::int64_t seconds) {
+    Notifications notifications;
+    if (standardModeStart_ != 0) {
+        standardModeStart_ = moved(standardModeStart_, seconds);
+    }
+    for (auto* const time : {&restrictedSince_, &unfinishedStay_}) {
+        if (*time) {
+            *time = moved(**time, seconds);
+        }
+    }
+    periodStart_ = moved(periodStart_, seconds);
+    if (timerRestarted() != announced_) {
+        announce(notifications);
+    }
+    return notifications;
+}
+
 RestrictedModeTimer::Notifications RestrictedModeTimer::advance(Seconds now) {
     Notifications notifications;
     doWhatIsDue(now, notifications);

@@ -56,6 +56,13 @@ class RestrictedModeTimer {
     /// next is restricted.
     [[nodiscard]] Notifications restoreAnalytics(Seconds now, const AnalyticsBytes& blob);
 
+    /// The clock shows `seconds` more than it would have: all that is remembered by its time moves
+    /// along, so that nothing becomes due earlier or later than it would have.
+    [[nodiscard]] Notifications clockMoved(std::int64_t seconds);
+
+    /// A time on a clock that shows so much more; it stays between 1 and kLatestTime.
+    [[nodiscard]] static Seconds moved(Seconds time, std::int64_t seconds);
+
     /// Does everything that is due at `now`, each thing at its own time.
     [[nodiscard]] Notifications advance(Seconds now);
     /// The next time at which `advance` does something.

@@ -17,8 +17,7 @@ using namespace std::chrono_literals;
 
 GateRecord full() {
     GateRecord record;
-    record.restricted = true;
-    record.openUntil = 77us;
+    record.service = {.restricted = true, .starting = true, .openUntil = 77us};
     record.gate.phase = GateState::Phase::closed;
     record.gate.parameter = WrittenDefault{.before = -1, .written = 2, .confirmed = true};
     record.gate.hubs = {{.bus = 1, .inode = 12, .value = {.before = 1, .written = 2}},
@@ -35,6 +34,7 @@ TEST(GateRecordTest, Bytes) {
     EXPECT_EQ(encodeGateRecord(full()), "keystrand-gate 1\n"
                                         "phase closed\n"
                                         "restricted\n"
+                                        "starting\n"
                                         "open-until 77\n"
                                         "parameter -1 2 done\n"
                                         "hub 1 12 1 2 decided\n"

@@ -330,11 +330,11 @@ TEST_F(UsbGateTest, AcceptanceThatFailsIsTold) {
 
 TEST_F(UsbGateTest, WhatIsRememberedIsInTheRecord) {
     gate->setClosed(true);
-    gate->remember(true, 1234us);
+    gate->remember({.restricted = true, .openUntil = 1234us});
     const auto kept = start();
     ASSERT_TRUE(kept);
-    EXPECT_TRUE(kept->restricted);
-    EXPECT_EQ(kept->openUntil, 1234us);
+    EXPECT_TRUE(kept->service.restricted);
+    EXPECT_EQ(kept->service.openUntil, 1234us);
     EXPECT_TRUE(gate->closed());
 }
 
