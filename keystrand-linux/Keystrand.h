@@ -4,8 +4,6 @@
 #include "keystrand-linux/MachineClock.h"
 #include "keystrand-linux/UsbGate.h"
 #include "keystrand/Commands.h"
-#include "keystrand/KernelControls.h"
-#include "keystrand/KernelState.h"
 #include "keystrand/NotificationPublisher.h"
 #include "keystrand/RestrictedModeController.h"
 
