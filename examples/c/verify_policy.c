@@ -1,5 +1,5 @@
-// Asks whether a context satisfies a policy, shows what is missing, adds a passphrase that is asked
-// for, and asks again, until the policy is satisfied or nothing changes any more.
+// Asks whether a context satisfies a policy, shows what is missing, adds the passphrases that are
+// asked for, and asks again, until the policy is satisfied or nothing changes any more.
 //
 //     verify_policy POLICY
 
@@ -17,8 +17,8 @@
 typedef struct Answer {
     uint64_t missing; // differs when something else is missing; 0 when nothing is
     int depth;
-    bool wantsPassphrase;
-    KSTPassphrasePurpose purpose;
+    KSTPassphrasePurpose purposes[8];
+    size_t purposesCount;
 } Answer;
 
 static void takeMissing(void* captured, const KSTRequirement* requirement) {
@@ -27,17 +27,20 @@ static void takeMissing(void* captured, const KSTRequirement* requirement) {
     const uint32_t state = KSTRequirementGetState(requirement);
     const void* data = NULL;
     size_t length = 0;
+    KSTPassphrasePurpose purpose = kKSTPassphrasePurposeAny;
     printf("%*s%s%s", 2 * ++answer->depth, "", KSTRequirementTypeText(type),
            state == kKSTRequirementStateTooOld ? " (too old)" : "");
     if (type == kKSTRequirementTypePassphraseEntered &&
         KSTRequirementGetPropertyData(requirement, kKSTRequirementPropertyPurpose, &data,
                                       &length) == kKSTErrorSuccess) {
-        memcpy(&answer->purpose, data, sizeof answer->purpose);
-        answer->wantsPassphrase = true;
-        printf(" for purpose %" PRIu32, answer->purpose);
+        memcpy(&purpose, data, sizeof purpose);
+        printf(" for purpose %" PRIu32, purpose);
+        if (answer->purposesCount < 8) {
+            answer->purposes[answer->purposesCount++] = purpose;
+        }
     }
     putchar('\n');
-    answer->missing = answer->missing * 31 + type * 7 + state + answer->purpose + 1;
+    answer->missing = answer->missing * 31 + type * 7 + state + purpose + 1;
     KSTRequirementGetSubrequirements(requirement, (KSTRequirementBlock){takeMissing, answer});
     --answer->depth;
 }
@@ -86,22 +89,26 @@ static KSTStatus addPassphrase(KSTContextRef context, KSTPassphrasePurpose purpo
 }
 
 int main(int argc, char** argv) {
-    const char* policy = argc == 2 ? argv[1] : "";
+    if (argc != 2) {
+        fputs("usage: verify_policy POLICY\n", stderr);
+        return 2;
+    }
     KSTContextRef context = NULL;
     Answer answer = {0};
     uint64_t missingBefore = 0;
     KSTStatus err = KSTContextCreate(&context);
     do {
-        if (err == kKSTErrorSuccess && answer.wantsPassphrase) {
-            err = addPassphrase(context, answer.purpose);
+        for (size_t i = 0; err == kKSTErrorSuccess && i < answer.purposesCount; ++i) {
+            err = addPassphrase(context, answer.purposes[i]);
         }
         missingBefore = answer.missing;
         answer = (Answer){0};
         if (err == kKSTErrorSuccess) {
-            printf("asking about the policy %s\n", policy);
-            err = KSTContextVerifyPolicy(context, policy, (KSTPolicyBlock){takeAnswer, &answer});
+            printf("asking about the policy %s\n", argv[1]);
+            err = KSTContextVerifyPolicy(context, argv[1], (KSTPolicyBlock){takeAnswer, &answer});
         }
-    } while (err == kKSTErrorSuccess && answer.wantsPassphrase && answer.missing != missingBefore);
+    } while (err == kKSTErrorSuccess && answer.purposesCount > 0 &&
+             answer.missing != missingBefore);
     if (context != NULL && KSTContextDelete(context, true) != kKSTErrorSuccess) {
         (void)KSTContextDelete(context, false);
     }
