@@ -8,7 +8,7 @@
 
 namespace kst {
 
-void writeLogLine(platform::SystemLog* log, const platform::CodePlace& place, const char* format,
+void writeLogLine(platform::SystemLog* log, const platform::LogFields& place, const char* format,
                   ...) noexcept {
     if (log == nullptr) {
         return;

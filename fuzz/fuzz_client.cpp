@@ -57,7 +57,7 @@ class Script {
 class NoLog : public platform::SystemLog {
   public:
     void write(platform::LogLevel /*level*/, std::string_view text,
-               const platform::CodePlace& /*place*/) override {
+               const platform::LogFields& /*fields*/) override {
         require(!text.empty());
     }
 };

@@ -14,7 +14,7 @@ namespace kstctl {
 class RecordingLog final : public platform::SystemLog {
   public:
     void write(platform::LogLevel /*level*/, std::string_view text,
-               const platform::CodePlace& /*place*/) override {
+               const platform::LogFields& /*fields*/) override {
         lines_.emplace_back(text.substr(0, text.find_last_not_of('\n') + 1));
     }
 

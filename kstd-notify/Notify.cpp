@@ -25,7 +25,7 @@ class StreamLog final : public platform::SystemLog {
     explicit StreamLog(std::ostream& stream) : stream_(stream) {}
 
     void write(platform::LogLevel /*level*/, std::string_view text,
-               const platform::CodePlace& /*place*/) override {
+               const platform::LogFields& /*fields*/) override {
         stream_ << platform::logLine(text) << '\n';
     }
 
@@ -37,7 +37,7 @@ class StreamLog final : public platform::SystemLog {
 class SilentLog final : public platform::SystemLog {
   public:
     void write(platform::LogLevel /*level*/, std::string_view /*text*/,
-               const platform::CodePlace& /*place*/) override {}
+               const platform::LogFields& /*fields*/) override {}
 };
 
 ExitStatus arm(const platform::Paths& paths, platform::Clock& clock, std::ostream& errors) {

@@ -1,9 +1,11 @@
 #include "kstd/Daemon.h"
 
+#include "KSTLib/Platform.h"
 #include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
 #include "kstd/LogLines.h"
 #include "platform/EventStream.h"
 #include "platform/MainRunLoop.h"
+#include "platform/MessageClasses.h"
 #include "platform/ProcessTransaction.h"
 #include "wire/EventDatagram.h"
 
@@ -31,7 +33,8 @@ int Daemon::run() {
     startServices();
     subscribe({wire::kNotifydMatchingStream, "processing notifyd.matching", "notifyd"});
     subscribe({wire::kCorvidMatchingStream, "processing corvid.matching", "corvid"});
-    logLine(host_.log, kMain, "Entering the main runloop.");
+    logLineOfClass(host_.log, platform::message::kDaemonStarted, kMain,
+                   "Entering the main runloop.");
     while (host_.runLoop.runOnce(platform::kDistantFuture)) {
     }
     stopServices();
@@ -66,6 +69,16 @@ void Daemon::stopServices() {
 
 Daemon::Services makeServices(const platform::Host& host) {
     return {DeviceRestrictedModeService::make(host)};
+}
+
+DaemonLibrary::DaemonLibrary(const platform::Host& host)
+    : log_(host.log, platform::message::kKernelServiceFailed,
+           "KSTLib: KSTKernelControl: returning, err = ") {
+    kst::installPlatform({log_, host.registry, host.channel});
+}
+
+DaemonLibrary::~DaemonLibrary() {
+    kst::removePlatform();
 }
 
 } // namespace kstd

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "kstd/KSTService.h"
+#include "kstd/LogLines.h"
 #include "platform/Host.h"
 
 #include <memory>
@@ -37,5 +38,19 @@ class Daemon {
 /// The services of this system: one DeviceRestrictedModeService, which has subscribed to its alarm
 /// stream when this returns.
 [[nodiscard]] Daemon::Services makeServices(const platform::Host& host);
+
+/// KSTLib in this process on the daemon's host, as long as it lives: what the services call of it
+/// works, and of its lines, those that an operator can act on have their class.
+class DaemonLibrary {
+  public:
+    /// What the host refers to must outlive it.
+    explicit DaemonLibrary(const platform::Host& host);
+    DaemonLibrary(const DaemonLibrary&) = delete;
+    DaemonLibrary& operator=(const DaemonLibrary&) = delete;
+    ~DaemonLibrary();
+
+  private:
+    ClassifyingLog log_;
+};
 
 } // namespace kstd

@@ -1,6 +1,7 @@
 #include "kstd/KSTService.h"
 
 #include "kstd/LogLines.h"
+#include "platform/MessageClasses.h"
 #include "platform/ServiceRegistry.h"
 #include "wire/RestrictedMode.h"
 
@@ -8,15 +9,16 @@ namespace kstd {
 
 std::optional<std::vector<std::uint8_t>>
 KSTService::KSTPropertyWithName(std::string_view propertyName) {
-    const kst::AssertionContext assertions{&host_.log, kTag, "kstd/KSTService"};
+    constexpr char kSource[] = "kstd/KSTService";
     const platform::ServiceHandle entry = host_.registry.findByPath(wire::rm::kKernelServicePath);
     if (entry == platform::kNoService) {
-        kst::fail(assertions, "entry", 0, kKSTErrorUnexpected);
+        ClassifyingLog log(host_.log, platform::message::kKernelServiceFailed);
+        kst::fail({&log, kTag, kSource}, "entry", 0, kKSTErrorUnexpected);
         return std::nullopt;
     }
     auto result = host_.registry.copyProperty(entry, propertyName);
     if (!result) {
-        kst::fail(assertions, "result", 0, kKSTErrorUnexpected);
+        kst::fail({&host_.log, kTag, kSource}, "result", 0, kKSTErrorUnexpected);
     }
     host_.registry.release(entry);
     return result;

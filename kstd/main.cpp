@@ -1,7 +1,5 @@
-#include "KSTLib/Platform.h"
 #include "kstd/Analytics/AnalyticsLifetime.h"
 #include "kstd/Daemon.h"
-#include "kstd/MessageIds.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"
 #include "platform/linux/StopRequest.h"
@@ -29,14 +27,13 @@ int main() {
         host.emplace(platform::LinuxHostOptions{.paths = platform::Paths("/"),
                                                 .eventSocket = platform::takeActivatedEventSocket(),
                                                 .idleTime = kIdleTime,
-                                                .messageClasses = kstd::messageClasses(),
                                                 .stop = &stop});
     } catch (const std::system_error&) {
         // The host has said why.
         return EXIT_FAILURE;
     }
     const platform::Host interfaces = host->interfaces();
-    kst::installPlatform({interfaces.log, interfaces.registry, interfaces.channel});
+    const kstd::DaemonLibrary library(interfaces);
     const kstd::AnalyticsLifetime analytics;
     return kstd::Daemon(interfaces, kstd::makeServices(interfaces)).run();
 }

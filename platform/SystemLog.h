@@ -6,11 +6,14 @@ namespace platform {
 
 enum class LogLevel { debug, info, notice, warning, error };
 
-/// Where in the code a line comes from. Empty or 0 means not known.
-struct CodePlace {
+/// What a line has beside its text: where in the code it comes from, and its class. Empty or 0
+/// means not known, or none.
+struct LogFields {
     std::string_view file = {};
     int line = 0;
     std::string_view function = {};
+    /// The identifier of one of the classes in MessageClasses.h.
+    std::string_view messageId = {};
 };
 
 /// The system's log.
@@ -28,7 +31,7 @@ class SystemLog {
     SystemLog& operator=(const SystemLog&) = delete;
     virtual ~SystemLog() = default;
 
-    virtual void write(LogLevel level, std::string_view text, const CodePlace& place) = 0;
+    virtual void write(LogLevel level, std::string_view text, const LogFields& fields) = 0;
 };
 
 } // namespace platform

@@ -1,10 +1,8 @@
 // The daemon's own code under a root directory of one's choice, for development, tests and the
 // demonstration. The installed daemon takes no options.
 
-#include "KSTLib/Platform.h"
 #include "kstd/Analytics/AnalyticsLifetime.h"
 #include "kstd/Daemon.h"
-#include "kstd/MessageIds.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"
 #include "platform/linux/StopRequest.h"
@@ -88,10 +86,8 @@ int runDaemon(const Options& options, const platform::StopRequest& stop) {
         std::cerr << "kstd-dev: another kstd-dev runs under " << options.root << '\n';
         return 1;
     }
-    platform::LinuxHostOptions hostOptions{.paths = paths,
-                                           .eventSocket = eventSocket(paths),
-                                           .messageClasses = kstd::messageClasses(),
-                                           .stop = &stop};
+    platform::LinuxHostOptions hostOptions{
+        .paths = paths, .eventSocket = eventSocket(paths), .stop = &stop};
     if (!hostOptions.eventSocket.isOpen()) {
         std::cerr << "kstd-dev: cannot make the event socket " << paths.eventSocket() << ": "
                   << std::generic_category().message(errno) << '\n';
@@ -103,7 +99,7 @@ int runDaemon(const Options& options, const platform::StopRequest& stop) {
     hostOptions.https.program = httpsClient(options);
     platform::LinuxHost host(std::move(hostOptions));
     const platform::Host interfaces = host.interfaces();
-    kst::installPlatform({interfaces.log, interfaces.registry, interfaces.channel});
+    const kstd::DaemonLibrary library(interfaces);
     const kstd::AnalyticsLifetime analytics;
     return kstd::Daemon(interfaces, kstd::makeServices(interfaces)).run();
 }

@@ -13,7 +13,7 @@ namespace bench {
 class NullLog final : public platform::SystemLog {
   public:
     void write(platform::LogLevel /*level*/, std::string_view /*text*/,
-               const platform::CodePlace& /*place*/) override {}
+               const platform::LogFields& /*fields*/) override {}
 };
 
 /// Sends standard error to /dev/null until the end of the scope, so that the daemon's own log does

@@ -2,7 +2,7 @@
 #include "kstctl/Output.h"
 #include "kstctl/Report.h"
 #include "kstctl/status/UploadSection.h"
-#include "kstd/MessageIds.h"
+#include "platform/MessageClasses.h"
 
 #define SD_JOURNAL_SUPPRESS_LOCATION
 #include <systemd/sd-journal.h>
@@ -51,8 +51,9 @@ class Journal {
         match("_UID=0");
         match("SYSLOG_IDENTIFIER=kstd");
         note(::sd_journal_add_conjunction(journal_.get()));
-        for (const char* const id : {kstd::message::kUploadFailed, kstd::message::kServerNotTrusted,
-                                     kstd::message::kNoUploadAddress}) {
+        for (const char* const id :
+             {platform::message::kUploadFailed, platform::message::kServerNotTrusted,
+              platform::message::kNoUploadAddress}) {
             match(base::concat("MESSAGE_ID=", id));
         }
         // Lines of the course of things have no identifier.

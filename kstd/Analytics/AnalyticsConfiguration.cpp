@@ -2,6 +2,7 @@
 
 #include "base/Concat.h"
 #include "platform/ConfigurationResource.h"
+#include "platform/MessageClasses.h"
 #include "platform/SystemLog.h"
 #include "platform/UserDefaults.h"
 #include "platform/Value.h"
@@ -148,7 +149,8 @@ AnalyticsConfiguration AnalyticsConfiguration::read(platform::ConfigurationResou
 void AnalyticsConfiguration::report(platform::SystemLog& log) const {
     for (const std::string& problem : problems) {
         log.write(platform::LogLevel::warning,
-                  base::concat("kstd: AnalyticsConfiguration: ", problem, ".\n"), {});
+                  base::concat("kstd: AnalyticsConfiguration: ", problem, ".\n"),
+                  {.messageId = platform::message::kUploadSettingInDoubt});
     }
 }
 

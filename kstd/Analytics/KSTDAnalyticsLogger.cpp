@@ -6,6 +6,7 @@
 #include "platform/Clock.h"
 #include "platform/Files.h"
 #include "platform/InternalDiagnostics.h"
+#include "platform/MessageClasses.h"
 #include "platform/SystemLog.h"
 
 #include <algorithm>
@@ -103,7 +104,7 @@ void KSTDAnalyticsLogger::upload() {
                         base::concat("TQAnalytics: failed to upload json to analytics server with "
                                      "error: ",
                                      error->description),
-                        {});
+                        {.messageId = platform::message::kUploadFailed});
     }
 }
 

@@ -8,6 +8,7 @@
 #include "kstd/LogLines.h"
 #include "platform/Clock.h"
 #include "platform/JSON.h"
+#include "platform/MessageClasses.h"
 #include "platform/SystemLog.h"
 
 #include <utility>
@@ -30,6 +31,12 @@ constexpr std::uint64_t kMillisecondsPerSecond = 1000;
 
 bool isTrusted(platform::TrustResult result) {
     return result == platform::TrustResult::proceed || result == platform::TrustResult::unspecified;
+}
+
+/// The class of a line about a request that failed: a certificate that is not trusted is another
+/// matter than a server that cannot be reached.
+std::string_view classOf(const platform::Error& error, std::string_view otherwise) {
+    return error.code == platform::kTrustRefused ? platform::message::kServerNotTrusted : otherwise;
 }
 
 } // namespace
@@ -72,7 +79,7 @@ KSTDAnalyticsLogger::makeDocument(const platform::ValueMap& extraValues,
                                   const platform::JSONWritingOptions& options) {
     if (!fields.database->tryToOpenDatabase()) {
         host_.log.write(LogLevel::error, "can't get logging JSON because database is not openable",
-                        {});
+                        {.messageId = platform::message::kDatabaseNotOpened});
         return platform::Error{kErrorDomain, kDatabaseNotOpenable,
                                "could not open db to read and process metrics (device in class "
                                "D?)"};
@@ -94,7 +101,7 @@ bool KSTDAnalyticsLogger::onQueuePostJSON(std::string_view JSON) {
     }
     if (!link) {
         host_.log.write(LogLevel::error, "failed to get a splunk upload endpoint - not uploading",
-                        {});
+                        {.messageId = platform::message::kNoUploadAddress});
         return false;
     }
     host_.log.write(LogLevel::info, "Splunk upload start", {});
@@ -106,14 +113,14 @@ bool KSTDAnalyticsLogger::isAccepted(const platform::HTTPReply& reply, const pla
         host_.log.write(
             LogLevel::error,
             base::concat("Error in uploading the events to splunk: ", reply.error->description),
-            {});
+            {.messageId = classOf(*reply.error, platform::message::kUploadFailed)});
         return false;
     }
     if (!reply.response || !reply.response->status) {
         host_.log.write(LogLevel::error,
                         base::concat("Received the wrong kind of response: ",
                                      reply.response ? reply.response->className : "(null)"),
-                        {});
+                        {.messageId = platform::message::kUploadFailed});
         return false;
     }
     const int status = *reply.response->status;
@@ -121,7 +128,7 @@ bool KSTDAnalyticsLogger::isAccepted(const platform::HTTPReply& reply, const pla
         host_.log.write(LogLevel::error,
                         base::concat("Splunk upload unexpected status to URL: ", link.text,
                                      " -- status: ", status),
-                        {});
+                        {.messageId = platform::message::kUploadFailed});
         return false;
     }
     host_.log.write(LogLevel::info, "Splunk upload success", {});
@@ -149,19 +156,20 @@ std::optional<Link> KSTDAnalyticsLogger::fetchUploadURL() {
                         base::concat("Unable to fetch splunk endpoint at URL: ",
                                      fields.splunkBagURL ? fields.splunkBagURL->text : "(null)",
                                      " -- error: ", reply.error->description),
-                        {});
+                        {.messageId = classOf(*reply.error, platform::message::kNoUploadAddress)});
         return std::nullopt;
     }
     const auto JSON = host_.json.read(reply.body);
     const auto bag = JSON ? EndpointBag::fromValue(JSON.value()) : std::nullopt;
     if (bag && !ignoreServerDisablingMessages() && !takeOverSwitches(*bag)) {
         host_.log.write(LogLevel::info, "not returning a splunk URL because uploads are disabled",
-                        {});
+                        {.messageId = platform::message::kUploadsDisabled});
         return std::nullopt;
     }
     auto link = bag ? takeOverMetrics(*bag) : std::nullopt;
     if (!link) {
-        host_.log.write(LogLevel::error, "Malformed Ombrix config payload!", {});
+        host_.log.write(LogLevel::error, "Malformed Ombrix config payload!",
+                        {.messageId = platform::message::kNoUploadAddress});
     }
     return link;
 }
@@ -203,7 +211,8 @@ void KSTDAnalyticsLogger::didReceiveChallenge(const platform::AuthenticationChal
     if (!completion) {
         kst::stop({&host_.log, kTag, "kstd/Analytics/KSTDAnalyticsLogger"}, "completion");
     }
-    host_.log.write(platform::LogLevel::info, "Splunk upload challenge", {});
+    host_.log.write(platform::LogLevel::info, "Splunk upload challenge",
+                    {.messageId = platform::message::kServerChallenge});
     if (challenge.previousFailureCount > 0) {
         completion(cancel, std::nullopt);
         return;
@@ -214,7 +223,8 @@ void KSTDAnalyticsLogger::didReceiveChallenge(const platform::AuthenticationChal
     }
     const platform::TrustResult result = challenge.trust->evaluate();
     if (fields.allowInsecureSplunkCert) {
-        host_.log.write(platform::LogLevel::info, "Force Accepting Splunk Credential", {});
+        host_.log.write(platform::LogLevel::info, "Force Accepting Splunk Credential",
+                        {.messageId = platform::message::kServerAccepted});
     } else if (!isTrusted(result)) {
         completion(cancel, std::nullopt);
         return;

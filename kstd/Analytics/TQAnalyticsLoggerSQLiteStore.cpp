@@ -2,6 +2,7 @@
 
 #include "base/Concat.h"
 #include "kstd/Analytics/SQLite/StatementRows.h"
+#include "platform/MessageClasses.h"
 
 #include <filesystem>
 #include <map>
@@ -45,9 +46,11 @@ TQAnalyticsLoggerSQLiteStore::storeWithPath(const std::string& path, const std::
     }
     platform::Error error;
     if (!store->openWithError(&error)) {
-        store->logError(base::concat(
-            "TQAnalyticsLogger: could not open db at init, will try again later. Error: ",
-            error.description));
+        store->logError(
+            platform::message::kDatabaseNotOpened,
+            base::concat(
+                "TQAnalyticsLogger: could not open db at init, will try again later. Error: ",
+                error.description));
     }
     return store;
 }
@@ -70,6 +73,7 @@ bool TQAnalyticsLoggerSQLiteStore::tryToOpenDatabase() {
     platform::Error error;
     if (!openWithError(&error)) {
         logError(
+            platform::message::kDatabaseNotOpened,
             base::concat("TQAnalyticsLogger: failed to open db with error ", error.description));
         return false;
     }
@@ -84,7 +88,8 @@ void TQAnalyticsLoggerSQLiteStore::addEventDict(platform::ValueMap event,
     platform::Result<platform::Bytes> data =
         environment().propertyLists.binary(platform::Value(std::move(event)));
     if (!data) {
-        logError(base::concat("Couldn't serialize failure record: ", data.error().description));
+        logError(platform::message::kEventNotStored,
+                 base::concat("Couldn't serialize failure record: ", data.error().description));
         return;
     }
     platform::ValueMap row;
@@ -131,8 +136,9 @@ void TQAnalyticsLoggerSQLiteStore::setUploadDate(const std::optional<platform::T
     }
 }
 
-void TQAnalyticsLoggerSQLiteStore::logError(std::string_view text) const {
-    environment().log.write(platform::LogLevel::error, text, {});
+void TQAnalyticsLoggerSQLiteStore::logError(std::string_view messageId,
+                                            std::string_view text) const {
+    environment().log.write(platform::LogLevel::error, text, {.messageId = messageId});
 }
 
 void TQAnalyticsLoggerSQLiteStore::clearAllData() {

@@ -58,7 +58,7 @@ class TQAnalyticsLoggerSQLiteStore final : public KSTDSQLite {
     }
 
   private:
-    void logError(std::string_view text) const;
+    void logError(std::string_view messageId, std::string_view text) const;
 
     const std::shared_ptr<const platform::ValueList> failureRecords_;
 };

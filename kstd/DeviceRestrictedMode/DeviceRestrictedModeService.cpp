@@ -9,6 +9,7 @@
 #include "platform/EventStream.h"
 #include "platform/Files.h"
 #include "platform/ManagedSettings.h"
+#include "platform/MessageClasses.h"
 #include "wire/EventDatagram.h"
 #include "wire/RestrictedMode.h"
 
@@ -161,16 +162,16 @@ KSTStatus DeviceRestrictedModeService::notifyDaemonStarted() {
         return kKSTErrorSuccess;
     }
     kst::failCall(assertions(), status);
-    logLine(host().log, kNotifyDaemonStarted, "returning, err = ", KSTStatus{kKSTErrorUnexpected},
-            ".");
+    logLineOfClass(host().log, platform::message::kKernelSideNotTold, kNotifyDaemonStarted,
+                   "returning, err = ", KSTStatus{kKSTErrorUnexpected}, ".");
     return kKSTErrorUnexpected;
 }
 
 KSTStatus DeviceRestrictedModeService::restoreAnalytics() {
     const auto blob = loadDataBlob(kAnalyticsFilePath);
     if (lengthOf(blob) < kAnalyticsBlobSize) {
-        logLine(host().log, kNotifyDaemonStarted,
-                "Analytics blob not loaded (length = ", lengthOf(blob), ")..");
+        logLineOfClass(host().log, platform::message::kStateFileNotLoaded, kNotifyDaemonStarted,
+                       "Analytics blob not loaded (length = ", lengthOf(blob), ")..");
         return kKSTErrorSuccess;
     }
     return sendRequest(kKSTKernelControlRMRestoreAnalytics,
@@ -185,8 +186,8 @@ KSTStatus DeviceRestrictedModeService::sendDaemonStarted() {
     if (lengthOf(blob) >= kStateBlobSize) {
         std::copy_n(blob->begin(), kStateBlobSize, payload.begin() + kDaemonStartedStateOffset);
     } else {
-        logLine(host().log, kNotifyDaemonStarted,
-                "State blob not loaded (length = ", lengthOf(blob), ")..");
+        logLineOfClass(host().log, platform::message::kStateFileNotLoaded, kNotifyDaemonStarted,
+                       "State blob not loaded (length = ", lengthOf(blob), ")..");
     }
     logLine(host().log, kNotifyDaemonStarted,
             "kstd started, restricted mode allowed: ", yesOrNo(allowed), ".");
@@ -223,8 +224,8 @@ KSTStatus DeviceRestrictedModeService::onQuorvaneChanged() {
         return kKSTErrorSuccess;
     }
     kst::failCall(assertions(), status);
-    logLine(host().log, kOnQuorvaneChanged, "returning, err = ", KSTStatus{kKSTErrorUnexpected},
-            ".");
+    logLineOfClass(host().log, platform::message::kKernelSideNotTold, kOnQuorvaneChanged,
+                   "returning, err = ", KSTStatus{kKSTErrorUnexpected}, ".");
     return kKSTErrorUnexpected;
 }
 
@@ -303,7 +304,8 @@ KSTStatus DeviceRestrictedModeService::saveDataBlob(const std::string& path,
     } else if (writeBlob(host().files, opened, data, assertions())) {
         return kKSTErrorSuccess;
     }
-    logLine(host().log, kSaveDataBlob, "returning, err = ", KSTStatus{kKSTErrorUnexpected}, ".");
+    logLineOfClass(host().log, platform::message::kStateFileNotSaved, kSaveDataBlob,
+                   "returning, err = ", KSTStatus{kKSTErrorUnexpected}, ".");
     return kKSTErrorUnexpected;
 }
 

@@ -7,10 +7,10 @@
 
 namespace platform {
 
-void FakeSystemLog::write(LogLevel level, std::string_view text, const CodePlace& place) {
+void FakeSystemLog::write(LogLevel level, std::string_view text, const LogFields& fields) {
     const std::lock_guard lock(mutex_);
-    lines_.push_back(
-        {level, logLine(text), std::string(place.file), place.line, std::string(place.function)});
+    lines_.push_back({level, logLine(text), std::string(fields.file), fields.line,
+                      std::string(fields.function), std::string(fields.messageId)});
 }
 
 std::vector<FakeSystemLog::Line> FakeSystemLog::lines() const {

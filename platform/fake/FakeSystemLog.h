@@ -18,9 +18,10 @@ class FakeSystemLog final : public SystemLog {
         std::string file;
         int line = 0;
         std::string function;
+        std::string messageId;
     };
 
-    void write(LogLevel level, std::string_view text, const CodePlace& place) override;
+    void write(LogLevel level, std::string_view text, const LogFields& fields) override;
 
     [[nodiscard]] std::vector<Line> lines() const;
     [[nodiscard]] std::vector<std::string> texts() const;

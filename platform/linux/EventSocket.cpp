@@ -2,6 +2,7 @@
 
 #include "base/Concat.h"
 #include "base/UnixAddress.h"
+#include "platform/MessageClasses.h"
 
 #include <systemd/sd-daemon.h>
 
@@ -85,7 +86,7 @@ void EventSocket::receiveOne() {
             log_.write(LogLevel::warning,
                        base::concat("kstd: EventSocket: cannot receive: ",
                                     std::generic_category().message(errno), ".\n"),
-                       {});
+                       {.messageId = message::kNoEventSocket});
         }
         return;
     }
@@ -95,7 +96,7 @@ void EventSocket::receiveOne() {
             LogLevel::warning,
             sender ? base::concat("kstd: EventSocket: dropped datagram of user ", *sender, ".\n")
                    : "kstd: EventSocket: dropped datagram of unknown sender.\n",
-            {});
+            {.messageId = message::kForeignEvent});
         return;
     }
     handOn(buffer_.data(), static_cast<std::size_t>(length));
@@ -106,7 +107,7 @@ void EventSocket::handOn(const std::uint8_t* data, std::size_t length) {
         log_.write(
             LogLevel::warning,
             base::concat("kstd: EventSocket: dropped oversized datagram, ", length, " bytes.\n"),
-            {});
+            {.messageId = message::kMalformedEvent});
         return;
     }
     const auto event = wire::decodeEvent({data, length});
@@ -114,7 +115,7 @@ void EventSocket::handOn(const std::uint8_t* data, std::size_t length) {
         log_.write(
             LogLevel::warning,
             base::concat("kstd: EventSocket: dropped malformed datagram, ", length, " bytes.\n"),
-            {});
+            {.messageId = message::kMalformedEvent});
         return;
     }
     receiver_(*event);

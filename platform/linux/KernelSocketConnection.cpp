@@ -1,5 +1,6 @@
 #include "platform/linux/KernelSocketConnection.h"
 
+#include "platform/MessageClasses.h"
 #include "platform/linux/LocalConnection.h"
 
 #include <algorithm>
@@ -151,7 +152,9 @@ void KernelSocketConnection::tell(Status status, std::optional<uid_t> stranger) 
                                          nameSize, program_.data(), path().data(),
                                          ::strerrordesc_np(errnoFromStatus(status)));
     const auto written = std::min(static_cast<std::size_t>(std::max(size, 0)), line.size() - 1);
-    log_.write(LogLevel::warning, {line.data(), written}, {});
+    log_.write(LogLevel::warning, {line.data(), written},
+               {.messageId =
+                    stranger ? message::kKernelServiceNotTrusted : message::kKernelServiceFailed});
 }
 
 Status KernelSocketConnection::connectSocket(std::optional<uid_t>& stranger) {

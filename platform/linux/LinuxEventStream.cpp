@@ -1,6 +1,7 @@
 #include "platform/linux/LinuxEventStream.h"
 
 #include "base/Concat.h"
+#include "platform/MessageClasses.h"
 
 #include <utility>
 
@@ -32,7 +33,7 @@ void LinuxEventStream::deliverOne() {
         log_.write(LogLevel::warning,
                    base::concat("kstd: EventStream: dropped event ", event.name,
                                 " on unknown stream ", event.stream, ".\n"),
-                   {});
+                   {.messageId = message::kMalformedEvent});
     }
     delivery_->setEnabled(!queue_.empty());
     for (const Observer& observer : observers_) {

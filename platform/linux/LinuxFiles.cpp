@@ -2,6 +2,7 @@
 
 #include "base/Concat.h"
 #include "base/FileDescriptor.h"
+#include "platform/MessageClasses.h"
 #include "platform/linux/LinuxFileStream.h"
 #include "platform/linux/RegularFile.h"
 #include "platform/linux/Sync.h"
@@ -83,7 +84,8 @@ void LinuxFiles::tell(std::string_view what, const std::string& path, std::strin
     if (told != reason) {
         told = std::move(reason);
         log_.write(LogLevel::warning,
-                   base::concat("kstd: Files: cannot ", what, ' ', path, ": ", told, ".\n"), {});
+                   base::concat("kstd: Files: cannot ", what, ' ', path, ": ", told, ".\n"),
+                   {.messageId = message::kStateFileFailed});
     }
 }
 

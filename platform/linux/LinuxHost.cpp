@@ -1,6 +1,7 @@
 #include "platform/linux/LinuxHost.h"
 
 #include "base/Concat.h"
+#include "platform/MessageClasses.h"
 #include "platform/formats/JSONCodec.h"
 #include "platform/formats/PropertyListCodec.h"
 #include "platform/host/SerialQueueOfOne.h"
@@ -53,7 +54,8 @@ RemoteHTTPOptions httpsOptions(const LinuxHostOptions& options) {
 /// In the order of construction: what stands below uses what stands above, and goes before it.
 struct LinuxHost::Parts {
     explicit Parts(LinuxHostOptions options)
-        : log(options.paths, options.messageClasses, kIdentifier),
+        : systemLog(options.paths, kIdentifier),
+          log(options.log != nullptr ? *options.log : systemLog),
           files(options.paths, log),
           settings(options.paths, log),
           defaults(options.paths, propertyLists, log),
@@ -78,7 +80,8 @@ struct LinuxHost::Parts {
                 [this](const wire::EventDatagram& event) { arrived(event); });
         } else {
             log.write(LogLevel::warning,
-                      "kstd: EventSocket: no socket was handed over; no events will arrive.\n", {});
+                      "kstd: EventSocket: no socket was handed over; no events will arrive.\n",
+                      {.messageId = message::kNoEventSocket});
         }
         if (options.stop != nullptr && options.stop->descriptor() >= 0) {
             stop = runLoop.addUrgent(options.stop->descriptor(), [this] { closeStreams(); });
@@ -107,7 +110,7 @@ struct LinuxHost::Parts {
             log.write(
                 LogLevel::warning,
                 base::concat("kstd: EventSocket: dropped alarm ", event.name, " without a date.\n"),
-                {});
+                {.messageId = message::kMalformedEvent});
         }
     }
 
@@ -122,7 +125,8 @@ struct LinuxHost::Parts {
         alarm.close();
     }
 
-    LinuxSystemLog log;
+    LinuxSystemLog systemLog;
+    SystemLog& log;
     LinuxFiles files;
     LinuxManagedSettings settings;
     LinuxClock clock;
@@ -150,11 +154,13 @@ struct LinuxHost::Parts {
 };
 
 LinuxHost::LinuxHost(LinuxHostOptions options) {
-    LinuxSystemLog log(options.paths, options.messageClasses, kIdentifier);
+    LinuxSystemLog systemLog(options.paths, kIdentifier);
+    SystemLog& log = options.log != nullptr ? *options.log : systemLog;
     try {
         parts_ = std::make_unique<Parts>(std::move(options));
     } catch (const std::system_error& error) {
-        log.write(LogLevel::error, base::concat("kstd: cannot start: ", error.what(), ".\n"), {});
+        log.write(LogLevel::error, base::concat("kstd: cannot start: ", error.what(), ".\n"),
+                  {.messageId = message::kCannotStart});
         throw;
     }
 }

@@ -2,7 +2,7 @@
 
 #include "base/FileDescriptor.h"
 #include "platform/Host.h"
-#include "platform/MessageClass.h"
+#include "platform/SystemLog.h"
 #include "platform/linux/Paths.h"
 #include "platform/linux/RemoteHTTPSessions.h"
 #include "platform/linux/StopRequest.h"
@@ -11,7 +11,6 @@
 #include <chrono>
 #include <memory>
 #include <optional>
-#include <span>
 #include <string>
 #include <vector>
 
@@ -25,8 +24,9 @@ struct LinuxHostOptions {
     base::FileDescriptor eventSocket{};
     /// How long the process stays idle before the host closes its streams; none is for ever.
     std::optional<std::chrono::milliseconds> idleTime = std::nullopt;
-    /// The program's log lines that have an identifier in the journal; they outlive the host.
-    std::span<const MessageClass> messageClasses = {};
+    /// Where the host and the program write their lines, in place of the system's log; it outlives
+    /// the host.
+    SystemLog* log = nullptr;
     /// What asks the process to end; it outlives the host. The host then closes its streams as soon
     /// as the event in hand is handled, and ends every HTTPS request at once.
     const StopRequest* stop = nullptr;

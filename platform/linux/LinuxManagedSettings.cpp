@@ -1,6 +1,7 @@
 #include "platform/linux/LinuxManagedSettings.h"
 
 #include "base/Concat.h"
+#include "platform/MessageClasses.h"
 #include "platform/linux/FileTrust.h"
 #include "platform/linux/ManagedSettingsText.h"
 #include "platform/linux/RegularFile.h"
@@ -34,7 +35,7 @@ bool LinuxManagedSettings::isRestrictedModeAllowed() {
         log_.write(
             LogLevel::warning,
             base::concat("kstd: ManagedSettings: ", path_, ": ", settings.remark, "; ignored.\n"),
-            {});
+            {.messageId = message::kSettingsNotUsed});
     }
     return settings.restrictedModeAllowed;
 }
@@ -43,7 +44,7 @@ bool LinuxManagedSettings::allowedInDoubt(std::string_view reason) {
     log_.write(LogLevel::warning,
                base::concat("kstd: ManagedSettings: ", path_, ": ", reason,
                             "; restricted mode stays allowed.\n"),
-               {});
+               {.messageId = message::kSettingsNotUsed});
     return true;
 }
 

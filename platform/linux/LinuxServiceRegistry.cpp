@@ -1,5 +1,6 @@
 #include "platform/linux/LinuxServiceRegistry.h"
 
+#include "platform/MessageClasses.h"
 #include "platform/linux/AsBytes.h"
 
 #include <algorithm>
@@ -133,7 +134,8 @@ void LinuxServiceRegistry::tell(const char* what, std::string_view name, Outcome
         static_cast<int>(std::min(name.size(), kMaxNameLength)), name.data(),
         static_cast<int>(path.size()), path.data(), reason);
     const auto written = std::min(static_cast<std::size_t>(std::max(length, 0)), line.size() - 1);
-    log_.write(LogLevel::warning, {line.data(), written}, {});
+    log_.write(LogLevel::warning, {line.data(), written},
+               {.messageId = message::kKernelServiceFailed});
 }
 
 void LinuxServiceRegistry::release(ServiceHandle entry) {

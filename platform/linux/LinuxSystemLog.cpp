@@ -3,7 +3,6 @@
 #include "base/FileDescriptor.h"
 #include "base/UnixAddress.h"
 #include "platform/host/LogText.h"
-#include "platform/host/MessageClasses.h"
 
 #include <algorithm>
 #include <array>
@@ -152,26 +151,28 @@ void writeToStandardError(std::string_view line) {
 } // namespace
 
 bool LinuxSystemLog::sendToJournal(LogLevel level, std::string_view line,
-                                   const CodePlace& place) const noexcept {
+                                   const LogFields& fields) const noexcept {
     char digits[16];
-    const auto digitsEnd = std::to_chars(std::begin(digits), std::end(digits), place.line).ptr;
+    const auto digitsEnd = std::to_chars(std::begin(digits), std::end(digits), fields.line).ptr;
     JournalMessage message;
     message.add("MESSAGE\n", line);
     message.add("PRIORITY\n", priorityOf(level));
     message.addIfAny("SYSLOG_IDENTIFIER\n", identifier_.empty() ? programName() : identifier_);
-    message.addIfAny("MESSAGE_ID\n", messageIdOf(line, classes_));
-    message.addIfAny("CODE_FILE\n", place.file);
-    if (place.line > 0) {
+    if (!identifier_.empty()) {
+        message.addIfAny("MESSAGE_ID\n", fields.messageId);
+    }
+    message.addIfAny("CODE_FILE\n", fields.file);
+    if (fields.line > 0) {
         message.add("CODE_LINE\n", {digits, static_cast<std::size_t>(digitsEnd - digits)});
     }
-    message.addIfAny("CODE_FUNC\n", place.function);
+    message.addIfAny("CODE_FUNC\n", fields.function);
     return message.send();
 }
 
 /// Not inlined, so that a short line does not take the stack of a long one.
 template <std::size_t Room>
 [[gnu::noinline]] void LinuxSystemLog::writeOnStack(LogLevel level, std::string_view text,
-                                                    const CodePlace& place) noexcept {
+                                                    const LogFields& fields) noexcept {
     constexpr std::size_t kNewlineSize = 1;
     std::array<char, Room * kLogTextGrowth + kEllipsis.size() + kNewlineSize> buffer;
     char* end = nullptr;
@@ -182,19 +183,20 @@ template <std::size_t Room>
         end = std::copy(kEllipsis.begin(), kEllipsis.end(), end);
     }
     const auto size = static_cast<std::size_t>(end - buffer.data());
-    if (!hasJournal_ || !sendToJournal(level, {buffer.data(), size}, place)) {
+    if (!hasJournal_ || !sendToJournal(level, {buffer.data(), size}, fields)) {
         *end = '\n';
         writeToStandardError({buffer.data(), size + kNewlineSize});
     }
 }
 
-void LinuxSystemLog::write(LogLevel level, std::string_view text, const CodePlace& place) noexcept {
+void LinuxSystemLog::write(LogLevel level, std::string_view text,
+                           const LogFields& fields) noexcept {
     const int error = errno;
     text = withoutFinalNewline(text);
     if (text.size() <= kUsualTextSize) {
-        writeOnStack<kUsualTextSize>(level, text, place);
+        writeOnStack<kUsualTextSize>(level, text, fields);
     } else {
-        writeOnStack<kMaxTextSize>(level, text, place);
+        writeOnStack<kMaxTextSize>(level, text, fields);
     }
     errno = error;
 }

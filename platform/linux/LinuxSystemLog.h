@@ -1,11 +1,9 @@
 #pragma once
 
-#include "platform/MessageClass.h"
 #include "platform/SystemLog.h"
 #include "platform/linux/Paths.h"
 
 #include <cstddef>
-#include <span>
 #include <string_view>
 
 namespace platform {
@@ -22,13 +20,13 @@ namespace platform {
 /// fork at any time. A journal that takes nothing for a second loses its line to standard error.
 class LinuxSystemLog final : public SystemLog {
   public:
-    /// In the journal lines are `identifier`'s, or this program's when that is empty, and a line of
-    /// one of the classes has that class's identifier. Both must outlive the log.
-    explicit LinuxSystemLog(const Paths& paths, std::span<const MessageClass> classes = {},
-                            std::string_view identifier = {}) noexcept
-        : hasJournal_(paths.isSystemRoot()), classes_(classes), identifier_(identifier) {}
+    /// In the journal lines are `identifier`'s, which must outlive the log, and have the
+    /// identifiers of their classes. When it is empty, they are this program's, and no line has a
+    /// class: the classes are the daemon's, and what is said of them is wrong for another program.
+    explicit LinuxSystemLog(const Paths& paths, std::string_view identifier = {}) noexcept
+        : hasJournal_(paths.isSystemRoot()), identifier_(identifier) {}
 
-    void write(LogLevel level, std::string_view text, const CodePlace& place) noexcept override;
+    void write(LogLevel level, std::string_view text, const LogFields& fields) noexcept override;
 
     /// A longer text is cut here, at the start of a character, and ends in "...". Texts hold names
     /// from outside: nobody shall fill the log with one line.
@@ -36,13 +34,12 @@ class LinuxSystemLog final : public SystemLog {
 
   private:
     template <std::size_t Room>
-    void writeOnStack(LogLevel level, std::string_view text, const CodePlace& place) noexcept;
+    void writeOnStack(LogLevel level, std::string_view text, const LogFields& fields) noexcept;
 
     [[nodiscard]] bool sendToJournal(LogLevel level, std::string_view line,
-                                     const CodePlace& place) const noexcept;
+                                     const LogFields& fields) const noexcept;
 
     bool hasJournal_;
-    std::span<const MessageClass> classes_;
     std::string_view identifier_;
 };
 

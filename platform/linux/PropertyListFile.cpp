@@ -1,6 +1,7 @@
 #include "platform/linux/PropertyListFile.h"
 
 #include "base/Concat.h"
+#include "platform/MessageClasses.h"
 #include "platform/linux/FileTrust.h"
 #include "platform/linux/RegularFile.h"
 
@@ -28,7 +29,8 @@ std::optional<ValueMap> PropertyListFile::load(const std::string& path) {
 std::optional<ValueMap> PropertyListFile::ignored(const std::string& path,
                                                   std::string_view reason) {
     log_.write(LogLevel::warning,
-               base::concat("kstd: ", reader_, ": ", path, ": ", reason, "; ignored.\n"), {});
+               base::concat("kstd: ", reader_, ": ", path, ": ", reason, "; ignored.\n"),
+               {.messageId = message::kConfigurationNotUsed});
     return std::nullopt;
 }
 

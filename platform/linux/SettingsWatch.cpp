@@ -1,6 +1,7 @@
 #include "platform/linux/SettingsWatch.h"
 
 #include "base/Concat.h"
+#include "platform/MessageClasses.h"
 
 #include <array>
 #include <cerrno>
@@ -150,7 +151,7 @@ void SettingsWatch::sayThatItCannotWatch(const std::string& directory, int error
                                           std::generic_category().message(error),
                                           "; changes are seen at the next start.\n");
     if (std::exchange(said_, line) != line) {
-        log_.write(LogLevel::warning, line, {});
+        log_.write(LogLevel::warning, line, {.messageId = message::kSettingsNotWatched});
     }
 }
 

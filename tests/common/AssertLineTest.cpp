@@ -15,7 +15,7 @@ using support::RecordingLog;
 class StandardErrorLog : public platform::SystemLog {
   public:
     void write(platform::LogLevel /*level*/, std::string_view text,
-               const platform::CodePlace& /*place*/) override {
+               const platform::LogFields& /*fields*/) override {
         std::fwrite(text.data(), 1, text.size(), stderr);
         std::fflush(stderr);
     }

@@ -25,7 +25,7 @@ class CountingLog : public platform::SystemLog {
     std::size_t failedCalls = 0;
 
     void write(platform::LogLevel /*level*/, std::string_view text,
-               const platform::CodePlace& /*place*/) override {
+               const platform::LogFields& /*fields*/) override {
         ++lines;
         failedCalls += text.find(": err == 0  (value") != std::string_view::npos ? 1U : 0U;
     }

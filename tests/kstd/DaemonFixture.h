@@ -2,9 +2,9 @@
 
 #include "KSTLib/AllocatedBytes.h"
 #include "KSTLib/Command.h"
-#include "KSTLib/Platform.h"
 #include "base/ByteReader.h"
 #include "kstd/Analytics/AnalyticsLifetime.h"
+#include "kstd/Daemon.h"
 #include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
 #include "platform/fake/FakeHost.h"
 #include "tests/kstd/MachineWithDirectory.h"
@@ -15,6 +15,7 @@
 #include <algorithm>
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -47,12 +48,8 @@ struct ControlRequest {
 /// The daemon's classes on a fake machine, with the library on the same one.
 class DaemonFixture : public testing::Test, protected MachineWithDirectory {
   protected:
-    DaemonFixture() {
-        kst::installPlatform({fake.log, fake.registry, fake.channel});
-        allocatedBefore_ = gAllocatedBytes;
-    }
     ~DaemonFixture() override {
-        kst::removePlatform();
+        library.reset();
         EXPECT_EQ(gAllocatedBytes, allocatedBefore_);
         EXPECT_EQ(fake.events.transactions().count(), 0U);
     }
@@ -153,6 +150,7 @@ class DaemonFixture : public testing::Test, protected MachineWithDirectory {
     }
 
     platform::FakeHost fake{machine};
+    std::optional<DaemonLibrary> library{fake.host()};
     AnalyticsLifetime analytics;
 
   private:
@@ -180,7 +178,7 @@ class DaemonFixture : public testing::Test, protected MachineWithDirectory {
         }
     }
 
-    std::int64_t allocatedBefore_ = 0;
+    std::int64_t allocatedBefore_ = gAllocatedBytes;
 };
 
 } // namespace kstd

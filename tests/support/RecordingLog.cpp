@@ -6,9 +6,9 @@ RecordingLog::RecordingLog() = default;
 RecordingLog::~RecordingLog() = default;
 
 void RecordingLog::write(platform::LogLevel level, std::string_view text,
-                         const platform::CodePlace& place) {
-    lines_.push_back({level, std::string(text), std::string(place.file), place.line,
-                      std::string(place.function)});
+                         const platform::LogFields& fields) {
+    lines_.push_back({level, std::string(text), std::string(fields.file), fields.line,
+                      std::string(fields.function)});
 }
 
 std::vector<std::string> RecordingLog::texts() const {

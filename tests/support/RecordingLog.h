@@ -23,7 +23,7 @@ class RecordingLog : public platform::SystemLog {
     ~RecordingLog() override;
 
     void write(platform::LogLevel level, std::string_view text,
-               const platform::CodePlace& place) override;
+               const platform::LogFields& fields) override;
 
     [[nodiscard]] const std::vector<Line>& lines() const { return lines_; }
     [[nodiscard]] std::vector<std::string> texts() const;

@@ -1,6 +1,7 @@
 #include "kstd/Analytics/SQLite/DatabaseCauses.h"
 
 #include "base/Concat.h"
+#include "platform/MessageClasses.h"
 
 #include <sqlite3.h>
 #include <system_error>
@@ -59,7 +60,8 @@ void DatabaseCauses::tellOnce(std::string line, Duration duration) {
     }
     const auto [told, isNew] = told_.emplace(std::move(line), duration);
     if (isNew) {
-        log_->write(platform::LogLevel::warning, told->first, {});
+        log_->write(platform::LogLevel::warning, told->first,
+                    {.messageId = platform::message::kDatabaseFailed});
     }
 }
 

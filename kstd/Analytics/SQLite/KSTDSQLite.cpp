@@ -8,6 +8,7 @@
 #include "kstd/Analytics/SQLite/SchemaHash.h"
 #include "kstd/Analytics/SQLite/StatementRows.h"
 #include "kstd/LogLines.h"
+#include "platform/MessageClasses.h"
 
 #include <sqlite3.h>
 #include <utility>
@@ -115,7 +116,8 @@ bool KSTDSQLite::executeSQL(std::string_view format, std::span<const FormatArgum
     const std::string text = formatText(format, arguments);
     const int code = sqlite3_exec(db_, text.c_str(), nullptr, nullptr, nullptr);
     if (code != SQLITE_OK) {
-        logFailure(base::concat("KSTDSQLite: Error executing SQL: \"", text, "\" (", code, ")"));
+        logFailure(base::concat("KSTDSQLite: Error executing SQL: \"", text, "\" (", code, ")"),
+                   platform::message::kDatabaseFailed);
         causes_.tell(code, db_);
         return false;
     }
@@ -133,7 +135,8 @@ std::shared_ptr<KSTDSQLiteStatement> KSTDSQLite::statementForSQL(std::string_vie
     std::string text(SQL);
     sqlite3_stmt* handle = nullptr;
     if (sqlite3_prepare_v2(db_, text.c_str(), -1, &handle, nullptr) != SQLITE_OK) {
-        logFailure(base::concat("Error preparing statement: ", text));
+        logFailure(base::concat("Error preparing statement: ", text),
+                   platform::message::kDatabaseFailed);
         causes_.tell(sqlite3_extended_errcode(db_), db_);
         return nullptr;
     }
@@ -168,8 +171,8 @@ std::int32_t KSTDSQLite::changes() const {
     return sqlite3_changes(db_);
 }
 
-void KSTDSQLite::logFailure(std::string_view text) const {
-    environment_.log.write(platform::LogLevel::notice, text, {});
+void KSTDSQLite::logFailure(std::string_view text, std::string_view messageId) const {
+    environment_.log.write(platform::LogLevel::notice, text, {.messageId = messageId});
 }
 
 bool KSTDSQLite::openWithError(platform::Error* error) {

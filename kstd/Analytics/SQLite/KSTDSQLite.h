@@ -223,7 +223,7 @@ class KSTDSQLite {
   protected:
     [[nodiscard]] const DatabaseEnvironment& environment() const { return environment_; }
     /// A failure of this class, at the default level.
-    void logFailure(std::string_view text) const;
+    void logFailure(std::string_view text, std::string_view messageId = {}) const;
 
   private:
     /// What an opening has done about the tables.

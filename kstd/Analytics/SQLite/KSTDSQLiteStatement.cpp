@@ -5,6 +5,7 @@
 #include "kstd/Analytics/SQLite/DatabaseEnvironment.h"
 #include "kstd/Analytics/SQLite/FormatText.h"
 #include "kstd/Analytics/SQLite/KSTDValueType.h"
+#include "platform/MessageClasses.h"
 
 #include <algorithm>
 #include <concepts>
@@ -76,7 +77,8 @@ bool KSTDSQLiteStatement::step() {
         return false;
     default:
         resetAfterStepError();
-        logFailure(formatText("KSTDSQLite: Failed to step (%d): \"%@\"", {code, SQL_}));
+        logFailure(formatText("KSTDSQLite: Failed to step (%d): \"%@\"", {code, SQL_}),
+                   platform::message::kDatabaseFailed);
         if (environment_.causes != nullptr) {
             environment_.causes->tell(code, sqlite3_db_handle(handle_));
         }
@@ -337,8 +339,8 @@ void KSTDSQLiteStatement::logUnbindable(const platform::Value& value) const {
     logFailure(formatText("KSTDSQLite: Can't bind object of type %@", {kindName(value)}));
 }
 
-void KSTDSQLiteStatement::logFailure(std::string_view text) const {
-    environment_.log.write(platform::LogLevel::notice, text, {});
+void KSTDSQLiteStatement::logFailure(std::string_view text, std::string_view messageId) const {
+    environment_.log.write(platform::LogLevel::notice, text, {.messageId = messageId});
 }
 
 } // namespace kstd

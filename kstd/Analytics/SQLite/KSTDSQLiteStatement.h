@@ -106,7 +106,7 @@ class KSTDSQLiteStatement {
     void bindError(const platform::Error& error, int index);
     int clearBindings();
     void logUnbindable(const platform::Value& value) const;
-    void logFailure(std::string_view text) const;
+    void logFailure(std::string_view text, std::string_view messageId = {}) const;
 
     KSTDSQLite* SQLite_;
     const DatabaseEnvironment& environment_;

@@ -2,6 +2,7 @@
 
 #include "base/Concat.h"
 #include "base/FileDescriptor.h"
+#include "platform/MessageClasses.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -256,7 +257,7 @@ void AlarmStore::reportLost(std::string_view stream, std::string_view event) {
                base::concat("kstd: AlarmStore: the alarm is lost until the kernel side sends it "
                             "again: ",
                             path, ": ", reasons_[path], ".\n"),
-               {});
+               {.messageId = message::kAlarmNotKept});
 }
 
 bool AlarmStore::isAlarm(std::string_view event) const {
@@ -276,7 +277,7 @@ void AlarmStore::report(std::string_view what, const std::string& path, std::str
     const std::string line = base::concat("kstd: AlarmStore: ", what, ": ", path,
                                           reason.empty() ? "" : ": ", reason, ".\n");
     if (std::exchange(reported_[path], line) != line) {
-        log_.write(LogLevel::warning, line, {});
+        log_.write(LogLevel::warning, line, {.messageId = message::kAlarmNotKept});
     }
 }
 

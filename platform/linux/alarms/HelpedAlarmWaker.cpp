@@ -2,6 +2,7 @@
 
 #include "base/Concat.h"
 #include "base/UnixAddress.h"
+#include "platform/MessageClasses.h"
 
 #include <array>
 #include <cerrno>
@@ -211,7 +212,7 @@ void HelpedAlarmWaker::patienceIsOver() {
     log_.write(LogLevel::warning,
                base::concat("kstd: AlarmWaker: no timer of the init system: ", problem_,
                             "; the daemon stays to wait for its alarm.\n"),
-               {});
+               {.messageId = message::kAlarmWithoutInitSystem});
 }
 
 /// Once in a process.
@@ -222,7 +223,7 @@ void HelpedAlarmWaker::sayThatItDoesNotWake() {
     log_.write(LogLevel::info,
                "kstd: AlarmWaker: this machine cannot be woken from sleep; an alarm that comes due "
                "meanwhile waits until it is awake.\n",
-               {});
+               {.messageId = message::kAlarmDoesNotWake});
 }
 
 } // namespace platform

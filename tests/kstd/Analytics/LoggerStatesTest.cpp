@@ -347,7 +347,7 @@ class WatchedLog final : public platform::SystemLog {
     explicit WatchedLog(std::function<void(std::string_view)> onLine)
         : onLine_(std::move(onLine)) {}
     void write(platform::LogLevel /*level*/, std::string_view text,
-               const platform::CodePlace& /*place*/) override {
+               const platform::LogFields& /*fields*/) override {
         onLine_(text);
     }
 

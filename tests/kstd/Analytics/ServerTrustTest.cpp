@@ -116,7 +116,7 @@ TEST_F(ServerTrustTest, NothingWaitsForTheQueue) {
 class StandardErrorLog final : public platform::SystemLog {
   public:
     void write(platform::LogLevel /*level*/, std::string_view text,
-               const platform::CodePlace& /*place*/) override {
+               const platform::LogFields& /*fields*/) override {
         std::fprintf(stderr, "%.*s", static_cast<int>(text.size()), text.data());
     }
 };

@@ -19,7 +19,7 @@ class DiaryLog final : public platform::SystemLog {
   public:
     explicit DiaryLog(Diary& diary) : diary_(diary) {}
     void write(platform::LogLevel /*level*/, std::string_view text,
-               const platform::CodePlace& /*place*/) override {
+               const platform::LogFields& /*fields*/) override {
         diary_.emplace_back(text.substr(0, text.find('\n')));
     }
 

@@ -30,8 +30,8 @@
 
 namespace {
 
-using platform::CodePlace;
 using platform::LinuxSystemLog;
+using platform::LogFields;
 using platform::LogLevel;
 using testing::ElementsAre;
 using testing::IsEmpty;
@@ -41,7 +41,6 @@ using testing::UnorderedElementsAre;
 constexpr char kSocketPath[] = "/run/systemd/journal/socket";
 
 constexpr char kId[] = "0123456789abcdef0123456789abcdef";
-constexpr platform::MessageClass kClasses[] = {{kId, "kstd: a failure of "}};
 
 /// Each request for memory ends the program while this is set.
 bool refusesMemory = false;
@@ -136,7 +135,7 @@ class JournalTest : public testing::Test {
         if (!enterPrivateRun()) {
             ::_exit(1);
         }
-        LinuxSystemLog log(platform::Paths("/"), kClasses, identifier_);
+        LinuxSystemLog log(platform::Paths("/"), identifier_);
         if (journal != Journal::absent) {
             const int listener =
                 journal == Journal::listening ? socket_ : ::socket(AF_UNIX, SOCK_DGRAM, 0);
@@ -217,7 +216,7 @@ TEST_F(JournalTest, NoLineNeedsMemory) {
 TEST_F(JournalTest, LineGoesToTheJournalWithItsFields) {
     run(Journal::listening, [](LinuxSystemLog& log) {
         log.write(LogLevel::info, "kstd: main: Entering the main runloop.\n",
-                  CodePlace{"kstd/Daemon.cpp", 42, "main"});
+                  LogFields{"kstd/Daemon.cpp", 42, "main"});
     });
     ASSERT_EQ(messages_.size(), 1U);
     EXPECT_THAT(messages_[0],
@@ -262,14 +261,23 @@ TEST_F(JournalTest, LineIsOfTheProgramThatWroteIt) {
 
 TEST_F(JournalTest, LineOfAClassHasItsIdentifier) {
     run(Journal::listening, [](LinuxSystemLog& log) {
+        log.write(LogLevel::error, "kstd: a failure of x\n", {.messageId = kId});
         log.write(LogLevel::error, "kstd: a failure of x\n", {});
-        log.write(LogLevel::error, "not kstd: a failure of x\n", {});
     });
     ASSERT_EQ(messages_.size(), 2U);
     EXPECT_THAT(messages_[0], UnorderedElementsAre(Pair("MESSAGE", "kstd: a failure of x"),
                                                    Pair("MESSAGE_ID", kId), Pair("PRIORITY", "3"),
                                                    Pair("SYSLOG_IDENTIFIER", "kstd")));
     EXPECT_EQ(messages_[1].count("MESSAGE_ID"), 0U);
+}
+
+TEST_F(JournalTest, LineOfAnotherProgramHasNoClass) {
+    identifier_ = "";
+    run(Journal::listening, [](LinuxSystemLog& log) {
+        log.write(LogLevel::error, "kstd: a failure of x\n", {.messageId = kId});
+    });
+    ASSERT_EQ(messages_.size(), 1U);
+    EXPECT_EQ(messages_[0].count("MESSAGE_ID"), 0U);
 }
 
 TEST_F(JournalTest, EachLevelHasItsPriority) {

@@ -21,7 +21,7 @@ using platform::Value;
 class StandardErrorLog : public platform::SystemLog {
   public:
     void write(platform::LogLevel level, std::string_view text,
-               const platform::CodePlace& /*place*/) override {
+               const platform::LogFields& /*fields*/) override {
         const char* const name = level == platform::LogLevel::error ? "error" : "another level";
         std::fprintf(stderr, "%s: %.*s\n", name, static_cast<int>(text.size()), text.data());
     }

@@ -56,7 +56,7 @@ TEST_F(OpeningTest, SynchronousModeIsTheConnections) {
 class StandardErrorLog final : public platform::SystemLog {
   public:
     void write(platform::LogLevel /*level*/, std::string_view text,
-               const platform::CodePlace& /*place*/) override {
+               const platform::LogFields& /*fields*/) override {
         std::cerr << text;
     }
 };

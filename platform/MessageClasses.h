@@ -1,14 +1,10 @@
 #pragma once
 
-#include "platform/MessageClass.h"
-
-#include <span>
-
-namespace kstd {
-
-/// The classes of the daemon's log lines that an operator can act on. Each is explained, under its
-/// identifier, in packaging/systemd/kstd.catalog; an identifier is never given to another class.
-namespace message {
+/// The classes of the daemon's log lines that an operator can act on: the one list of them. Who
+/// writes a line of a class gives it the class's identifier (LogFields), by which it is found in
+/// the journal and explained by packaging/systemd/kstd.catalog. An identifier is never given to
+/// another class.
+namespace platform::message {
 
 inline constexpr char kDaemonStarted[] = "7dccb63d23e541889ee00d6f0d3c5009";
 inline constexpr char kCannotStart[] = "c0bd1ae3d3c14d1fb0f5f1f6a1c50d27";
@@ -38,9 +34,4 @@ inline constexpr char kAlarmNotKept[] = "28956f503d6840c6b95823e4541c8c11";
 inline constexpr char kAlarmWithoutInitSystem[] = "105f14b0574c4d4ea79747e7cfe9333b";
 inline constexpr char kAlarmDoesNotWake[] = "285fb5ce60d749ddb2a777dc495019ae";
 
-} // namespace message
-
-/// All of them, for the host's log. A line is of the first class that fits.
-[[nodiscard]] std::span<const platform::MessageClass> messageClasses();
-
-} // namespace kstd
+} // namespace platform::message
