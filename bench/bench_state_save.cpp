@@ -8,7 +8,6 @@
 #include "bench/support/PrivateRoot.h"
 #include "bench/support/Quiet.h"
 #include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
-#include "kstd/DeviceRestrictedMode/StateFilePaths.h"
 #include "platform/linux/LinuxHost.h"
 #include "tests/support/HostWith.h"
 #include "wire/RestrictedMode.h"

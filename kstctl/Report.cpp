@@ -1,7 +1,7 @@
 #include "kstctl/Report.h"
 
+#include "kstd/Analytics/SQLite/DatabaseTexts.h"
 #include "kstd/Analytics/SQLite/DateFormatter.h"
-#include "kstd/Analytics/SQLite/HexText.h"
 
 namespace kstctl {
 

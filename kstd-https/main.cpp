@@ -1,12 +1,105 @@
-#include "kstd-https/Connection.h"
-#include "kstd-https/Options.h"
-#include "kstd-https/Service.h"
+#include "base/Concat.h"
+#include "base/FileDescriptor.h"
+#include "kstd-https/RequestService.h"
+#include "platform/https/HTTPTransfer.h"
+#include "wire/HTTPMessages.h"
 
+#include <CLI/CLI.hpp>
+
+#include <chrono>
+#include <cmath>
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
+#include <fcntl.h>
+#include <optional>
 #include <string>
+#include <sys/socket.h>
+#include <unistd.h>
 #include <utility>
+
+namespace {
+
+using platform::HTTPLimits;
+
+void addLimit(CLI::App& app, const char* name, HTTPLimits::Time& limit, const char* description) {
+    constexpr double kMillisecondsPerSecond = 1000;
+    constexpr double kLeast = 0.001;
+    constexpr double kMost = 24 * 60 * 60;
+    app.add_option_function<double>(
+           name,
+           [&limit](double seconds) {
+               limit = HTTPLimits::Time(static_cast<HTTPLimits::Time::rep>(
+                   std::llround(seconds * kMillisecondsPerSecond)));
+           },
+           description)
+        ->check(CLI::Range(kLeast, kMost))
+        ->default_str(
+            std::to_string(std::chrono::duration_cast<std::chrono::seconds>(limit).count()));
+}
+
+/// The options of the command line. None, with the status to end with, when there is nothing to do
+/// but end.
+std::optional<platform::HTTPOptions> parseOptions(int argc, const char* const* argv,
+                                                  int& exitStatus) {
+    platform::HTTPOptions options;
+    CLI::App app("Makes one HTTP or HTTPS request for the daemon, over the connection that is its "
+                 "descriptor 3.",
+                 "kstd-https");
+    app.add_option("--trust-anchors", options.trustAnchors,
+                   "Certificates (PEM) that servers are trusted by")
+        ->capture_default_str();
+    platform::HTTPLimits& limits = options.limits;
+    addLimit(app, "--connect-limit", limits.connecting,
+             "Seconds that the way to a server may take, its handshake included");
+    addLimit(app, "--fetch-limit", limits.fetching, "Seconds that a GET may take");
+    addLimit(app, "--send-limit", limits.sending,
+             "Seconds that a document may take, and again for each full 4 MiB of it");
+    addLimit(app, "--answer-limit", limits.answering,
+             "Seconds that a server may take to answer a document");
+    try {
+        app.parse(argc, argv);
+    } catch (const CLI::ParseError& problem) {
+        exitStatus = app.exit(problem);
+        return std::nullopt;
+    }
+    return options;
+}
+
+bool hasOption(int socket, int option, int wanted) {
+    int value = -1;
+    socklen_t size = sizeof value;
+    return ::getsockopt(socket, SOL_SOCKET, option, &value, &size) == 0 && value == wanted;
+}
+
+bool isLocalConnection(int socket) {
+    sockaddr_storage peer{};
+    socklen_t size = sizeof peer;
+    return hasOption(socket, SO_DOMAIN, AF_UNIX) && hasOption(socket, SO_TYPE, SOCK_STREAM) &&
+           ::getpeername(socket, reinterpret_cast<sockaddr*>(&peer), &size) == 0;
+}
+
+/// The connection that this process was started with. None, and why, when there is none, or when
+/// the other end is neither root nor this process's own user.
+base::FileDescriptor takeConnection(std::string& reason) {
+    constexpr int kSocket = wire::kHTTPConnectionDescriptor;
+    if (!isLocalConnection(kSocket)) {
+        reason = base::concat("descriptor ", kSocket, " is no connection of a local stream socket");
+        return base::FileDescriptor();
+    }
+    base::FileDescriptor connection(kSocket);
+    ::fcntl(kSocket, F_SETFD, FD_CLOEXEC);
+    ucred peer{};
+    socklen_t size = sizeof peer;
+    if (::getsockopt(kSocket, SOL_SOCKET, SO_PEERCRED, &peer, &size) != 0 ||
+        (peer.uid != 0 && peer.uid != ::geteuid())) {
+        reason = base::concat("refused a connection of user ", peer.uid);
+        return base::FileDescriptor();
+    }
+    return connection;
+}
+
+} // namespace
 
 int main(int argc, char** argv) {
     // Nothing that the environment says about proxies, certificates, names of hosts or the settings
@@ -16,12 +109,12 @@ int main(int argc, char** argv) {
     std::signal(SIGPIPE, SIG_IGN);
 
     int exitStatus = 0;
-    const auto options = https::parseOptions(argc, argv, exitStatus);
+    const auto options = parseOptions(argc, argv, exitStatus);
     if (!options) {
         return exitStatus;
     }
     std::string reason;
-    base::FileDescriptor socket = https::takeConnection(reason);
+    base::FileDescriptor socket = takeConnection(reason);
     if (!socket.isOpen()) {
         std::fprintf(stderr, "kstd-https: %s\n", reason.c_str());
         return EXIT_FAILURE;

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "kstd-notify/AlarmTimerUnit.h"
+#include "kstd-notify/AlarmTimer.h"
 
 #include <string>
 

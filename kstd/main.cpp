@@ -1,4 +1,4 @@
-#include "kstd/Analytics/AnalyticsLifetime.h"
+#include "kstd/Analytics/Analytics.h"
 #include "kstd/Daemon.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"

@@ -1,7 +1,7 @@
 // The daemon's own code under a root directory of one's choice, for development, tests and the
 // demonstration. The installed daemon takes no options.
 
-#include "kstd/Analytics/AnalyticsLifetime.h"
+#include "kstd/Analytics/Analytics.h"
 #include "kstd/Daemon.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"

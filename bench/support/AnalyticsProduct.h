@@ -2,7 +2,6 @@
 
 #include "bench/support/PrivateRoot.h"
 #include "kstd/Analytics/Analytics.h"
-#include "kstd/Analytics/AnalyticsLifetime.h"
 #include "platform/linux/LinuxHost.h"
 
 #include <filesystem>

@@ -5,7 +5,7 @@
 #include "kstctl/database/EventDatabase.h"
 #include "kstctl/status/UploadSection.h"
 #include "kstd/Analytics/Analytics.h"
-#include "kstd/Analytics/UploadDocument.h"
+#include "kstd/Analytics/ServerDocuments.h"
 #include "platform/formats/JSONCodec.h"
 #include "platform/formats/PropertyListCodec.h"
 #include "platform/linux/LinuxClock.h"

@@ -10,7 +10,7 @@
 #include "kstctl/decode/Decoders.h"
 #include "kstd/Analytics/Analytics.h"
 #include "kstd/Analytics/SQLite/DateFormatter.h"
-#include "kstd/DeviceRestrictedMode/StateFilePaths.h"
+#include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
 #include "platform/Files.h"
 #include "platform/linux/LinuxClock.h"
 #include "platform/linux/LinuxManagedSettings.h"

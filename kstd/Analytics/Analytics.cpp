@@ -1,5 +1,8 @@
 #include "kstd/Analytics/Analytics.h"
 
+#include "kstd/Analytics/KSTDAnalyticsLogger.h"
+#include "kstd/Analytics/TQAnalyticsLoggerSQLiteStore.h"
+
 namespace kstd {
 
 std::shared_ptr<Analytics> Analytics::logger(const platform::Host& host) {
@@ -16,6 +19,12 @@ void Analytics::logPolicyEventWithAttributes(const platform::ValueMap& attribute
 
 void Analytics::logTimerRestartedEventWithAttributes(const platform::ValueMap& attributes) {
     logEventNamed("timerRestarted", &attributes);
+}
+
+AnalyticsLifetime::~AnalyticsLifetime() {
+    LoggerInstances::release();
+    TQAnalyticsLoggerSQLiteStore::releaseStores();
+    OSVersion::release();
 }
 
 } // namespace kstd

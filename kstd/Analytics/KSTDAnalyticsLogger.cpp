@@ -8,12 +8,85 @@
 #include "platform/InternalDiagnostics.h"
 #include "platform/MessageClasses.h"
 #include "platform/SystemLog.h"
+#include "platform/SystemVersion.h"
 
 #include <algorithm>
 #include <array>
+#include <map>
+#include <mutex>
 #include <utility>
 
 namespace kstd {
+
+namespace {
+
+struct Cache {
+    std::mutex mutex;
+    std::optional<OSVersion> version;
+};
+
+Cache& cache() {
+    static Cache cache;
+    return cache;
+}
+
+} // namespace
+
+OSVersion OSVersion::cached(platform::SystemVersion& version) {
+    const std::lock_guard lock(cache().mutex);
+    if (!cache().version) {
+        cache().version = OSVersion{version.build(), version.product()};
+    }
+    return *cache().version;
+}
+
+void OSVersion::release() {
+    const std::lock_guard lock(cache().mutex);
+    cache().version.reset();
+}
+
+void KSTDAnalyticsLogger::addOSVersion(platform::ValueMap& map, platform::SystemVersion& version) {
+    const OSVersion known = OSVersion::cached(version);
+    if (known.build) {
+        map.insert_or_assign("build", *known.build);
+    }
+    if (known.product) {
+        map.insert_or_assign("product", *known.product);
+    }
+}
+
+namespace {
+
+using ByClass = std::map<std::type_index, std::shared_ptr<KSTDAnalyticsLogger>>;
+
+struct Instances {
+    std::mutex mutex;
+    ByClass byClass;
+};
+
+/// Never destroyed: its loggers would outlive the host that they use.
+Instances& instances() {
+    static Instances& instances = *new Instances;
+    return instances;
+}
+
+} // namespace
+
+std::shared_ptr<KSTDAnalyticsLogger> LoggerInstances::instance(std::type_index loggerClass,
+                                                               const Make& make) {
+    const std::lock_guard lock(instances().mutex);
+    std::shared_ptr<KSTDAnalyticsLogger>& instance = instances().byClass[loggerClass];
+    if (instance == nullptr) {
+        instance = make();
+    }
+    return instance;
+}
+
+void LoggerInstances::release() {
+    ByClass released;
+    const std::lock_guard lock(instances().mutex);
+    released.swap(instances().byClass);
+}
 
 namespace {
 

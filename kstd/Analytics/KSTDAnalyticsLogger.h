@@ -1,7 +1,6 @@
 #pragma once
 
 #include "base/TextBuffer.h"
-#include "kstd/Analytics/LoggerInstances.h"
 #include "platform/HTTPSession.h"
 #include "platform/Host.h"
 #include "platform/JSON.h"
@@ -13,10 +12,12 @@
 
 #include <atomic>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
 #include <string_view>
+#include <typeindex>
 #include <typeinfo>
 #include <vector>
 
@@ -28,7 +29,32 @@ class SystemVersion;
 namespace kstd {
 
 struct EndpointBag;
+class KSTDAnalyticsLogger;
 class TQAnalyticsLoggerSQLiteStore;
+
+/// What analytics says about the system it runs on. From any thread.
+struct OSVersion {
+    std::optional<std::string> build;
+    std::optional<std::string> product;
+
+    /// What the first call has read. It holds until `release`.
+    [[nodiscard]] static OSVersion cached(platform::SystemVersion& version);
+    static void release();
+};
+
+/// The one logger of each class. From any thread.
+class LoggerInstances {
+  public:
+    using Make = std::function<std::shared_ptr<KSTDAnalyticsLogger>()>;
+
+    /// The instance of that class, made by the first call for it. Making one must not ask for
+    /// another.
+    [[nodiscard]] static std::shared_ptr<KSTDAnalyticsLogger> instance(std::type_index loggerClass,
+                                                                       const Make& make);
+
+    /// Forgets all instances.
+    static void release();
+};
 
 /// Base of the analytics loggers: keeps each event in a database and, whenever an event finds the
 /// upload date passed, sends all of them as one JSON document and starts anew.

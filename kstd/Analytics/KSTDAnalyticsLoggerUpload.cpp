@@ -1,23 +1,49 @@
 #include "base/Concat.h"
 #include "common/Failure.h"
-#include "kstd/Analytics/EndpointBag.h"
 #include "kstd/Analytics/KSTDAnalyticsLogger.h"
+#include "kstd/Analytics/ServerDocuments.h"
 #include "kstd/Analytics/TQAnalyticsLoggerSQLiteStore.h"
-#include "kstd/Analytics/UploadDocument.h"
-#include "kstd/Analytics/WaitForReply.h"
 #include "kstd/LogLines.h"
 #include "platform/Clock.h"
+#include "platform/HTTPSession.h"
 #include "platform/JSON.h"
 #include "platform/MessageClasses.h"
 #include "platform/SystemLog.h"
 
+#include <atomic>
+#include <memory>
+#include <semaphore>
 #include <utility>
 
 namespace kstd {
 
+using platform::Link;
 using platform::LogLevel;
 
 namespace {
+
+/// Lives as long as either side needs it. Only the first completion writes the reply, and it does
+/// so before it releases the semaphore: afterwards the reply is the waiter's alone.
+struct PendingReply {
+    std::atomic_flag hasCome;
+    platform::HTTPReply reply;
+    std::binary_semaphore arrival{0};
+};
+
+/// Starts the request and waits for its end, however long that takes. A completion that comes
+/// again, or after the session's end, does no harm.
+platform::HTTPReply waitForReply(platform::HTTPSession& session,
+                                 const platform::HTTPRequest& request) {
+    const auto pending = std::make_shared<PendingReply>();
+    session.start(request, [pending](const platform::HTTPReply& reply) {
+        if (!pending->hasCome.test_and_set()) {
+            pending->reply = reply;
+            pending->arrival.release();
+        }
+    });
+    pending->arrival.acquire();
+    return std::move(pending->reply);
+}
 
 constexpr char kUserAgent[] = "kstd/1.0";
 constexpr char kErrorDomain[] = "TQAnalyticsLogger";
@@ -141,9 +167,6 @@ platform::HTTPReply KSTDAnalyticsLogger::replyTo(const platform::HTTPRequest& re
     const auto session = host_.https.makeEphemeral({{"User-Agent", kUserAgent}}, weak_from_this());
     return waitForReply(*session, request);
 }
-
-using platform::Link;
-using platform::LogLevel;
 
 std::optional<Link> KSTDAnalyticsLogger::splunkUploadURL() {
     return fields.splunkUploadURL ? fields.splunkUploadURL : fetchUploadURL();

@@ -4,7 +4,6 @@
 #include "base/Saturate.h"
 #include "common/Allocation.h"
 #include "kstd/Analytics/Analytics.h"
-#include "kstd/DeviceRestrictedMode/StateFilePaths.h"
 #include "kstd/LogLines.h"
 #include "platform/EventStream.h"
 #include "platform/Files.h"
@@ -20,12 +19,6 @@
 
 namespace kstd {
 
-/// Sends a kernel-control request that has no output. 0 or the status of the kernel side.
-[[nodiscard]] inline KSTStatus sendRequest(wire::rm::ControlCode code,
-                                           std::span<const std::uint8_t> input) {
-    return KSTKernelControl(code, input.data(), input.size(), nullptr);
-}
-
 using namespace wire::rm;
 
 namespace {
@@ -36,6 +29,11 @@ constexpr char kStop[] = "-[DeviceRestrictedModeService stop]";
 constexpr char kNotifyDaemonStarted[] = "-[DeviceRestrictedModeService notifyDaemonStarted]";
 constexpr char kHandleWispEvent[] = "-[DeviceRestrictedModeService handleWispEventWithName:]";
 constexpr char kOnQuorvaneChanged[] = "-[DeviceRestrictedModeService onQuorvaneChanged]";
+
+/// Sends a kernel-control request that has no output. 0 or the status of the kernel side.
+KSTStatus sendRequest(ControlCode code, std::span<const std::uint8_t> input) {
+    return KSTKernelControl(code, input.data(), input.size(), nullptr);
+}
 
 const char* yesOrNo(bool value) {
     return value ? "YES" : "NO";
@@ -229,8 +227,6 @@ KSTStatus DeviceRestrictedModeService::onQuorvaneChanged() {
     return kKSTErrorUnexpected;
 }
 
-using namespace wire::rm;
-
 void DeviceRestrictedModeService::onKextNotificationArrivedWithPropertyName(
     std::string_view propertyName) {
     const auto propertyData = KSTPropertyWithName(propertyName);
@@ -314,8 +310,6 @@ DeviceRestrictedModeService::loadDataBlob(const std::string& path) {
     logLine(host().log, kLoadDataBlob, "called, filePath = ", path, ".");
     return host().files.load(path);
 }
-
-using namespace wire::rm;
 
 KSTStatus
 DeviceRestrictedModeService::onKextTimerRestarted(const KSTDRMDeamonNotification& notification) {

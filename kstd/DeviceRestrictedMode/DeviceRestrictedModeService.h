@@ -15,6 +15,14 @@
 
 namespace kstd {
 
+/// The KSTRMStateBlob of the last timer notification, 13 bytes; what follows them is an older,
+/// longer record's rest and means nothing.
+inline constexpr char kStateFilePath[] = "/var/root/.usbrestrictedmode_v2";
+
+/// The KSTRMAnalyticsBlob of the last save-analytics notification, 32 bytes; what follows them
+/// means nothing.
+inline constexpr char kAnalyticsFilePath[] = "/var/root/.usbrestrictedmode_analytics";
+
 /// The user-space partner of the kernel service's USB restricted-mode policy.
 ///
 /// At every start it hands the kernel service what was saved on disk and whether device management
@@ -87,7 +95,6 @@ class DeviceRestrictedModeService final
     KSTStatus restoreAnalytics();
     KSTStatus sendDaemonStarted();
     KSTStatus dispatch(const KSTDRMDeamonNotification& notification);
-    KSTStatus failNotification(std::string_view condition, KSTStatus value, KSTStatus status);
     KSTStatus saveStateBlob(const KSTDRMDeamonNotification& notification);
 
     [[nodiscard]] kst::AssertionContext assertions() const;

@@ -3,7 +3,7 @@
 #include "KSTLib/AllocatedBytes.h"
 #include "KSTLib/Command.h"
 #include "base/ByteReader.h"
-#include "kstd/Analytics/AnalyticsLifetime.h"
+#include "kstd/Analytics/Analytics.h"
 #include "kstd/Daemon.h"
 #include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
 #include "platform/fake/FakeHost.h"

@@ -2,7 +2,7 @@
 
 #include "KSTLib/AllocatedBytes.h"
 #include "KSTLib/Platform.h"
-#include "kstd/Analytics/AnalyticsLifetime.h"
+#include "kstd/Analytics/Analytics.h"
 #include "kstd/Daemon.h"
 #include "platform/linux/EventSocket.h"
 #include "platform/linux/LinuxHost.h"

@@ -4,16 +4,29 @@
 #include "base/Saturate.h"
 #include "common/Failure.h"
 #include "kstd/Analytics/SQLite/DatabaseFile.h"
-#include "kstd/Analytics/SQLite/FormatText.h"
-#include "kstd/Analytics/SQLite/SchemaHash.h"
+#include "kstd/Analytics/SQLite/DatabaseTexts.h"
 #include "kstd/Analytics/SQLite/StatementRows.h"
 #include "kstd/LogLines.h"
 #include "platform/MessageClasses.h"
 
+#include <array>
+#include <cstdint>
+#include <openssl/evp.h>
 #include <sqlite3.h>
+#include <stdexcept>
 #include <utility>
 
 namespace kstd {
+
+std::string schemaHash(std::string_view schema) {
+    constexpr std::size_t kSHA256Size = 32;
+    std::array<std::uint8_t, kSHA256Size> digest{};
+    if (EVP_Digest(schema.data(), schema.size(), digest.data(), nullptr, EVP_sha256(), nullptr) !=
+        1) {
+        throw std::runtime_error("libcrypto offers no SHA-256");
+    }
+    return RXUppercaseHexStringWithoutSpaces(digest);
+}
 
 namespace {
 

@@ -1,10 +1,8 @@
 #pragma once
 
-#include "kstd/Analytics/SQLite/DatabaseCauses.h"
 #include "kstd/Analytics/SQLite/DatabaseEnvironment.h"
+#include "kstd/Analytics/SQLite/DatabaseTexts.h"
 #include "kstd/Analytics/SQLite/DateFormatter.h"
-#include "kstd/Analytics/SQLite/FormatText.h"
-#include "kstd/Analytics/SQLite/KSTDSQLiteDelegate.h"
 #include "kstd/Analytics/SQLite/KSTDSQLiteStatement.h"
 #include "platform/Error.h"
 #include "platform/Timestamp.h"
@@ -26,6 +24,32 @@
 struct sqlite3;
 
 namespace kstd {
+
+class KSTDSQLite;
+
+/// Knows the revision of its owner's tables and how to bring older ones up to it. Called while the
+/// database is being opened, on the thread that opens it.
+class KSTDSQLiteDelegate {
+  public:
+    KSTDSQLiteDelegate() = default;
+    KSTDSQLiteDelegate(const KSTDSQLiteDelegate&) = delete;
+    KSTDSQLiteDelegate& operator=(const KSTDSQLiteDelegate&) = delete;
+    virtual ~KSTDSQLiteDelegate() = default;
+
+    /// The revision that the tables shall have; 0 means that revisions are not used.
+    [[nodiscard]] virtual std::int32_t userVersion() = 0;
+
+    /// Brings the tables, which are of revision `fromVersion`, up to the current schema. Called
+    /// inside the opening's transaction, with the database already usable. False, and all tables
+    /// are dropped and made anew.
+    ///
+    /// That the migration was done is written after its transaction has ended. A crash in between
+    /// leads to another call, for tables that are migrated already: it must do them no harm.
+    [[nodiscard]] virtual bool migrateDatabase(KSTDSQLite& database, std::int32_t fromVersion) = 0;
+};
+
+/// SHA-256 of the bytes of `schema`, as 64 upper-case hexadecimal digits.
+[[nodiscard]] std::string schemaHash(std::string_view schema);
 
 /// What `type` is called in its source, without namespaces.
 [[nodiscard]] std::string ownClassName(const std::type_info& type);

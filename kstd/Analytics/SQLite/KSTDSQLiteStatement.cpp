@@ -1,9 +1,8 @@
 #include "kstd/Analytics/SQLite/KSTDSQLiteStatement.h"
 
 #include "base/Saturate.h"
-#include "kstd/Analytics/SQLite/DatabaseCauses.h"
 #include "kstd/Analytics/SQLite/DatabaseEnvironment.h"
-#include "kstd/Analytics/SQLite/FormatText.h"
+#include "kstd/Analytics/SQLite/DatabaseTexts.h"
 #include "kstd/Analytics/SQLite/KSTDValueType.h"
 #include "platform/MessageClasses.h"
 

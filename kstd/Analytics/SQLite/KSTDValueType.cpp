@@ -1,6 +1,6 @@
 #include "kstd/Analytics/SQLite/KSTDValueType.h"
 
-#include "kstd/Analytics/SQLite/FormatText.h"
+#include "kstd/Analytics/SQLite/DatabaseTexts.h"
 
 #include <cstddef>
 #include <cstdlib>

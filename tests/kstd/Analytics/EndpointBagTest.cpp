@@ -1,6 +1,5 @@
-#include "kstd/Analytics/EndpointBag.h"
-
 #include "base/Concat.h"
+#include "kstd/Analytics/ServerDocuments.h"
 #include "platform/fake/FakeFormats.h"
 
 #include <gtest/gtest.h>

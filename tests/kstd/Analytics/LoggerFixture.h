@@ -1,7 +1,7 @@
 #pragma once
 
 #include "base/Concat.h"
-#include "kstd/Analytics/AnalyticsLifetime.h"
+#include "kstd/Analytics/Analytics.h"
 #include "kstd/Analytics/KSTDAnalyticsLogger.h"
 #include "kstd/Analytics/TQAnalyticsLoggerSQLiteStore.h"
 #include "platform/fake/FakeHost.h"

@@ -1,4 +1,4 @@
-#include "kstd/Analytics/SQLite/HexText.h"
+#include "kstd/Analytics/SQLite/DatabaseTexts.h"
 
 #include <gtest/gtest.h>
 

@@ -1,4 +1,4 @@
-#include "kstd/Analytics/SQLite/SchemaHash.h"
+#include "kstd/Analytics/SQLite/KSTDSQLite.h"
 #include "tests/kstd/Analytics/SQLite/DatabaseFixture.h"
 #include "tests/support/ChildProcess.h"
 #include "tests/support/Program.h"

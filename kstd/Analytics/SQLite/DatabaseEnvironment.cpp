@@ -1,4 +1,4 @@
-#include "kstd/Analytics/SQLite/DatabaseCauses.h"
+#include "kstd/Analytics/SQLite/DatabaseEnvironment.h"
 
 #include "base/Concat.h"
 #include "platform/MessageClasses.h"

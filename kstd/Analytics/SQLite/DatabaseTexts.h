@@ -1,5 +1,7 @@
 #pragma once
 
+#include "platform/Value.h"
+
 #include <concepts>
 #include <cstdint>
 #include <initializer_list>
@@ -76,5 +78,15 @@ class FormatArgument {
 /// a point, an exponent or none; what follows is ignored. Whatever the locale, the separator is the
 /// point. 0 when there is no such number, or when no finite 32-bit number holds it.
 [[nodiscard]] float leadingFloat(std::string_view text);
+
+/// Two lower-case digits a byte, the high nibble first, with a blank between groups of four bytes.
+[[nodiscard]] std::string RXHexString(std::span<const std::uint8_t> bytes);
+[[nodiscard]] std::string RXLowercaseHexStringWithoutSpaces(std::span<const std::uint8_t> bytes);
+[[nodiscard]] std::string RXUppercaseHexStringWithoutSpaces(std::span<const std::uint8_t> bytes);
+
+/// The bytes that the digits of `text` make. Everything that is no digit of the chosen case is
+/// skipped, digits of the other case included; a last digit without a partner is dropped.
+[[nodiscard]] platform::Bytes RXDataWithHexString(std::string_view text,
+                                                  bool stringIsUppercase = false);
 
 } // namespace kstd
