@@ -97,6 +97,7 @@ wire::HTTPVerdict RequestingDaemon::ask(const AuthenticationChallenge& challenge
          challenge.trust != nullptr ? static_cast<std::uint32_t>(challenge.trust->evaluate()) : 0,
          challenge.host});
     wire::HTTPMessage message;
+    // Whatever goes wrong on the way to a verdict is a refusal.
     if (!question || connection_.send(*question) != State::open ||
         connection_.receive(message) != State::open ||
         message.type != wire::HTTPMessageType::verdict) {

@@ -83,6 +83,8 @@ bool isLocalConnection(int socket) {
 /// the other end is neither root nor this process's own user.
 base::FileDescriptor takeConnection(std::string& reason) {
     constexpr int kSocket = wire::kHTTPConnectionDescriptor;
+    // Looked at before it is owned: in a program that is started by hand the descriptor may be
+    // anybody's.
     if (!isLocalConnection(kSocket)) {
         reason = base::concat("descriptor ", kSocket, " is no connection of a local stream socket");
         return base::FileDescriptor();

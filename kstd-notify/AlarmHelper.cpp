@@ -74,6 +74,7 @@ bool AlarmHelper::bringUpToDate(const std::vector<Question>& questions) {
         report(answer.reason);
     }
     const std::vector<std::uint8_t> bytes = wire::encodeAlarmAnswer(answer);
+    // Only now that the timer is where it has to be: who is told relies on it.
     const auto told = std::count_if(questions.begin(), questions.end(), [&](const Question& asked) {
         return ::send(asked.answers.get(), bytes.data(), bytes.size(),
                       MSG_DONTWAIT | MSG_NOSIGNAL) >= 0;
@@ -81,6 +82,7 @@ bool AlarmHelper::bringUpToDate(const std::vector<Question>& questions) {
     if (told > 0) {
         return true;
     }
+    // Nobody asked, or who did is gone: then nobody else fires what is due.
     const auto error = areDue ? unit_.elapseNow() : std::nullopt;
     if (error) {
         report(error->description);
@@ -120,6 +122,7 @@ std::vector<AlarmHelper::Question> AlarmHelper::takeQuestions() {
 
 /// None when the queue is empty.
 std::optional<AlarmHelper::Question> AlarmHelper::receive() {
+    // What is said does not matter, so one byte has room enough and the rest is cut off.
     char content = 0;
     iovec data{&content, sizeof content};
     alignas(cmsghdr) std::array<std::uint8_t, CMSG_SPACE(sizeof(ucred)) + CMSG_SPACE(sizeof(int))>

@@ -47,6 +47,7 @@ std::optional<Error> AlarmTimer::replace(Date date) {
     if (!present) {
         return present.error();
     }
+    // Left alone: between a stop and a start there would be none, and the process may end there.
     if (present.value() == timeOf(date)) {
         return std::nullopt;
     }
@@ -59,6 +60,7 @@ std::optional<Error> AlarmTimer::replace(Date date) {
 std::optional<Error> AlarmTimer::start(Date date) {
     if (machine_ == Machine::canBeWoken) {
         auto error = startWaiting(date, AlarmTimerUnit::Wakes::machine);
+        // That a timer of the past does not wait is not the machine's fault.
         if (!error || date <= clock_.now()) {
             return error;
         }

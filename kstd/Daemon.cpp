@@ -52,6 +52,7 @@ void Daemon::startServices() {
 void Daemon::subscribe(const MatchingStream& stream) {
     host_.events.setHandler(stream.name, [host = host_, services = services_,
                                           stream](const platform::Event& event) {
+        // Until every service is done with the event, the process does not count as idle.
         const platform::ProcessTransaction transaction(host.transactions, stream.transactionLabel);
         logLine(host.log, kMainBlock, "Wisp Event: ", event.name, " (", stream.shortName, ").");
         for (const auto& service : *services) {

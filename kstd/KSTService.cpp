@@ -12,6 +12,7 @@ KSTService::KSTPropertyWithName(std::string_view propertyName) {
     constexpr char kSource[] = "kstd/KSTService";
     const platform::ServiceHandle entry = host_.registry.findByPath(wire::rm::kKernelServicePath);
     if (entry == platform::kNoService) {
+        // The line of a failed check is written by code that knows no classes.
         ClassifyingLog log(host_.log, platform::message::kKernelServiceFailed);
         kst::fail({&log, kTag, kSource}, "entry", 0, kKSTErrorUnexpected);
         return std::nullopt;

@@ -22,6 +22,7 @@ void Analytics::logTimerRestartedEventWithAttributes(const platform::ValueMap& a
 }
 
 AnalyticsLifetime::~AnalyticsLifetime() {
+    // The loggers first, since they hold their stores.
     LoggerInstances::release();
     TQAnalyticsLoggerSQLiteStore::releaseStores();
     OSVersion::release();

@@ -131,6 +131,7 @@ void readFrom(Reader reader, AnalyticsConfiguration& configuration) {
     replace(configuration.splunkTopicName, reader.text(kTopic));
     replace(configuration.splunkUploadURL, reader.link(kUploadURL));
     replace(configuration.splunkBagURL, reader.link(kBagURL));
+    // Either place can switch it on, and neither off.
     configuration.allowInsecureSplunkCert |= reader.isTrue(kAllowInsecureCertificate);
 }
 

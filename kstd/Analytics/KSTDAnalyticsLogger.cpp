@@ -83,6 +83,7 @@ std::shared_ptr<KSTDAnalyticsLogger> LoggerInstances::instance(std::type_index l
 }
 
 void LoggerInstances::release() {
+    // Goes after the lock: the end of a subclass's logger may do anything, also ask for another.
     ByClass released;
     const std::lock_guard lock(instances().mutex);
     released.swap(instances().byClass);
@@ -140,6 +141,8 @@ void KSTDAnalyticsLogger::logEventNamed(std::optional<std::string_view> name,
     std::optional<platform::Timestamp> uploadDate;
     fields.queue->sync([&] { uploadDate = keepEvent(*name, withAttributes); });
     const platform::Timestamp now = platform::timestampOf(host_.clock.now());
+    // Also after an event that is not wanted: it reads no date and so moves the next upload, just
+    // as the very first event sets it.
     if (!uploadDate) {
         resetUploadDate(false);
     } else if (now.secondsSince2001 > uploadDate->secondsSince2001) {
@@ -171,6 +174,8 @@ void KSTDAnalyticsLogger::upload() {
     std::optional<platform::Error> error;
     if (forceUploadWithError(&error)) {
         host_.log.write(platform::LogLevel::debug, "uploaded oracle statistics", {});
+        // Clears and dates once more what forceUploadWithError has done already, which it must do
+        // for those who call it alone. In the daemon nothing comes in between.
         resetUploadDate(true);
     } else if (error) {
         host_.log.write(platform::LogLevel::error,
@@ -217,11 +222,14 @@ KSTDAnalyticsLogger::eventDictForEventName(std::string_view name,
     if (fields.splunkTopicName) {
         event.insert_or_assign("topic", *fields.splunkTopicName);
     } else {
+        // The topic is ours alone to give: without one an event has none, whatever its sender calls
+        // so.
         event.erase("topic");
     }
     event.insert_or_assign("eventType", name);
     event.insert_or_assign("eventTime", platform::millisecondsSince1970(host_.clock.now()));
     if (fields.metricsBase) {
+        // What the event says itself counts before what the server adds to all.
         event.insert(fields.metricsBase->begin(), fields.metricsBase->end());
     }
     return event;

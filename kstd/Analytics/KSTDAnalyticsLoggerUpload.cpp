@@ -41,6 +41,7 @@ platform::HTTPReply waitForReply(platform::HTTPSession& session,
             pending->arrival.release();
         }
     });
+    // Without a limit of its own: the session ends every request within its limits.
     pending->arrival.acquire();
     return std::move(pending->reply);
 }
@@ -75,6 +76,8 @@ bool KSTDAnalyticsLogger::forceUploadWithError(std::optional<platform::Error>* e
         }
         return false;
     }
+    // A second piece of work on the queue: making the document asks the subclass for its values,
+    // which it does on this thread.
     bool isUploaded = false;
     fields.queue->sync([&] { isUploaded = uploadDocument(document.value().view()); });
     return isUploaded;
@@ -120,6 +123,8 @@ KSTDAnalyticsLogger::makeDocument(const platform::ValueMap& extraValues,
 
 bool KSTDAnalyticsLogger::onQueuePostJSON(std::string_view JSON) {
     auto link = splunkUploadURL();
+    // Also after a bag that has switched uploads off. What it says of events counts from the next
+    // one on; what is collected goes to the bag's own address.
     if (!link) {
         host_.log.write(LogLevel::error,
                         "failed to get a splunk upload endpoint - using bag URL instead", {});
@@ -169,10 +174,12 @@ platform::HTTPReply KSTDAnalyticsLogger::replyTo(const platform::HTTPRequest& re
 }
 
 std::optional<Link> KSTDAnalyticsLogger::splunkUploadURL() {
+    // Fetched anew each time and never remembered: the bag is how a server changes its mind.
     return fields.splunkUploadURL ? fields.splunkUploadURL : fetchUploadURL();
 }
 
 std::optional<Link> KSTDAnalyticsLogger::fetchUploadURL() {
+    // Also without a link: the session's answer to that is an error, with its line.
     const auto reply = replyTo({.method = "GET", .link = fields.splunkBagURL});
     if (reply.error) {
         host_.log.write(LogLevel::error,
@@ -203,20 +210,24 @@ bool KSTDAnalyticsLogger::takeOverSwitches(const EndpointBag& bag) {
     if (bag.disabled || bag.sendDisabled) {
         return false;
     }
+    // Less than a second would become an interval of none.
     if (bag.postFrequency && *bag.postFrequency >= kMillisecondsPerSecond) {
         fields.secondsBetweenUploads =
             static_cast<std::int64_t>(*bag.postFrequency / kMillisecondsPerSecond);
     }
+    // A list that the bag does not have is taken back.
     fields.blacklistedEvents = bag.blacklistedEvents;
     fields.blacklistedFields = bag.blacklistedFields;
     return true;
 }
 
 std::optional<Link> KSTDAnalyticsLogger::takeOverMetrics(const EndpointBag& bag) {
+    // Whatever becomes of the link, and also when the server's switches are ignored.
     fields.metricsBase = bag.metricsBase;
     if (!bag.metricsUrl) {
         return std::nullopt;
     }
+    // The line below would show a password to everyone who reads the log.
     if (platform::namesUser(*bag.metricsUrl)) {
         return std::nullopt;
     }
@@ -236,6 +247,7 @@ void KSTDAnalyticsLogger::didReceiveChallenge(const platform::AuthenticationChal
     }
     host_.log.write(platform::LogLevel::info, "Splunk upload challenge",
                     {.messageId = platform::message::kServerChallenge});
+    // The certificate would be the same.
     if (challenge.previousFailureCount > 0) {
         completion(cancel, std::nullopt);
         return;
@@ -244,6 +256,7 @@ void KSTDAnalyticsLogger::didReceiveChallenge(const platform::AuthenticationChal
         completion(performDefaultHandling, std::nullopt);
         return;
     }
+    // Also when any certificate will do: what is forced is the verdict, not the evaluation.
     const platform::TrustResult result = challenge.trust->evaluate();
     if (fields.allowInsecureSplunkCert) {
         host_.log.write(platform::LogLevel::info, "Force Accepting Splunk Credential",

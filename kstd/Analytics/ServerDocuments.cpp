@@ -63,6 +63,7 @@ platform::ValueMap uploadSummary(platform::ValueMap extraValues,
                                  const std::optional<std::string>& topic,
                                  platform::SystemVersion& version, double postTime) {
     platform::ValueMap summary = std::move(extraValues);
+    // A missing topic is null here, while events simply have none.
     summary.insert_or_assign("topic", topic ? platform::Value(*topic) : platform::Value());
     summary.insert_or_assign("eventTime", postTime);
     summary.insert_or_assign("eventType", "accumulatedPolicyStats");

@@ -42,9 +42,12 @@ TQAnalyticsLoggerSQLiteStore::storeWithPath(const std::string& path, const std::
     const std::string standardised = standardisedPath(path);
     std::shared_ptr<TQAnalyticsLoggerSQLiteStore>& store = registry().stores[standardised];
     if (store == nullptr) {
+        // The schema of the first one counts.
         store = std::make_shared<TQAnalyticsLoggerSQLiteStore>(standardised, schema, environment);
     }
     platform::Error error;
+    // Every time: a store that is open counts one opening more, which nobody gives back. It stays
+    // open as long as the process lives.
     if (!store->openWithError(&error)) {
         store->logError(
             platform::message::kDatabaseNotOpened,
@@ -95,6 +98,7 @@ void TQAnalyticsLoggerSQLiteStore::addEventDict(platform::ValueMap event,
     platform::ValueMap row;
     row.emplace("data", std::move(data).value());
     row.emplace("timestamp", platform::timestampOf(environment().clock.now()));
+    // A failure is in the log and the event is lost: its sender is never held up by analytics.
     insertOrReplaceInto(toTable, std::move(row));
 }
 
@@ -143,6 +147,8 @@ void TQAnalyticsLoggerSQLiteStore::logError(std::string_view messageId,
 
 void TQAnalyticsLoggerSQLiteStore::clearAllData() {
     if (tryToOpenDatabase()) {
+        // All rows: a deletion wants a clause. Not a new table, because identifiers are never used
+        // twice.
         deleteFrom(kEventTable, "id >= 0", {});
     }
 }

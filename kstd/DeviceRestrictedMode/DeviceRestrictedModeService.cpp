@@ -59,6 +59,7 @@ bool writeBlob(platform::Files& files, const platform::OpenFile& opened,
                std::span<const std::uint8_t> data, const kst::AssertionContext& assertions) {
     const auto file = files.attachStream(opened);
     if (!file) {
+        // The descriptor stays open: only streams are closed here.
         kst::fail(assertions, "file", 0, kKSTErrorUnexpected);
         return false;
     }
@@ -88,6 +89,7 @@ constexpr char kOnKextTimerRestartedAnalyticsCollected[] =
 constexpr char kScheduleAlarm[] = "-[DeviceRestrictedModeService scheduleAlarm:]";
 constexpr char kUnscheduleAlarm[] = "-[DeviceRestrictedModeService unscheduleAlarm]";
 
+// Each kind of event counts its own versions.
 constexpr std::int32_t kPolicyEventVersion = 3;
 constexpr std::int32_t kTimerRestartedEventVersion = 4;
 constexpr std::uint32_t kSecondsPerMinute = 60;
@@ -142,6 +144,7 @@ kst::AssertionContext DeviceRestrictedModeService::assertions() const {
 
 void DeviceRestrictedModeService::start() {
     logLine(host().log, kStart, "called, .");
+    // Its failure is in the log, and nothing is tried again: the next start is the next chance.
     notifyDaemonStarted();
     logLine(host().log, kStart, "returning, .");
 }
@@ -152,6 +155,8 @@ void DeviceRestrictedModeService::stop() {
 }
 
 KSTStatus DeviceRestrictedModeService::notifyDaemonStarted() {
+    // A refused restore ends the exchange before the start is told; a file that is missing does
+    // not.
     KSTStatus status = restoreAnalytics();
     if (status == kKSTErrorSuccess) {
         status = sendDaemonStarted();
@@ -245,6 +250,7 @@ void DeviceRestrictedModeService::onKextNotificationArrivedWithPropertyName(
                 ".");
         status = dispatch(*notification);
         if (status == kKSTErrorSuccess) {
+            // What was handled stays handled, whether or not the kernel side hears of it.
             sendNotificationACKWithPropertyName(propertyName);
             return;
         }
@@ -278,6 +284,7 @@ KSTStatus
 DeviceRestrictedModeService::sendNotificationACKWithPropertyName(std::string_view propertyName) {
     logLine(host().log, kSendNotificationACK, "XXX Daemon: SENDING ACK ", propertyName, ".");
     std::array<std::uint8_t, kNotificationAckPayloadSize> payload{};
+    // A name that fills the payload has no zero byte behind it.
     std::copy_n(propertyName.begin(), std::min(propertyName.size(), payload.size()),
                 payload.begin());
     const KSTStatus status = sendRequest(kKSTKernelControlRMNotificationAck, payload);
@@ -293,6 +300,8 @@ DeviceRestrictedModeService::sendNotificationACKWithPropertyName(std::string_vie
 KSTStatus DeviceRestrictedModeService::saveDataBlob(const std::string& path,
                                                     std::span<const std::uint8_t> data) {
     logLine(host().log, kSaveDataBlob, "called, filePath = ", path, ".");
+    // In place and never shortened: who reads it takes the leading bytes, so a longer file's rest
+    // does no harm.
     const platform::OpenFile opened = host().files.openForWriting(
         path, platform::ProtectionClass::none, platform::kNoClassOptions, kOwnerReadWrite);
     if (opened.descriptor < 0) {
@@ -322,6 +331,7 @@ DeviceRestrictedModeService::onKextTimerRestarted(const KSTDRMDeamonNotification
         logLine(host().log, kOnKextTimerRestarted, "returning, err = ", status, ".");
         return status;
     }
+    // Only once the state is safe: otherwise the record comes again, and its alarm with it.
     if (notification.alarmTimestamp() != 0) {
         scheduleAlarm(static_cast<double>(notification.alarmTimestamp()));
     } else {
@@ -331,6 +341,8 @@ DeviceRestrictedModeService::onKextTimerRestarted(const KSTDRMDeamonNotification
 }
 
 KSTStatus DeviceRestrictedModeService::saveStateBlob(const KSTDRMDeamonNotification& notification) {
+    // Through the library's allocator, which wipes it; and so its end of memory is a failure with a
+    // line, not an exception.
     const kst::AllocatedMemory stateBlob(kStateBlobSize);
     if (stateBlob.bytes() == nullptr) {
         return kst::fail(assertions(), "stateBlob", 0, kKSTErrorUnexpected);
@@ -344,6 +356,8 @@ KSTStatus DeviceRestrictedModeService::saveStateBlob(const KSTDRMDeamonNotificat
 KSTStatus DeviceRestrictedModeService::onKextAnalyticsCollected(
     const KSTDRMDeamonNotification& notification) {
     logLine(host().log, kOnKextAnalyticsCollected, "called, .");
+    // Acknowledged whatever becomes of the event: the kernel side's figures are not held up by
+    // analytics.
     Analytics::logger(host())->logPolicyEventWithAttributes(policyAttributes(notification));
     return kKSTErrorSuccess;
 }

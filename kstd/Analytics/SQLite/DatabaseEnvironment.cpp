@@ -29,6 +29,7 @@ bool isOfStorage(int code) {
 /// Whether the system's last word belongs to the failure.
 bool isOfSystem(int code) {
     const int primary = code & kCauseMask;
+    // With other codes it is left from something earlier.
     return primary == SQLITE_IOERR || primary == SQLITE_CANTOPEN;
 }
 

@@ -25,6 +25,7 @@ struct Conversion {
 /// The conversion that `text`, which begins with a percent sign, begins with.
 std::optional<Conversion> conversionAt(std::string_view text) {
     std::size_t letter = 1;
+    // At most two: "lll" is no conversion.
     while (letter < 3 && letter < text.size() && text[letter] == 'l') {
         ++letter;
     }
@@ -105,6 +106,7 @@ std::string replacement(const Conversion& conversion, std::string_view asWritten
     if (arguments.empty()) {
         return std::string(asWritten);
     }
+    // Used up even when it is of another kind, so that the conversions after it get their own.
     const FormatArgument& argument = arguments.front();
     arguments = arguments.subspan(1);
     return convertedText(conversion, argument).value_or(std::string(asWritten));

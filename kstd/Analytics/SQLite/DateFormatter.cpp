@@ -37,6 +37,7 @@ constexpr sys_seconds kLast = sys_days(std::chrono::year(kLastYear) / 12 / 31) +
 
 sys_seconds heldMoment(platform::Timestamp date) {
     const double seconds = std::isnan(date.secondsSince2001) ? 0 : date.secondsSince2001;
+    // Held before it becomes an integer: a double may be beyond all of them.
     const double held = std::clamp(std::floor(seconds), timestampOf(kFirst), timestampOf(kLast));
     return sys_seconds(
         std::chrono::seconds(static_cast<std::int64_t>(held) + platform::kSecondsFrom1970To2001));

@@ -88,6 +88,9 @@ void KSTDSQLite::close() {
     }
     if (openCount_ == 1) {
         removeAllStatements();
+        // Not sqlite3_close_v2: over a statement in use that would succeed, and leave a connection
+        // that nobody can close any more. This way it stays open, counted once, for another
+        // attempt.
         if (sqlite3_close(db_) != SQLITE_OK) {
             logFailure("KSTDSQLite: Error closing database");
             return;
@@ -148,6 +151,7 @@ std::shared_ptr<KSTDSQLiteStatement> KSTDSQLite::statementForSQL(std::string_vie
     std::string text(SQL);
     sqlite3_stmt* handle = nullptr;
     if (sqlite3_prepare_v2(db_, text.c_str(), -1, &handle, nullptr) != SQLITE_OK) {
+        // Nothing is cached: the same text may be a good one later, when its table is there.
         logFailure(base::concat("Error preparing statement: ", text),
                    platform::message::kDatabaseFailed);
         causes_.tell(sqlite3_extended_errcode(db_), db_);
@@ -198,10 +202,12 @@ bool KSTDSQLite::openWithError(platform::Error* error) {
     if (!openConnection(reason) || !configureConnection()) {
         return failToOpen(reason, error);
     }
+    // Two programs that open a new file must not both find it without tables.
     begin();
     Tables tables = makeTablesCurrent();
     if (tables != Tables::failed) {
         end();
+        // On a full disk it may be the commit that fails.
         if (tables == Tables::made && hasStorageFailed()) {
             tables = Tables::failed;
         }
@@ -209,6 +215,8 @@ bool KSTDSQLite::openWithError(platform::Error* error) {
     if (tables == Tables::failed) {
         return failToOpen(reason, error);
     }
+    // Only now: SQLite vacuums outside of transactions alone. The versions come last, so that they
+    // are never ahead of the tables; a crash before them has a migration called once more.
     if (shouldVacuum_) {
         periodicVacuum();
     }
@@ -225,6 +233,8 @@ bool KSTDSQLite::failToOpen(platform::Error& reason, platform::Error* error) {
     }
     // They belong to this connection; the next one has its own.
     removeAllStatements();
+    // Not sqlite3_close: a delegate may have left a statement in use, and the attempt is over all
+    // the same.
     sqlite3_close_v2(std::exchange(db_, nullptr));
     if (error != nullptr) {
         *error = std::move(reason);
@@ -268,12 +278,16 @@ bool KSTDSQLite::configureConnection() {
            executeSQL("pragma journal_mode = WAL") &&
            executeSQL("pragma synchronous = %@",
                       synchronousModeName(synchronousMode_, environment_.log)) &&
+           // A file that has its log already takes this over with its next vacuum. The order stays:
+           // the first vacuum of a new file is the one of its opening.
            executeSQL("pragma auto_vacuum = FULL");
 }
 
 KSTDSQLite::Tables KSTDSQLite::makeTablesCurrent() {
     if (select({"name"}, "sqlite_master", "type = ? AND name = ?", {"table", "Properties"})
             .empty()) {
+        // The version is read from it right away. makeTables asks for it again, which does nothing
+        // then.
         createPropertiesTable();
         if (hasStorageFailed()) {
             return Tables::failed;
@@ -291,11 +305,14 @@ KSTDSQLite::Tables KSTDSQLite::makeTablesCurrent() {
     if (delegate_ != nullptr && delegate_->migrateDatabase(*this, fileVersion)) {
         hasMigrated_ = true;
     }
+    // Also when an earlier opening of this object has migrated or rebuilt: once is enough, whatever
+    // the delegate says now.
     if (hasMigrated_) {
         return Tables::kept;
     }
     removeAllStatements();
     dropAllTables();
+    // Migrated or rebuilt, that is. The properties went with the other tables.
     hasMigrated_ = true;
     createPropertiesTable();
     executeSQL("%@", schema_);
@@ -362,6 +379,8 @@ platform::Timestamp KSTDSQLite::creationDate() {
 
 /// The epoch when there is no such property.
 platform::Timestamp KSTDSQLite::storedTime(const std::string& key) {
+    // A float of 32 bits knows today to about a minute. That is enough for a week, and the dates
+    // read the same for everyone.
     return {leadingFloat(propertyForKey(key).value_or(""))};
 }
 

@@ -22,6 +22,7 @@ std::string joined(const ColumnNames& names, std::string_view separator) {
 }
 
 void appendWhere(std::string& text, const KSTDSQLite::Where& where) {
+    // Here an empty clause is none.
     if (where && !where->empty()) {
         text += " where ";
         text += *where;
@@ -66,6 +67,8 @@ void visitRows(KSTDSQLite& database, std::string_view SQL, const platform::Value
 }
 
 std::string insertText(std::string_view table, const platform::ValueMap& values) {
+    // Names of tables and columns are the program's own and stand in the text as they are; values
+    // never do. A map is sorted, so the same columns always find the same cached statement.
     std::string text = base::concat("insert or replace into ", table, " (");
     std::string marks;
     for (const auto& [column, value] : values) {
@@ -90,6 +93,7 @@ RowList KSTDSQLite::select(const ColumnNames& columns, std::string_view from) {
 
 RowList KSTDSQLite::select(const ColumnNames& columns, std::string_view from, Where where,
                            const platform::ValueList& bindings) {
+    // Here an empty clause is one, and an error of SQL, unlike everywhere else.
     std::string text = base::concat("select ", joined(columns, ", "), " from ", from);
     if (where) {
         text += " where ";
@@ -131,6 +135,7 @@ RowList KSTDSQLite::selectAllFrom(std::string_view table, Where where,
 std::uint64_t KSTDSQLite::selectCountFrom(std::string_view table, Where where,
                                           const platform::ValueList& bindings) {
     const RowList rows = select({"count(*) as n"}, table, where, bindings);
+    // A count has always its row; a table that is not there has none.
     if (rows.empty()) {
         return 0;
     }

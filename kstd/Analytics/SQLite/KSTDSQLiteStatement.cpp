@@ -70,6 +70,7 @@ bool KSTDSQLiteStatement::step() {
     case SQLITE_ROW:
         return true;
     case SQLITE_DONE:
+        // That something could be read says nothing about a disk that is full.
         if (environment_.causes != nullptr && sqlite3_stmt_readonly(handle_) == 0) {
             environment_.causes->wrote();
         }
@@ -86,6 +87,7 @@ bool KSTDSQLiteStatement::step() {
 }
 
 void KSTDSQLiteStatement::reset() {
+    // What was bound and not stepped stays bound.
     if (reset_) {
         return;
     }
@@ -106,6 +108,7 @@ void KSTDSQLiteStatement::resetAfterStepError() {
     if (reset_) {
         return;
     }
+    // It gives the step's error once more, which is told already.
     static_cast<void>(sqlite3_reset(handle_));
     static_cast<void>(clearBindings());
     temporaryBoundObjects_.clear();
@@ -114,6 +117,8 @@ void KSTDSQLiteStatement::resetAfterStepError() {
 
 void KSTDSQLiteStatement::finalizeStatement() {
     if (!reset_) {
+        // Not freed: its holder is in the middle of it, and the line brings the missing reset to
+        // light.
         logFailure(formatText("KSTDSQLite: Statement not reset after last use: \"%@\"", {SQL_}));
         return;
     }
@@ -159,6 +164,7 @@ void KSTDSQLiteStatement::bindBlob(const platform::Bytes* value, int atIndex) {
 }
 
 void KSTDSQLiteStatement::bindText(const std::string* value, int atIndex) {
+    // Up to the first zero byte, which is also as far as it is read back.
     if (mayBind()) {
         checkBound(sqlite3_bind_text(handle_, parameterNumber(atIndex),
                                      value == nullptr ? nullptr : value->c_str(), -1,
@@ -168,6 +174,8 @@ void KSTDSQLiteStatement::bindText(const std::string* value, int atIndex) {
 }
 
 void KSTDSQLiteStatement::bindNullAtIndex(int index) {
+    // Does not ask whether it may: SQLite refuses while the statement runs, and the line is this
+    // one.
     if (sqlite3_bind_null(handle_, parameterNumber(index)) != SQLITE_OK) {
         logFailure("KSTDSQLite: sqlite3_bind_null error");
     }
@@ -309,6 +317,8 @@ void KSTDSQLiteStatement::checkBound(int code, std::string_view kind, int index)
 }
 
 void KSTDSQLiteStatement::bindNumber(const platform::Value& number, int index) {
+    // A real, too, is stored as an integer, without its fraction. Files have always been written
+    // so, and nothing but a date is expected to be a real in them.
     if (isBoundWith32Bits(KSTDValueType::typeForValue(number))) {
         bindInt(integerIn<std::int32_t>(number), index);
     } else {

@@ -71,6 +71,7 @@ platform::Value number(std::span<const std::uint8_t> bytes) {
 }
 
 platform::Value boolean(std::span<const std::uint8_t> bytes) {
+    // Not copied into a bool, which holds no byte but 0 and 1.
     return contentOf<std::uint8_t>(bytes) != 0;
 }
 
@@ -169,6 +170,8 @@ KSTDValueType KSTDValueType::typeForEncoding(std::string_view encoding, platform
     if (index == std::string_view::npos) {
         return {23, encoding, "unknown", 0, 0};
     }
+    // Only the last of the encodings, ':', comes here. That it has no row, and asking for it stops
+    // the process as any index out of range would, is meant so.
     if (index >= kScalarTypeCount) {
         stop(log, formatText("KSTDValueType: index %lu is out of range, there are %lu types",
                              {index, kScalarTypeCount}));
