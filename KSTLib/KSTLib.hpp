@@ -313,12 +313,16 @@ class Passphrase : public detail::WipedBytes<kKSTPassphraseMaxLength> {
         return passphrase;
     }
 
-    /** Reads a line from `input`, without its end and no further. On a terminal `prompt` is written
-     *  to standard error, and nothing of what is typed is shown; a signal that ends or stops the
-     *  program does so when the terminal shows again what is typed, and if the program goes on, the
-     *  error is std::errc::interrupted. kKSTErrorBadParameter: the line has more than 128 bytes; it
-     *  is read to its end. std::errc::no_message: there is no line any more. Or the system's error
-     *  of reading. */
+    /** Reads a line from `input`, without its end and no further.
+     *
+     *  On a terminal `prompt` is written to standard error, and nothing of what is typed is shown.
+     *  A signal that ends or stops the program does so when the terminal shows again what is typed,
+     *  and if the program goes on, the error is std::errc::interrupted. That holds for signals that
+     *  this thread gets: a program with several blocks them in the others.
+     *
+     *  kKSTErrorBadParameter: the line has more than 128 bytes; it is read to its end.
+     *  std::errc::no_message: there is no line any more. Or the system's error of reading, or of
+     *  silencing the terminal. */
     [[nodiscard]] static Result<Passphrase> read(const char* prompt,
                                                  int input = STDIN_FILENO) noexcept {
         if (::isatty(input) == 0) {
@@ -731,7 +735,7 @@ class Context {
     /** As KSTContextCreateWithExternalForm, which does not tell a context that is not there from a
      *  failure: kKSTKernelErrorNoSuchContext stands for both. */
     [[nodiscard]] static Result<Context> open(const ExternalForm& form) noexcept {
-        const KSTContextRef opened = KSTContextCreateWithExternalForm(form.data(), form.size());
+        KSTContextRef opened = KSTContextCreateWithExternalForm(form.data(), form.size());
         if (opened == nullptr) {
             return errorOf(kKSTKernelErrorNoSuchContext);
         }

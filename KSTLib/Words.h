@@ -142,6 +142,7 @@ enum {
 };
 
 /** What a status says. */
+// NOLINTNEXTLINE(readability-function-size): one line for each number
 KST_WORDS const char* KSTStatusText(KSTStatus status) KST_WORDS_END {
     switch (status) {
     case kKSTErrorSuccess:
