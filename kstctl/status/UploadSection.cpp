@@ -6,8 +6,7 @@
 #include "kstctl/status/DaemonSockets.h"
 #include "kstctl/status/Section.h"
 #include "platform/formats/PropertyListCodec.h"
-#include "platform/linux/LinuxConfigurationResource.h"
-#include "platform/linux/LinuxUserDefaults.h"
+#include "platform/linux/LinuxConfiguration.h"
 
 #include <algorithm>
 #include <optional>

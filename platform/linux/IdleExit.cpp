@@ -4,6 +4,14 @@
 
 namespace platform {
 
+void LinuxProcessTransactions::begin(std::string_view /*label*/) {
+    ++count_;
+}
+
+void LinuxProcessTransactions::end(std::string_view /*label*/) {
+    --count_;
+}
+
 IdleExit::IdleExit(LinuxRunLoop& loop, std::chrono::microseconds idleTime, Busy busy,
                    Close closeStreams)
     : idleTime_(idleTime),

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "platform/ProcessTransaction.h"
 #include "platform/linux/LinuxRunLoop.h"
 
 #include <chrono>
@@ -7,6 +8,18 @@
 #include <memory>
 
 namespace platform {
+
+/// The count of transactions of this process.
+class LinuxProcessTransactions final : public ProcessTransactions {
+  public:
+    void begin(std::string_view label) override;
+    void end(std::string_view label) override;
+
+    [[nodiscard]] bool busy() const { return count_ > 0; }
+
+  private:
+    int count_ = 0;
+};
 
 /// Ends an idle process: once nothing was in hand for a whole `idleTime`, it calls `closeStreams`,
 /// once, and the run loop is left without sources.

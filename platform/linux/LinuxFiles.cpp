@@ -3,9 +3,7 @@
 #include "base/Concat.h"
 #include "base/FileDescriptor.h"
 #include "platform/MessageClasses.h"
-#include "platform/linux/LinuxFileStream.h"
 #include "platform/linux/RegularFile.h"
-#include "platform/linux/Sync.h"
 
 #include <cerrno>
 #include <fcntl.h>
@@ -22,6 +20,9 @@ namespace {
 constexpr std::string_view kOpen = "open";
 constexpr std::string_view kAttach = "write to";
 constexpr std::string_view kLoad = "load";
+constexpr std::string_view kWrite = "write";
+constexpr std::string_view kSync = "sync";
+constexpr std::string_view kClose = "close";
 
 constexpr int kOpenFlags = O_RDWR | O_CLOEXEC | O_NOCTTY | O_NOFOLLOW;
 
@@ -68,6 +69,15 @@ bool isWritable(int descriptor) {
     }
     const int access = flags & O_ACCMODE;
     return access == O_WRONLY || access == O_RDWR;
+}
+
+/// Forces a file's or directory's contents to permanent storage. 0 or the error's number.
+int syncDescriptor(int descriptor) {
+    int result = 0;
+    do {
+        result = ::fsync(descriptor);
+    } while (result != 0 && errno == EINTR);
+    return result == 0 ? 0 : errno;
 }
 
 std::string directoryOf(const std::string& path) {
@@ -155,6 +165,67 @@ int LinuxFiles::syncNameOnce(const std::string& path) {
     }
     syncedNames_.insert(path);
     return 0;
+}
+
+LinuxFileStream::LinuxFileStream(LinuxFiles& files, base::FileDescriptor descriptor,
+                                 std::string path)
+    : files_(files), descriptor_(std::move(descriptor)), path_(std::move(path)) {}
+
+std::size_t LinuxFileStream::write(const void* data, std::size_t elementSize, std::size_t count) {
+    std::size_t size = 0;
+    if (!descriptor_.isOpen() || elementSize == 0 ||
+        __builtin_mul_overflow(elementSize, count, &size)) {
+        return 0;
+    }
+    const char* const bytes = static_cast<const char*>(data);
+    std::size_t done = 0;
+    while (done < size) {
+        const ssize_t written = ::pwrite(descriptor_.get(), bytes + done, size - done, position_);
+        if (written < 0 && errno == EINTR) {
+            continue;
+        }
+        if (written <= 0) {
+            // Taking nothing without a reason is an error of the device.
+            files_.tell(kWrite, path_, written < 0 ? errno : EIO);
+            return done / elementSize;
+        }
+        done += static_cast<std::size_t>(written);
+        position_ += written;
+    }
+    files_.worked(kWrite, path_);
+    return done / elementSize;
+}
+
+int LinuxFileStream::fullSync() {
+    if (!descriptor_.isOpen()) {
+        return EBADF;
+    }
+    int error = syncDescriptor(descriptor_.get());
+    if (error == 0) {
+        error = files_.syncNameOnce(path_);
+    }
+    if (error == 0) {
+        files_.worked(kSync, path_);
+    } else {
+        files_.tell(kSync, path_, error);
+    }
+    return error;
+}
+
+int LinuxFileStream::close() {
+    if (!descriptor_.isOpen()) {
+        return EBADF;
+    }
+    // Linux gives the number free whatever close answers, so it is never closed again. Interrupted
+    // is no failure: the number is free all the same.
+    const int result = ::close(descriptor_.release());
+    const int error = result == 0 || errno == EINTR ? 0 : errno;
+    if (error == 0) {
+        files_.worked(kClose, path_);
+    } else {
+        files_.tell(kClose, path_, error);
+    }
+    return error;
 }
 
 } // namespace platform

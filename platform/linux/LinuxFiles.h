@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/FileDescriptor.h"
 #include "platform/Files.h"
 #include "platform/SystemLog.h"
 #include "platform/linux/Paths.h"
@@ -8,6 +9,7 @@
 #include <set>
 #include <string>
 #include <string_view>
+#include <sys/types.h>
 #include <utility>
 
 namespace platform {
@@ -56,6 +58,24 @@ class LinuxFiles final : public Files {
     /// that was there before it may have been made by a process that was killed before its sync,
     /// so existing files are not in here from the start.
     std::set<std::string, std::less<>> syncedNames_;
+};
+
+/// The stream of LinuxFiles. It keeps its own position, so that it begins at 0 whatever was done
+/// with the descriptor before.
+class LinuxFileStream final : public FileStream {
+  public:
+    LinuxFileStream(LinuxFiles& files, base::FileDescriptor descriptor, std::string path);
+
+    [[nodiscard]] std::size_t write(const void* data, std::size_t elementSize,
+                                    std::size_t count) override;
+    [[nodiscard]] int fullSync() override;
+    int close() override;
+
+  private:
+    LinuxFiles& files_;
+    base::FileDescriptor descriptor_;
+    std::string path_;
+    off_t position_ = 0;
 };
 
 } // namespace platform

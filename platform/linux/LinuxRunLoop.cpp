@@ -1,7 +1,7 @@
 #include "platform/linux/LinuxRunLoop.h"
 
 #include "base/Concat.h"
-#include "platform/linux/RealTime.h"
+#include "platform/linux/LinuxClock.h"
 
 #include <systemd/sd-event.h>
 

@@ -1,10 +1,12 @@
 #include "platform/linux/RegularFile.h"
 
+#include "base/Concat.h"
 #include "base/FileDescriptor.h"
 
 #include <algorithm>
 #include <cerrno>
 #include <fcntl.h>
+#include <system_error>
 #include <unistd.h>
 
 namespace platform {
@@ -79,6 +81,28 @@ RegularFile readRegularFile(const std::string& path, std::size_t limit, const Re
         file.bytes.resize(limit);
     }
     return file;
+}
+
+std::string distrust(const RegularFile& file, std::size_t limit) {
+    switch (file.failure) {
+    case ReadFailure::none:
+        break;
+    case ReadFailure::notRegular:
+        return "not a regular file";
+    case ReadFailure::tooLarge:
+        return base::concat("larger than ", limit, " bytes");
+    case ReadFailure::missing:
+    case ReadFailure::unreadable:
+        return base::concat("cannot be read: ", std::generic_category().message(file.error));
+    }
+    if (file.status.st_uid != 0 && file.status.st_uid != ::geteuid()) {
+        return base::concat("owned by user ", file.status.st_uid,
+                            ", neither root nor the daemon's own");
+    }
+    if ((file.status.st_mode & (S_IWGRP | S_IWOTH)) != 0) {
+        return "writable by group or others";
+    }
+    return {};
 }
 
 } // namespace platform

@@ -1,10 +1,52 @@
 #include "platform/linux/RemoteHTTPSessions.h"
 
-#include "platform/linux/RemoteHTTPSession.h"
+#include "platform/host/HTTPRequestCheck.h"
+#include "platform/host/RequestThreads.h"
+#include "platform/linux/HTTPSClient.h"
+#include "platform/linux/RemoteHTTPExchange.h"
 
 #include <utility>
 
 namespace platform {
+
+namespace {
+
+HTTPReply replyTo(const HTTPRequest& request, const RemoteHTTPSettings& settings) {
+    if (auto refusal = refusalOf(request)) {
+        return *std::move(refusal);
+    }
+    if (settings.options.mustStop()) {
+        return failedReply(kTransferFailed, kStoppedDescription);
+    }
+    Result<HTTPSClient> client = HTTPSClient::reach(settings.options);
+    if (!client) {
+        return {client.error(), std::nullopt, {}};
+    }
+    HTTPSClient reached = std::move(client).value();
+    return RemoteHTTPExchange(reached.connection(), request, settings).perform();
+}
+
+/// A session of RemoteHTTPSessions. Requests may be started from any thread.
+///
+/// When no thread can be made for a request, its completion is called before `start` returns.
+class RemoteHTTPSession final : public HTTPSession {
+  public:
+    explicit RemoteHTTPSession(RemoteHTTPSettings settings) : settings_(std::move(settings)) {}
+
+    void start(const HTTPRequest& request, HTTPCompletion completion) override {
+        if (!threads_.start(
+                [this, request, completion] { completion(replyTo(request, settings_)); })) {
+            completion(failedReply(kTransferFailed, "no thread for the request"));
+        }
+    }
+
+  private:
+    RemoteHTTPSettings settings_;
+    /// Last, because its threads use the rest until they end.
+    RequestThreads threads_;
+};
+
+} // namespace
 
 std::unique_ptr<HTTPSession>
 RemoteHTTPSessions::makeEphemeral(const std::map<std::string, std::string>& headers,

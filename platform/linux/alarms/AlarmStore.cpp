@@ -3,6 +3,7 @@
 #include "base/Concat.h"
 #include "base/FileDescriptor.h"
 #include "platform/MessageClasses.h"
+#include "platform/linux/Paths.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -29,8 +30,7 @@ constexpr std::size_t kMaxNameLength = 200;
 
 /// Whether a name can be that of a file in a directory.
 bool isFileName(std::string_view name) {
-    return !name.empty() && name.size() <= kMaxNameLength && name != "." && name != ".." &&
-           name.find('/') == std::string_view::npos && name.find('\0') == std::string_view::npos;
+    return name.size() <= kMaxNameLength && isPlainFileName(name);
 }
 
 std::string lineFor(Date date) {

@@ -1,7 +1,7 @@
 #include "platform/linux/alarms/LinuxAlarm.h"
 
 #include "base/ByteReader.h"
-#include "platform/linux/RealTime.h"
+#include "platform/linux/LinuxClock.h"
 
 namespace platform {
 

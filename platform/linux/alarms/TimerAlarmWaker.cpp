@@ -1,8 +1,52 @@
 #include "platform/linux/alarms/TimerAlarmWaker.h"
 
+#include <algorithm>
+#include <cerrno>
+#include <cstdint>
+#include <sys/timerfd.h>
+#include <system_error>
+#include <unistd.h>
 #include <utility>
 
 namespace platform {
+
+namespace {
+
+int makeTimer() {
+    const int waking = ::timerfd_create(CLOCK_REALTIME_ALARM, TFD_CLOEXEC | TFD_NONBLOCK);
+    return waking >= 0 ? waking : ::timerfd_create(CLOCK_REALTIME, TFD_CLOEXEC | TFD_NONBLOCK);
+}
+
+} // namespace
+
+RealTimeTimer::RealTimeTimer() : descriptor_(makeTimer()) {
+    if (!descriptor_.isOpen()) {
+        throw std::system_error(errno, std::generic_category(), "the timer");
+    }
+}
+
+void RealTimeTimer::arm(Date date) {
+    // A time of 0 would disarm the timer.
+    const std::int64_t nanoseconds = std::max<std::int64_t>(date.nanosecondsSince1970, 1);
+    itimerspec time{};
+    time.it_value.tv_sec = nanoseconds / kNanosecondsPerSecond;
+    time.it_value.tv_nsec = nanoseconds % kNanosecondsPerSecond;
+    ::timerfd_settime(descriptor_.get(), TFD_TIMER_ABSTIME | TFD_TIMER_CANCEL_ON_SET, &time,
+                      nullptr);
+}
+
+void RealTimeTimer::disarm() {
+    const itimerspec never{};
+    ::timerfd_settime(descriptor_.get(), 0, &never, nullptr);
+}
+
+RealTimeTimer::Wake RealTimeTimer::acknowledge() {
+    std::uint64_t expirations = 0;
+    if (::read(descriptor_.get(), &expirations, sizeof expirations) >= 0) {
+        return Wake::due;
+    }
+    return errno == ECANCELED ? Wake::clockWasSet : Wake::nothing;
+}
 
 TimerAlarmWaker::TimerAlarmWaker(LinuxRunLoop& loop, Woke woke)
     : woke_(std::move(woke)),

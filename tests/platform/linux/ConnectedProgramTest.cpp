@@ -1,6 +1,5 @@
-#include "platform/linux/ConnectedProgram.h"
-
 #include "base/Concat.h"
+#include "platform/linux/HTTPSClient.h"
 #include "tests/platform/linux/OpenDescriptors.h"
 #include "tests/support/EnvironmentVariable.h"
 

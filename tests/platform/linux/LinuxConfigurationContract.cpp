@@ -1,9 +1,7 @@
 #include "platform/fake/FakeSystemLog.h"
 #include "platform/formats/PropertyListCodec.h"
-#include "platform/linux/LinuxConfigurationResource.h"
-#include "platform/linux/LinuxInternalDiagnostics.h"
+#include "platform/linux/LinuxConfiguration.h"
 #include "platform/linux/LinuxSystemVersion.h"
-#include "platform/linux/LinuxUserDefaults.h"
 #include "tests/platform/contract/ConfigurationContract.h"
 #include "tests/platform/linux/RootDirectory.h"
 

@@ -1,10 +1,9 @@
 // User defaults, configuration resources and internal diagnostics as files.
 
+#include "platform/linux/LinuxConfiguration.h"
+
 #include "platform/fake/FakeSystemLog.h"
 #include "platform/formats/PropertyListCodec.h"
-#include "platform/linux/LinuxConfigurationResource.h"
-#include "platform/linux/LinuxInternalDiagnostics.h"
-#include "platform/linux/LinuxUserDefaults.h"
 #include "tests/platform/linux/OpenDescriptors.h"
 #include "tests/platform/linux/RootDirectory.h"
 

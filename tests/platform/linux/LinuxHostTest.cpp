@@ -5,7 +5,7 @@
 #include "platform/MainRunLoop.h"
 #include "platform/ProcessTransaction.h"
 #include "platform/linux/EventSocket.h"
-#include "platform/linux/RealTime.h"
+#include "platform/linux/LinuxClock.h"
 #include "tests/platform/linux/RootDirectory.h"
 #include "tests/platform/linux/StandardErrorCapture.h"
 #include "tests/platform/linux/alarms/FakeAlarmHelper.h"

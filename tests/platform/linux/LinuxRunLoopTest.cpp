@@ -1,7 +1,7 @@
 #include "platform/linux/LinuxRunLoop.h"
 
 #include "platform/fake/FakeSystemLog.h"
-#include "platform/linux/RealTime.h"
+#include "platform/linux/LinuxClock.h"
 
 #include <gtest/gtest.h>
 

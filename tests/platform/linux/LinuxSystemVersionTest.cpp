@@ -1,6 +1,5 @@
 #include "platform/linux/LinuxSystemVersion.h"
 
-#include "platform/linux/OsReleaseText.h"
 #include "tests/platform/linux/RootDirectory.h"
 
 #include <gtest/gtest.h>

@@ -1,4 +1,4 @@
-#include "platform/linux/ManagedSettingsText.h"
+#include "platform/linux/LinuxManagedSettings.h"
 
 #include <gtest/gtest.h>
 

@@ -1,7 +1,7 @@
 #include "platform/linux/SettingsWatch.h"
 
 #include "platform/fake/FakeSystemLog.h"
-#include "platform/linux/RealTime.h"
+#include "platform/linux/LinuxClock.h"
 #include "tests/support/TemporaryDirectory.h"
 
 #include <gmock/gmock.h>

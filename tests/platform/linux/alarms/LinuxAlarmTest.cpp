@@ -1,7 +1,7 @@
 #include "platform/linux/alarms/LinuxAlarm.h"
 
 #include "platform/fake/FakeSystemLog.h"
-#include "platform/linux/RealTime.h"
+#include "platform/linux/LinuxClock.h"
 #include "platform/linux/alarms/TimerAlarmWaker.h"
 #include "tests/platform/linux/alarms/FakeAlarmWaker.h"
 #include "tests/support/TemporaryDirectory.h"
