@@ -4,6 +4,7 @@
 #include "platform/InternalDiagnostics.h"
 #include "platform/ManagedSettings.h"
 #include "platform/SystemVersion.h"
+#include "platform/UserDefaults.h"
 
 #include <cstddef>
 #include <functional>
@@ -11,9 +12,24 @@
 #include <optional>
 #include <set>
 #include <string>
+#include <string_view>
 #include <utility>
 
 namespace platform {
+
+/// User defaults that a test sets, before anybody on another thread reads them.
+class FakeUserDefaults final : public UserDefaults {
+  public:
+    FakeUserDefaults();
+    ~FakeUserDefaults() override;
+
+    [[nodiscard]] ValueMap load(std::string_view domain) override;
+    void set(std::string_view domain, std::string_view key, Value value);
+    void remove(std::string_view domain, std::string_view key);
+
+  private:
+    std::map<std::string, ValueMap, std::less<>> domains_;
+};
 
 /// Configuration resources that a test puts, before anybody on another thread loads them.
 class FakeConfigurationResource final : public ConfigurationResource {

@@ -1,10 +1,8 @@
 #pragma once
 
 #include "platform/Host.h"
-#include "platform/fake/FakeAlarmStore.h"
 #include "platform/fake/FakeClock.h"
 #include "platform/fake/FakeConfiguration.h"
-#include "platform/fake/FakeDisk.h"
 #include "platform/fake/FakeEventHost.h"
 #include "platform/fake/FakeFiles.h"
 #include "platform/fake/FakeFormats.h"
@@ -12,7 +10,6 @@
 #include "platform/fake/FakeKernel.h"
 #include "platform/fake/FakeSerialQueues.h"
 #include "platform/fake/FakeSystemLog.h"
-#include "platform/fake/FakeUserDefaults.h"
 
 #include <string>
 

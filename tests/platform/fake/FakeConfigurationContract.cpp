@@ -1,5 +1,4 @@
 #include "platform/fake/FakeConfiguration.h"
-#include "platform/fake/FakeUserDefaults.h"
 #include "tests/platform/contract/ConfigurationContract.h"
 
 namespace contract {

@@ -1,4 +1,3 @@
-#include "platform/fake/FakeDisk.h"
 #include "platform/fake/FakeFiles.h"
 #include "tests/platform/contract/FilesContract.h"
 
