@@ -52,6 +52,7 @@ static void takeAnswer(void* captured, bool policySatisfied, const KSTRequiremen
     }
 }
 
+// Who interrupts the program while it is off has it off in the terminal: stty sane.
 static void setEcho(bool isOn) {
     struct termios terminal;
     if (tcgetattr(STDIN_FILENO, &terminal) == 0) {
@@ -62,12 +63,12 @@ static void setEcho(bool isOn) {
 
 static KSTStatus addPassphrase(KSTContextRef context, KSTPassphrasePurpose purpose) {
     const uint32_t user = getuid();
-    char text[128];
+    char text[128 + 1]; // one more than there may be, so that more is refused
     size_t length = 0;
     KSTCredential* made = NULL;
     printf("adding a passphrase for purpose %" PRIu32 "\n", purpose);
-    fputs("passphrase: ", stderr);
     setEcho(false);
+    fputs("passphrase: ", stderr);
     // Byte by byte: a buffer of the C library's would keep a copy that nobody wipes.
     while (length < sizeof text && read(STDIN_FILENO, text + length, 1) == 1 &&
            text[length] != '\n') {
