@@ -18,30 +18,29 @@ typedef struct Answer {
     uint64_t missing; // differs when something else is missing; 0 when nothing is
     int depth;
     KSTPassphrasePurpose purposes[8];
-    size_t purposesCount;
+    size_t count;
 } Answer;
 
-static void takeMissing(void* captured, const KSTRequirement* requirement) {
+static void takeMissing(void* captured, const KSTRequirement* node) {
     Answer* answer = captured;
-    const uint32_t type = KSTRequirementGetType(requirement);
-    const uint32_t state = KSTRequirementGetState(requirement);
+    const uint32_t type = KSTRequirementGetType(node);
+    const uint32_t state = KSTRequirementGetState(node);
     const void* data = NULL;
     size_t length = 0;
     KSTPassphrasePurpose purpose = kKSTPassphrasePurposeAny;
     printf("%*s%s%s", 2 * ++answer->depth, "", KSTRequirementTypeText(type),
            state == kKSTRequirementStateTooOld ? " (too old)" : "");
     if (type == kKSTRequirementTypePassphraseEntered &&
-        KSTRequirementGetPropertyData(requirement, kKSTRequirementPropertyPurpose, &data,
-                                      &length) == kKSTErrorSuccess) {
+        KSTRequirementGetPropertyData(node, kKSTRequirementPropertyPurpose, &data, &length) == 0) {
         memcpy(&purpose, data, sizeof purpose);
         printf(" for purpose %" PRIu32, purpose);
-        if (answer->purposesCount < 8) {
-            answer->purposes[answer->purposesCount++] = purpose;
+        if (answer->count < 8) {
+            answer->purposes[answer->count++] = purpose;
         }
     }
     putchar('\n');
     answer->missing = answer->missing * 31 + type * 7 + state + purpose + 1;
-    KSTRequirementGetSubrequirements(requirement, (KSTRequirementBlock){takeMissing, answer});
+    KSTRequirementGetSubrequirements(node, (KSTRequirementBlock){takeMissing, answer});
     --answer->depth;
 }
 
@@ -64,15 +63,14 @@ static void setEcho(bool isOn) {
 static KSTStatus addPassphrase(KSTContextRef context, KSTPassphrasePurpose purpose) {
     const uint32_t user = getuid();
     char text[128 + 1]; // one more than there may be, so that more is refused
-    size_t length = 0;
+    size_t size = 0;
     KSTCredential* made = NULL;
     printf("adding a passphrase for purpose %" PRIu32 "\n", purpose);
     setEcho(false);
     fputs("passphrase: ", stderr);
     // Byte by byte: a buffer of the C library's would keep a copy that nobody wipes.
-    while (length < sizeof text && read(STDIN_FILENO, text + length, 1) == 1 &&
-           text[length] != '\n') {
-        ++length;
+    while (size < sizeof text && read(0, text + size, 1) == 1 && text[size] != '\n') {
+        ++size;
     }
     setEcho(true);
     fputc('\n', stderr);
@@ -80,8 +78,7 @@ static KSTStatus addPassphrase(KSTContextRef context, KSTPassphrasePurpose purpo
     if (err == 0 &&
         (err = KSTCredentialSetProperty(made, kKSTCredentialPropertyUserId, &user, 4)) == 0 &&
         (err = KSTCredentialSetProperty(made, kKSTCredentialPropertyPurpose, &purpose, 4)) == 0 &&
-        (err = KSTCredentialSetProperty(made, kKSTCredentialPropertyPassphrase, text, length)) ==
-            0) {
+        (err = KSTCredentialSetProperty(made, kKSTCredentialPropertyPassphrase, text, size)) == 0) {
         err = KSTContextAddCredential(context, made);
     }
     explicit_bzero(text, sizeof text);
@@ -96,25 +93,24 @@ int main(int argc, char** argv) {
     }
     KSTContextRef context = NULL;
     Answer answer = {0};
-    uint64_t missingBefore = 0;
+    uint64_t before = 0;
     KSTStatus err = KSTContextCreate(&context);
     do {
-        for (size_t i = 0; err == kKSTErrorSuccess && i < answer.purposesCount; ++i) {
+        for (size_t i = 0; err == 0 && i < answer.count; ++i) {
             err = addPassphrase(context, answer.purposes[i]);
         }
-        missingBefore = answer.missing;
+        before = answer.missing;
         answer = (Answer){0};
-        if (err == kKSTErrorSuccess) {
+        if (err == 0) {
             printf("asking about the policy %s\n", argv[1]);
             err = KSTContextVerifyPolicy(context, argv[1], (KSTPolicyBlock){takeAnswer, &answer});
         }
-    } while (err == kKSTErrorSuccess && answer.purposesCount > 0 &&
-             answer.missing != missingBefore);
+    } while (err == 0 && answer.count > 0 && answer.missing != before);
     if (context != NULL && KSTContextDelete(context, true) != kKSTErrorSuccess) {
         (void)KSTContextDelete(context, false);
     }
-    if (err != kKSTErrorSuccess) {
+    if (err != 0) {
         fprintf(stderr, "verify_policy: %s (%" PRId32 ")\n", KSTStatusText(err), err);
     }
-    return err == kKSTErrorSuccess && answer.missing == 0 ? 0 : 1;
+    return err == 0 && answer.missing == 0 ? 0 : 1;
 }
