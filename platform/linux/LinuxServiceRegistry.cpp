@@ -41,7 +41,7 @@ ServiceHandle LinuxServiceRegistry::findByClassName(std::string_view name) {
     return found.path || isWithheld(found.outcome) ? hold(found.path, found.outcome) : kNoService;
 }
 
-bool LinuxServiceRegistry::isWithheld(Outcome outcome) const {
+bool LinuxServiceRegistry::isWithheld(Outcome outcome) {
     return outcome != kSuccess && outcome != kNoEntry && outcome != statusFromErrno(ENOENT) &&
            outcome != statusFromErrno(ENOTDIR);
 }
