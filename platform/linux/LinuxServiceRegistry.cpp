@@ -151,9 +151,9 @@ void LinuxServiceRegistry::setDeadline(std::optional<Deadline> deadline) noexcep
 }
 
 const LinuxServiceRegistry::Entry* LinuxServiceRegistry::find(ServiceHandle entry) const {
-    const auto held = std::find_if(entries_.begin(), entries_.end(), [entry](const auto& place) {
-        return place && place->handle == entry;
-    });
+    const auto* const held =
+        std::find_if(entries_.begin(), entries_.end(),
+                     [entry](const auto& place) { return place && place->handle == entry; });
     return held == entries_.end() ? nullptr : &**held;
 }
 
