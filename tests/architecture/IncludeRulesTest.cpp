@@ -36,6 +36,7 @@ const std::vector<std::string> kRooms = {"platform/formats",
                                          "keystrand",
                                          "keystrand-sim",
                                          "keystrand-linux",
+                                         "keystrand-sessions",
                                          "kstd-https",
                                          "kstd-notify",
                                          "kstctl",
@@ -201,6 +202,7 @@ TEST(IncludeRulesTest, RulesRefuseWhatTheyShould) {
     EXPECT_FALSE(isAllowed({"kstd/Daemon.cpp", "platform/fake/FakeHost.h"}));
     EXPECT_FALSE(isAllowed({"keystrand-sim/main.cpp", "kstd/Daemon.h"}));
     EXPECT_FALSE(isAllowed({"keystrand/RequestHandler.cpp", "keystrand-sim/FaultScript.h"}));
+    EXPECT_FALSE(isAllowed({"keystrand-sessions/SessionsWatch.cpp", "keystrand-linux/UsbBus.h"}));
     EXPECT_FALSE(isAllowed({"common/LibCall.cpp", "KSTLib/Channel.h"}));
     EXPECT_FALSE(isAllowed({"KSTLib/KSTLib.h", "KSTLib/Channel.h"}));
     EXPECT_FALSE(isAllowed({"KSTLib/KSTLib.h", "common/Allocation.h"}));
