@@ -65,6 +65,9 @@ class FakeUsbBus : public UsbBus {
     [[nodiscard]] bool isAuthorized(const std::string& port) const;
     [[nodiscard]] Attachment attachmentAt(const std::string& port) const;
     [[nodiscard]] AuthorizedDefault rootHubDefault(std::uint32_t bus) const;
+    [[nodiscard]] const std::vector<std::uint8_t>& descriptorsAt(const std::string& port) const {
+        return plugs_.at(port).descriptors;
+    }
     [[nodiscard]] AuthorizedDefault parameter() const { return parameter_; }
     /// "parameter=2", "usb1=2", "1-1=0", in the order in which they were written.
     [[nodiscard]] const std::vector<std::string>& writes() const { return writes_; }

@@ -1,0 +1,48 @@
+#pragma once
+
+#include "base/FileDescriptor.h"
+
+#include <cstddef>
+#include <fcntl.h>
+#include <string>
+#include <string_view>
+#include <sys/stat.h>
+
+namespace keystrand::usb {
+
+/// More than any text that sysfs shows.
+inline constexpr std::size_t kAttributeLimit = 4096;
+
+/// What reading a file from its beginning to its end gave. The size that a file of the kernel's
+/// pretends to have is not asked for.
+struct SmallFile {
+    /// The error's number, EFBIG for what is larger than the limit; 0 when it was read.
+    int error = 0;
+    /// Empty after an error.
+    std::string bytes;
+    /// Owner, mode and so on of the very file that was read. Only without an error.
+    struct stat status {};
+
+    [[nodiscard]] bool isRead() const { return error == 0; }
+};
+
+/// The file at `path`, which is taken from that open directory unless it is absolute. Never waits,
+/// whatever stands there.
+[[nodiscard]] SmallFile readSmallFile(int directory, const std::string& path, std::size_t limit);
+[[nodiscard]] inline SmallFile readSmallFile(const std::string& path, std::size_t limit) {
+    return readSmallFile(AT_FDCWD, path, limit);
+}
+
+/// Writes the text with one call into a file that is there already. The error's number, or 0.
+[[nodiscard]] int writeAttribute(int directory, const char* name, std::string_view text);
+
+/// Not open, with errno set, when there is none.
+[[nodiscard]] base::FileDescriptor openDirectory(const std::string& path);
+
+/// What a number of errno means to people.
+[[nodiscard]] std::string errorText(int error);
+
+/// Without the end of a line, and blanks, at either end.
+[[nodiscard]] std::string_view trimmed(std::string_view text);
+
+} // namespace keystrand::usb
