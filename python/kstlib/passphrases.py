@@ -3,6 +3,7 @@
 from __future__ import annotations
 
 import os
+import select
 import termios
 from contextlib import contextmanager
 from ctypes import c_char
@@ -70,7 +71,7 @@ class Passphrase:
     def _read_line(self, source: int) -> bool:
         """Reads up to the end of a line; whether there was one, or at least something before the end."""
         room = memoryview(self._bytes)
-        while os.readv(source, [room[self._length : self._length + 1]]):
+        while _await(source) and os.readv(source, [room[self._length : self._length + 1]]):
             if self._bytes[self._length] == _NEWLINE:
                 self._bytes[self._length] = 0
                 return True
@@ -80,6 +81,16 @@ class Passphrase:
                 raise ValueError(f"a passphrase has at most {PASSPHRASE_MAX_LENGTH} bytes")
             self._length += 1
         return self._length > 0
+
+
+def _await(source: int) -> bool:
+    """Waits until there is something to read. Python sees an interrupt that comes right before a system call only
+    after it, so none of them waits for ever."""
+    poll = select.poll()
+    poll.register(source, select.POLLIN)
+    while not poll.poll(500):
+        pass
+    return True
 
 
 @contextmanager
