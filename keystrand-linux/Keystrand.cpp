@@ -89,6 +89,7 @@ void Keystrand::said(LockState::Said said) {
         wakeUp();
         break;
     case LockState::Said::away:
+        // Whoever listens has told it.
         parts_.log.write(
             GateLine::listenerAway,
             base::concat("keystrand: nobody tells whether the machine is locked; it counts as ",

@@ -3,6 +3,8 @@
 #include "base/Concat.h"
 #include "base/Digits.h"
 
+#include <algorithm>
+#include <span>
 #include <utility>
 
 namespace keystrand::usb {
@@ -14,6 +16,9 @@ using Kind = GateAction::Kind;
 /// Enough for hubs within hubs within hubs; more is a bus that never comes to rest, which is looked
 /// at again with its next event.
 constexpr int kMostRounds = 64;
+
+/// More than fit into a line nobody wants to read.
+constexpr std::size_t kMostClasses = 50;
 
 std::string hexOfTwoBytes(std::uint16_t number) {
     const std::uint8_t bytes[] = {static_cast<std::uint8_t>(number >> 8U),
@@ -31,18 +36,6 @@ std::string quoted(const std::string& text) {
     return quoted + '"';
 }
 
-std::string classesOf(const UsbFunctions& functions) {
-    std::string text;
-    for (const UsbClass& each : functions.classes) {
-        const std::uint8_t bytes[] = {each.number, each.subclass, each.protocol};
-        const std::span all(bytes);
-        text += base::concat(text.empty() ? "" : " ", base::hexDigits(all.subspan(0, 1)), '/',
-                             base::hexDigits(all.subspan(1, 1)), '/',
-                             base::hexDigits(all.subspan(2, 1)));
-    }
-    return text;
-}
-
 std::string_view reasonFor(Standing standing) {
     switch (standing) {
     case Standing::keyboard:
@@ -58,6 +51,18 @@ std::string_view reasonFor(Standing standing) {
 
 } // namespace
 
+std::string classesOf(const UsbFunctions& functions, char between) {
+    std::string text;
+    const std::size_t count = std::min(functions.classes.size(), kMostClasses);
+    for (const UsbClass& each : std::span(functions.classes).first(count)) {
+        text += base::concat(text.empty() ? std::string() : std::string(1, between),
+                             base::hexDigits({&each.number, 1}), '/',
+                             base::hexDigits({&each.subclass, 1}), '/',
+                             base::hexDigits({&each.protocol, 1}));
+    }
+    return text;
+}
+
 std::string describe(const UsbDevice& device) {
     std::string text = base::concat(device.port(), " (", hexOfTwoBytes(device.vendor), ':',
                                     hexOfTwoBytes(device.product), ' ', quoted(device.manufacturer),
@@ -66,7 +71,7 @@ std::string describe(const UsbDevice& device) {
         text += base::concat(", serial ", quoted(device.serial));
     }
     return text + (device.functions.understood
-                       ? base::concat(", classes ", classesOf(device.functions), ')')
+                       ? base::concat(", classes ", classesOf(device.functions, ' '), ')')
                        : std::string(", unknown)"));
 }
 

@@ -95,6 +95,9 @@ class UsbGate {
     bool settling_ = false;
 };
 
+/// "08/06/50", one after the other, at most fifty.
+[[nodiscard]] std::string classesOf(const UsbFunctions& functions, char between);
+
 /// "1-2.3 (0781:5567 \"Maker\" \"Name\", serial \"123\", classes 08/06/50)", with every byte that
 /// is not printable ASCII, and each quote and backslash, as \xNN.
 [[nodiscard]] std::string describe(const UsbDevice& device);

@@ -16,6 +16,10 @@ inline constexpr char kKernelDirectory[] = "/run/keystrand";
 inline constexpr char kKernelSocket[] = "/run/keystrand/service.sock";
 /// Of the simulator alone.
 inline constexpr char kSimulatorControlSocket[] = "/run/keystrand/control.sock";
+/// Of the one that guards a machine's ports: what an administrator asks, and what
+/// `keystrand-sessions` says.
+inline constexpr char kGateSocket[] = "/run/keystrand/gate.sock";
+inline constexpr char kSessionsSocket[] = "/run/keystrand/sessions.sock";
 
 /// The daemon's.
 inline constexpr char kDaemonDirectory[] = "/run/kstd";
