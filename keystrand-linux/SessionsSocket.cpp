@@ -93,10 +93,6 @@ void SessionsSocket::hear(std::string_view word) {
         return;
     }
     switch (*said) {
-    case Said::locked:
-    case Said::unlocked:
-        isLocked_ = *said == Said::locked;
-        break;
     case Said::goingToSleep:
         isAsleep_ = true;
         isAnswerDue_ = true;
@@ -107,6 +103,8 @@ void SessionsSocket::hear(std::string_view word) {
             return;
         }
         break;
+    case Said::locked:
+    case Said::unlocked:
     case Said::away:
         break;
     }
@@ -125,16 +123,13 @@ void SessionsSocket::hangUp(std::string_view why) {
     connection_.reset();
     isAnswerDue_ = false;
     patience_->startFor(kPatience);
-    log_(base::concat("keystrand: keystrand-sessions ", why, "; the machine stays ",
-                      isLocked_ ? "locked" : "unlocked until it is back, for a minute at the most",
-                      "."));
+    log_(base::concat("keystrand: keystrand-sessions ", why, "."));
     say(Said::away);
 }
 
 void SessionsSocket::giveUp() {
     log_("keystrand: nothing was heard of keystrand-sessions for a minute; the machine counts as "
          "locked.");
-    isLocked_ = true;
     say(Said::locked);
 }
 

@@ -54,7 +54,6 @@ class SessionsSocket : public LockState {
     EventLoop& loop_;
     Log log_;
     Listener listener_;
-    bool isLocked_ = true;
     /// Whether `goingToSleep` was said, and not `awake`.
     bool isAsleep_ = false;
     bool isAnswerDue_ = false;

@@ -86,8 +86,7 @@ void SessionsWatch::goToSleep() {
 void SessionsWatch::wake() {
     answerPatience_->stop();
     logind_.delaySleep();
-    keystrand_.say(Word::awake);
-    sayState();
+    sayAll();
 }
 
 void SessionsWatch::letSleep() {

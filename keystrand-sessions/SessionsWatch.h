@@ -18,9 +18,10 @@ namespace keystrand::sessions {
 ///
 /// Each connection is first told the state, as soon as that is known, and then whether the machine
 /// goes to sleep or is awake; after that, what changes, also on the way to sleep. After waking it
-/// is told that, and then the state. Sleep is delayed until keystrand has answered, for four
-/// seconds at the most, and not at all while there is no connection. While logind is away the state
-/// stays, and after a minute it is "locked".
+/// is told the state and that the machine is awake, in this order: who acts on the second knows the
+/// first. Sleep is delayed until keystrand has answered, for four seconds at the most, and not at
+/// all while there is no connection. While logind is away the state stays, and after a minute it is
+/// "locked".
 class SessionsWatch : private LogindListener {
   public:
     static constexpr std::chrono::minutes kPatienceWithLogind{1};

@@ -176,7 +176,7 @@ TEST_F(SessionsWatchTest, SleepWaitsForTheAnswer) {
     EXPECT_FALSE(logind_.isSleepDelayed());
     EXPECT_EQ(timers_.running(), 0U);
     prepareForSleep(false);
-    EXPECT_EQ(link_.said(), (Words{Word::awake, Word::unlocked}));
+    EXPECT_EQ(link_.said(), (Words{Word::unlocked, Word::awake}));
     EXPECT_TRUE(logind_.isSleepDelayed()) << "the next time, too";
     EXPECT_EQ(lines(), Lines{});
 }
@@ -202,14 +202,14 @@ TEST_F(SessionsWatchTest, WhatHappensOnTheWayToSleepIsTold) {
     EXPECT_EQ(link_.said(), (Words{Word::goingToSleep, Word::locked}));
     link_.answerClosed();
     prepareForSleep(false);
-    EXPECT_EQ(link_.said(), (Words{Word::awake, Word::locked}));
+    EXPECT_EQ(link_.said(), (Words{Word::locked, Word::awake}));
 }
 
 TEST_F(SessionsWatchTest, SleepThatWasCalledOffIsWaking) {
     startUnlocked();
     prepareForSleep(true);
     prepareForSleep(false);
-    EXPECT_EQ(link_.said(), (Words{Word::goingToSleep, Word::awake, Word::unlocked}));
+    EXPECT_EQ(link_.said(), (Words{Word::goingToSleep, Word::unlocked, Word::awake}));
     timers_.pass(minutes(1));
     EXPECT_TRUE(logind_.isSleepDelayed());
     EXPECT_EQ(lines(), Lines{});
@@ -226,7 +226,7 @@ TEST_F(SessionsWatchTest, SleepDoesNotWaitForNobody) {
     EXPECT_EQ(link_.said(), (Words{Word::unlocked, Word::goingToSleep}));
     link_.answerClosed();
     prepareForSleep(false);
-    EXPECT_EQ(link_.said(), (Words{Word::awake, Word::unlocked}));
+    EXPECT_EQ(link_.said(), (Words{Word::unlocked, Word::awake}));
     EXPECT_TRUE(logind_.isSleepDelayed());
 }
 
@@ -252,7 +252,7 @@ TEST_F(SessionsWatchTest, LogindThatIsFoundOnTheWayToSleepIsToldOf) {
     EXPECT_EQ(link_.said(), (Words{Word::locked, Word::goingToSleep}));
     logind_.startLogind(1000);
     logind_.happen();
-    EXPECT_EQ(link_.said(), (Words{Word::awake, Word::locked})) << "the new one knows of no sleep";
+    EXPECT_EQ(link_.said(), (Words{Word::locked, Word::awake})) << "the new one knows of no sleep";
 }
 
 } // namespace
