@@ -71,6 +71,7 @@ struct BusMachine::Calls {
 
     static int inhibit(sd_bus_message* call, void* data, sd_bus_error* error) {
         BusMachine& self = machine(data);
+        ++self.delaysAsked_;
         const char* what = nullptr;
         const char* who = nullptr;
         const char* why = nullptr;

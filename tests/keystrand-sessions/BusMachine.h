@@ -48,7 +48,10 @@ class BusMachine : public LogindMachine {
     void pretend(const Session& session);
 
     [[nodiscard]] const std::vector<std::string>& lines() const { return lines_; }
+    /// How often a session was asked for, and a delay of sleep: each is answered before anything
+    /// that happens from then on is told.
     [[nodiscard]] unsigned questions() const { return questions_; }
+    [[nodiscard]] unsigned delaysAsked() const { return delaysAsked_; }
     FakeTimers timers;
 
   private:
@@ -69,6 +72,7 @@ class BusMachine : public LogindMachine {
     bool isRefused_ = false;
     bool isFailing_ = false;
     unsigned questions_ = 0;
+    unsigned delaysAsked_ = 0;
     base::FileDescriptor delay_;
 };
 

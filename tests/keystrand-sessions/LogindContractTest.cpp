@@ -293,6 +293,7 @@ TEST_F(BusLogindTest, RefusedDelayIsALineOnce) {
     machine_.logind().delaySleep();
     EXPECT_TRUE(machine_.happenUntil([&] { return !machine_.lines().empty(); }));
     machine_.logind().delaySleep();
+    EXPECT_TRUE(machine_.happenUntil([&] { return machine_.delaysAsked() == 2; }));
     awaitEnd();
     EXPECT_EQ(machine_.lines(),
               Told{"sleep cannot be delayed until USB is closed: Permission denied"});
@@ -305,8 +306,8 @@ TEST_F(BusLogindTest, DelayThatComesWhenNobodyWantsItIsLetGo) {
     startWithOne();
     machine_.logind().delaySleep();
     machine_.logind().letSleep();
-    awaitEnd();
-    EXPECT_FALSE(machine_.isSleepDelayed());
+    EXPECT_TRUE(machine_.happenUntil([&] { return machine_.delaysAsked() == 1; }));
+    EXPECT_TRUE(machine_.happenUntil([&] { return !machine_.isSleepDelayed(); }));
 }
 
 TEST_F(BusLogindTest, LogindThatDoesNotAnswerIsAskedAgain) {
