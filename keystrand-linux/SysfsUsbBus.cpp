@@ -210,7 +210,9 @@ std::optional<UsbDevice> SysfsUsbBus::readDevice(const std::string& name) const 
                      .serial = attribute(fd, "serial").value_or(""),
                      .descriptorsHash = hashOfDescriptors(bytes),
                      .functions = readDescriptors(bytes),
-                     .hardWired = attribute(fd, "removable") == "fixed"};
+                     // What the kernel itself goes by. "removable" also says what the hub above
+                     // says about its ports, and that may be anybody's.
+                     .hardWired = attribute(fd, "port/connect_type") == "hardwired"};
     // Last, because they are gone with the device: what was read before them was the device's.
     const auto number = numberAttribute<std::uint32_t>(fd, "devnum");
     const auto authorized = numberAttribute<int>(fd, kAuthorized);

@@ -46,6 +46,15 @@ std::string hubAbove(const std::string& port) {
     return point == std::string::npos ? base::concat("usb", busOf(port)) : port.substr(0, point);
 }
 
+/// Where a hub's directory holds the port.
+fs::path portOf(const std::string& port) {
+    const std::string hub = hubAbove(port);
+    const std::string interface =
+        hub.starts_with("usb") ? base::concat(busOf(port), "-0:1.0") : hub + ":1.0";
+    return fs::path(interface) /
+           base::concat(hub, "-port", port.substr(port.find_last_of("-.") + 1));
+}
+
 } // namespace
 
 FakeSysfs::FakeSysfs(fs::path root) : root_(std::move(root)) {
@@ -125,7 +134,13 @@ void FakeSysfs::addDevice(const UsbDevice& device) {
     putLine(directory / "devnum", std::to_string(device.attachment.number));
     putLine(directory / "idVendor", hexOf(device.vendor));
     putLine(directory / "idProduct", hexOf(device.product));
-    putLine(directory / "removable", device.hardWired ? "fixed" : "unknown");
+    // A hub may call its ports what it likes; only the firmware's word is in "connect_type".
+    putLine(directory / "removable", "fixed");
+    const fs::path port = portOf(device.port());
+    fs::create_directories(directory.parent_path() / port);
+    putLine(directory.parent_path() / port / "connect_type",
+            device.hardWired ? "hardwired" : "unknown");
+    fs::create_directory_symlink(".." / port, directory / "port");
     putLine(directory / "manufacturer", device.manufacturer);
     putLine(directory / "product", device.name);
     if (!device.serial.empty()) {

@@ -79,7 +79,7 @@ TEST_F(SysfsUsbBusTest, OnlyDevicesAreDevices) {
 
 TEST_F(SysfsUsbBusTest, WhatADeviceDoesNotSayIsEmpty) {
     machine.plug("1-1", aMouse());
-    for (const char* name : {"manufacturer", "product", "idVendor", "idProduct", "removable"}) {
+    for (const char* name : {"manufacturer", "product", "idVendor", "idProduct", "port"}) {
         fs::remove(at("1-1", name));
     }
     const UsbDevice device = only();

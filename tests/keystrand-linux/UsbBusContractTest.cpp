@@ -150,6 +150,17 @@ TEST_P(UsbBusContract, DeviceAsItDescribesItself) {
     EXPECT_EQ(view.find(device.attachment), &device);
 }
 
+TEST_P(UsbBusContract, OnlyTheFirmwareSaysThatAPortIsInside) {
+    Plug inside = aMouse();
+    inside.hardWired = true;
+    machine.plug("1-1", aHub());
+    machine.plug("1-1.1", inside);
+    machine.plug("1-1.2", aMouse());
+    EXPECT_FALSE(deviceAt("1-1").hardWired);
+    EXPECT_TRUE(deviceAt("1-1.1").hardWired);
+    EXPECT_FALSE(deviceAt("1-1.2").hardWired);
+}
+
 TEST_P(UsbBusContract, HubBeforeWhatIsBehindIt) {
     machine.plug("1-10", aHub());
     machine.plug("1-1", aHub());
