@@ -70,6 +70,8 @@ class UsbGate {
     };
     [[nodiscard]] std::vector<Listed> list();
     [[nodiscard]] bool closed() const { return policy_.closed(); }
+    /// Nothing that this service wrote is left to be put back.
+    [[nodiscard]] bool isOpen() const { return policy_.state().phase == GateState::Phase::open; }
 
   private:
     [[nodiscard]] std::optional<BusView> lookAtBus();

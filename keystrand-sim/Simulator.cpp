@@ -1,41 +1,17 @@
 #include "keystrand-sim/Simulator.h"
 
-#include "base/Concat.h"
 #include "wire/SystemPaths.h"
 
-#include <cerrno>
 #include <csignal>
 #include <ctime>
 #include <sys/socket.h>
-#include <sys/stat.h>
-#include <system_error>
 #include <utility>
 
 namespace keystrand::sim {
 
 namespace {
 
-constexpr mode_t kDirectoryMode = 0755;
 constexpr std::uint64_t kMicrosecondsPerSecond = 1'000'000;
-
-/// Makes the directory with exactly that mode; one that is there is left as it is.
-bool makeDirectory(const std::string& path, std::string& error) {
-    const bool made = ::mkdir(path.c_str(), kDirectoryMode) == 0;
-    if (made ? ::chmod(path.c_str(), kDirectoryMode) == 0 : errno == EEXIST) {
-        return true;
-    }
-    error =
-        base::concat(path, ": cannot make the directory: ", std::generic_category().message(errno));
-    return false;
-}
-
-std::optional<ListeningSocket> serviceSocket(base::FileDescriptor activated,
-                                             const std::string& path, std::string& error) {
-    if (activated.isOpen()) {
-        return ListeningSocket::adopt(std::move(activated));
-    }
-    return ListeningSocket::open(path, SOCK_SEQPACKET, error);
-}
 
 } // namespace
 
@@ -48,23 +24,17 @@ std::unique_ptr<Simulator> Simulator::create(const Settings& settings,
             return nullptr;
         }
     }
-    const auto path = [&](const char* name) {
-        return wire::underRoot(settings.root, name);
-    };
-    if (!makeDirectory(path(wire::kRunDirectory), error) ||
-        !makeDirectory(path(wire::kKernelDirectory), error)) {
-        return nullptr;
-    }
     auto loop = EventLoop::create();
     if (!loop) {
         error = "cannot make an event loop";
         return nullptr;
     }
-    auto service = serviceSocket(std::move(activated), path(wire::kKernelSocket), error);
+    auto service = openServiceSocket(settings.root, std::move(activated), error);
     if (!service) {
         return nullptr;
     }
-    auto control = ListeningSocket::open(path(wire::kSimulatorControlSocket), SOCK_STREAM, error);
+    auto control = ListeningSocket::open(
+        wire::underRoot(settings.root, wire::kSimulatorControlSocket), SOCK_STREAM, error);
     if (!control) {
         return nullptr;
     }

@@ -2,6 +2,7 @@
 
 #include "base/Concat.h"
 #include "base/UnixAddress.h"
+#include "wire/SystemPaths.h"
 
 #include <systemd/sd-daemon.h>
 
@@ -138,6 +139,34 @@ std::optional<base::FileDescriptor> takeActivatedServiceSocket(std::string& erro
         return std::nullopt;
     }
     return socket;
+}
+
+namespace {
+
+/// Makes the directory with exactly that mode; one that is there is left as it is.
+bool makeDirectory(const std::string& path, std::string& error) {
+    constexpr mode_t kMode = 0755;
+    const bool made = ::mkdir(path.c_str(), kMode) == 0;
+    if (made ? ::chmod(path.c_str(), kMode) == 0 : errno == EEXIST) {
+        return true;
+    }
+    error = reason(path, "cannot make the directory");
+    return false;
+}
+
+} // namespace
+
+std::optional<ListeningSocket>
+openServiceSocket(const std::string& root, base::FileDescriptor activated, std::string& error) {
+    for (const char* directory : {wire::kRunDirectory, wire::kKernelDirectory}) {
+        if (!makeDirectory(wire::underRoot(root, directory), error)) {
+            return std::nullopt;
+        }
+    }
+    if (activated.isOpen()) {
+        return ListeningSocket::adopt(std::move(activated));
+    }
+    return ListeningSocket::open(wire::underRoot(root, wire::kKernelSocket), SOCK_SEQPACKET, error);
 }
 
 namespace {

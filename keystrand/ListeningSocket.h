@@ -58,6 +58,12 @@ class ListeningSocket {
 /// Takes the variables that announce sockets out of the environment, so it finds them once.
 [[nodiscard]] std::optional<base::FileDescriptor> takeActivatedServiceSocket(std::string& error);
 
+/// The kernel service's socket under a root directory: the one that was handed over, or else one of
+/// its own making, with the directories that lead there. None, with a reason for people in `error`,
+/// when it cannot be had.
+[[nodiscard]] std::optional<ListeningSocket>
+openServiceSocket(const std::string& root, base::FileDescriptor activated, std::string& error);
+
 /// Takes connections from a listening socket and hands over those of trusted peers; any other is
 /// closed without a word. While it is paused, connections wait in the socket's queue.
 class Acceptor {

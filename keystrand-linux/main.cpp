@@ -1,0 +1,70 @@
+#include "keystrand-linux/JournalGateLog.h"
+#include "keystrand-linux/KeystrandService.h"
+#include "keystrand/ListeningSocket.h"
+
+#include <CLI/CLI.hpp>
+#include <systemd/sd-daemon.h>
+
+#include <csignal>
+#include <cstdio>
+#include <optional>
+#include <string>
+#include <utility>
+
+namespace {
+
+struct CommandLine {
+    std::string root = "/";
+    bool restore = false;
+};
+
+/// None when there is nothing to run; `exitStatus` is then the program's status, and what is to be
+/// said has been said.
+std::optional<CommandLine> parseOptions(int argc, const char* const* argv, int& exitStatus) {
+    CommandLine options;
+    CLI::App app("Refuses new USB devices while the machine is locked.", "keystrand");
+    app.add_option("--root", options.root, "All paths lie under this directory")
+        ->capture_default_str();
+    app.add_flag("--restore", options.restore,
+                 "Put back what a service that has ended left closed, and end");
+    try {
+        app.parse(argc, argv);
+    } catch (const CLI::ParseError& problem) {
+        exitStatus = app.exit(problem);
+        return std::nullopt;
+    }
+    return options;
+}
+
+int serve(const std::string& root, keystrand::usb::GateLog& log) {
+    std::string error;
+    auto activated = keystrand::takeActivatedServiceSocket(error);
+    const auto service =
+        activated
+            ? keystrand::usb::KeystrandService::create(root, std::move(*activated), log, error)
+            : nullptr;
+    if (!service) {
+        std::fprintf(stderr, "keystrand: %s\n", error.c_str());
+        return 1;
+    }
+    std::puts("keystrand: ready");
+    std::fflush(stdout);
+    sd_notify(0, "READY=1");
+    return service->run() ? 0 : 1;
+}
+
+} // namespace
+
+int main(int argc, char** argv) {
+    std::signal(SIGPIPE, SIG_IGN);
+    int exitStatus = 0;
+    const auto options = parseOptions(argc, argv, exitStatus);
+    if (!options) {
+        return exitStatus;
+    }
+    keystrand::usb::JournalGateLog log(keystrand::usb::JournalGateLog::targetFor(options->root));
+    if (options->restore) {
+        return keystrand::usb::KeystrandService::restore(options->root, log) ? 0 : 1;
+    }
+    return serve(options->root, log);
+}
