@@ -245,7 +245,7 @@ GateOutcome SysfsUsbBus::setRootHub(const RootHub& hub, AuthorizedDefault value)
                                                  : GateOutcome{.kind = Outcome::vanished};
 }
 
-GateOutcome SysfsUsbBus::writeDefault(int directory, AuthorizedDefault value) {
+GateOutcome SysfsUsbBus::writeDefault(int directory, AuthorizedDefault value) const {
     const int error = system_.write(directory, kAuthorizedDefault, std::to_string(value));
     const SmallFile file = readSmallFile(directory, kAuthorizedDefault, kAttributeLimit);
     const auto now = base::parseNumber<AuthorizedDefault>(trimmed(file.bytes));
@@ -273,7 +273,7 @@ GateOutcome SysfsUsbBus::refuse(const UsbDevice& device) {
     return writeDevice(directory, false);
 }
 
-GateOutcome SysfsUsbBus::writeDevice(const base::FileDescriptor& directory, bool authorized) {
+GateOutcome SysfsUsbBus::writeDevice(const base::FileDescriptor& directory, bool authorized) const {
     if (!directory.isOpen()) {
         return failed(errno);
     }

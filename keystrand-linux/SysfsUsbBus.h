@@ -48,8 +48,9 @@ class SysfsUsbBus : public UsbBus {
     [[nodiscard]] bool readNames(std::vector<std::string>& names, std::string& problem) const;
     [[nodiscard]] std::optional<RootHub> readRootHub(const std::string& name) const;
     [[nodiscard]] std::optional<UsbDevice> readDevice(const std::string& name) const;
-    [[nodiscard]] GateOutcome writeDefault(int directory, AuthorizedDefault value);
-    [[nodiscard]] GateOutcome writeDevice(const base::FileDescriptor& directory, bool authorized);
+    [[nodiscard]] GateOutcome writeDefault(int directory, AuthorizedDefault value) const;
+    [[nodiscard]] GateOutcome writeDevice(const base::FileDescriptor& directory,
+                                          bool authorized) const;
     [[nodiscard]] base::FileDescriptor openSeen(const Attachment& attachment) const;
     [[nodiscard]] std::string directoryOf(const std::string& name) const;
 
