@@ -100,7 +100,9 @@ std::optional<GateRecord> UsbGate::resume() {
 }
 
 void UsbGate::setClosed(bool closed) {
+    wantsClosed_ = closed;
     if (closed == policy_.closed()) {
+        watchAsNeeded();
         return;
     }
     if (!closed) {
@@ -111,6 +113,8 @@ void UsbGate::setClosed(bool closed) {
         policy_.close(*view, parts_.now());
         saveDevices(*view);
     } else {
+        // Until there is USB.
+        watchAsNeeded();
         return;
     }
     settle();
@@ -184,7 +188,9 @@ std::optional<std::string> UsbGate::accept(const Attachment& attachment) {
 }
 
 void UsbGate::look() {
-    if (policy_.state().phase != GateState::Phase::open) {
+    if (wantsClosed_ && !policy_.closed()) {
+        setClosed(true);
+    } else if (policy_.state().phase != GateState::Phase::open) {
         settle();
     } else if (locked_) {
         if (const auto view = lookAtBus()) {
@@ -349,7 +355,7 @@ void UsbGate::saveDevices(const BusView& view) {
 
 void UsbGate::watchAsNeeded() {
     // Nothing wakes the service while the gate is open and nobody will ask what was attached.
-    const bool wanted = locked_ || policy_.state().phase != GateState::Phase::open;
+    const bool wanted = locked_ || wantsClosed_ || policy_.state().phase != GateState::Phase::open;
     if (wanted == watching_) {
         return;
     }

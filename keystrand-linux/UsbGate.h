@@ -40,7 +40,8 @@ class UsbGate {
     /// the bus. None when there is none, or, with a line, none that can be understood.
     std::optional<GateRecord> resume();
 
-    /// Closes or opens; nothing when it is so already.
+    /// Closes or opens; nothing when it is so already. Where there is no USB, it closes as soon as
+    /// there is; what is attached then stays.
     void setClosed(bool closed);
     /// While the machine is locked each change of what is attached is kept for the next start.
     void setLocked(bool locked);
@@ -93,6 +94,8 @@ class UsbGate {
     std::string toldProblem_;
     bool keepsDevices_ = false;
     bool locked_ = false;
+    /// What was said last, whether it could be done or not.
+    bool wantsClosed_ = false;
     bool watching_ = false;
     bool settling_ = false;
 };

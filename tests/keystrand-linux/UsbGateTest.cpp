@@ -221,6 +221,30 @@ TEST_F(UsbGateTest, WithoutUsbThatIsSaidOnce) {
     EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
 }
 
+TEST_F(UsbGateTest, UsbThatComesLaterIsClosedWhenItComes) {
+    bus.setMissing(true);
+    gate->setClosed(true);
+    EXPECT_TRUE(bus.isWatched());
+    bus.setMissing(false);
+    bus.addRootHub(2);
+    EXPECT_TRUE(gate->closed());
+    EXPECT_EQ(bus.parameter(), kHardWiredOnly);
+    EXPECT_EQ(bus.rootHubDefault(2), kHardWiredOnly);
+    bus.plug("2-1", aDisk());
+    EXPECT_FALSE(bus.isAuthorized("2-1"));
+}
+
+TEST_F(UsbGateTest, UsbThatComesWhenTheGateIsToBeOpenAgainIsLeftAlone) {
+    bus.setMissing(true);
+    gate->setClosed(true);
+    gate->setClosed(false);
+    EXPECT_FALSE(bus.isWatched());
+    bus.setMissing(false);
+    bus.addRootHub(2);
+    gate->look();
+    EXPECT_EQ(bus.writes(), std::vector<std::string>());
+}
+
 TEST_F(UsbGateTest, NothingIsWatchedWhileTheMachineIsUnlocked) {
     EXPECT_FALSE(bus.isWatched());
     gate->setLocked(true);
