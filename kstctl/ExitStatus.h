@@ -1,7 +1,7 @@
 #pragma once
 
 #include "base/Concat.h"
-#include "platform/Error.h"
+#include "platform/Result.h"
 
 #include <cerrno>
 #include <string>

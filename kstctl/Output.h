@@ -3,7 +3,6 @@
 #include "base/FileDescriptor.h"
 #include "kstctl/ExitStatus.h"
 #include "kstctl/Forms.h"
-#include "platform/Error.h"
 #include "platform/Result.h"
 #include "platform/linux/Paths.h"
 

@@ -1,7 +1,6 @@
 #pragma once
 
 #include "platform/Date.h"
-#include "platform/Timestamp.h"
 
 #include <concepts>
 #include <cstdint>

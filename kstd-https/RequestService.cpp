@@ -1,7 +1,7 @@
 #include "kstd-https/RequestService.h"
 
 #include "platform/HTTPSession.h"
-#include "platform/host/HTTPRequestCheck.h"
+#include "platform/host/HTTPRequests.h"
 #include "platform/https/HTTPTransfer.h"
 
 #include <algorithm>

@@ -2,7 +2,6 @@
 
 #include "platform/Clock.h"
 #include "platform/Date.h"
-#include "platform/Error.h"
 #include "platform/Result.h"
 #include "wire/AlarmAnswer.h"
 

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "platform/Error.h"
 #include "platform/Link.h"
+#include "platform/Result.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -124,7 +124,7 @@ using HTTPCompletion = std::function<void(const HTTPReply&)>;
 /// are kept.
 ///
 /// Redirects are not followed: the answer is what the first server says. How long a request may
-/// take depends on its method and its size only (platform/host/HTTPLimits.h); what takes longer
+/// take depends on its method and its size only (platform/host/HTTPRequests.h); what takes longer
 /// ends it with kTimedOut. No header is sent but Host, Content-Length (with a body) and the
 /// session's own.
 class HTTPSession {

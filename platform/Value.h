@@ -1,8 +1,8 @@
 #pragma once
 
-#include "platform/Error.h"
+#include "platform/Date.h"
 #include "platform/Link.h"
-#include "platform/Timestamp.h"
+#include "platform/Result.h"
 
 #include <array>
 #include <concepts>

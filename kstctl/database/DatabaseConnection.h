@@ -1,7 +1,6 @@
 #pragma once
 
 #include "kstctl/ExitStatus.h"
-#include "platform/Error.h"
 #include "platform/Result.h"
 
 #include <chrono>

@@ -1,8 +1,8 @@
 #pragma once
 
 #include "kstctl/database/EventRows.h"
+#include "platform/Date.h"
 #include "platform/Result.h"
-#include "platform/Timestamp.h"
 
 #include <chrono>
 #include <cstdint>

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
-#include "platform/Error.h"
+#include "platform/Result.h"
 #include "platform/Value.h"
 
 #include <cstddef>

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "platform/Date.h"
-#include "platform/Error.h"
+#include "platform/Result.h"
 
 #include <cstdint>
 #include <optional>

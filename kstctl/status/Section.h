@@ -2,7 +2,7 @@
 
 #include "kstctl/ExitStatus.h"
 #include "kstctl/Report.h"
-#include "platform/Error.h"
+#include "platform/Result.h"
 
 #include <optional>
 #include <string>

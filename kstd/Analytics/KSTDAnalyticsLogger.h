@@ -1,13 +1,13 @@
 #pragma once
 
 #include "base/TextBuffer.h"
+#include "platform/Date.h"
 #include "platform/HTTPSession.h"
 #include "platform/Host.h"
 #include "platform/JSON.h"
 #include "platform/Link.h"
 #include "platform/Result.h"
 #include "platform/SerialQueue.h"
-#include "platform/Timestamp.h"
 #include "platform/Value.h"
 
 #include <atomic>

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "kstd/Analytics/SQLite/KSTDSQLite.h"
-#include "platform/Timestamp.h"
+#include "platform/Date.h"
 #include "platform/Value.h"
 #include "platform/ValueSink.h"
 

@@ -1,8 +1,7 @@
 #include "platform/fake/FakeHTTPSessions.h"
 
 #include "base/Concat.h"
-#include "platform/host/Challenges.h"
-#include "platform/host/HTTPRequestCheck.h"
+#include "platform/host/HTTPRequests.h"
 
 #include <string>
 #include <string_view>

@@ -1,7 +1,7 @@
 #include "platform/https/HTTPTransfer.h"
 
 #include "base/Concat.h"
-#include "platform/host/HTTPRequestCheck.h"
+#include "platform/host/HTTPRequests.h"
 
 #include <algorithm>
 #include <iterator>

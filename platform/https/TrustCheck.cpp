@@ -1,7 +1,7 @@
 #include "platform/https/TrustCheck.h"
 
 #include "base/Concat.h"
-#include "platform/host/Challenges.h"
+#include "platform/host/HTTPRequests.h"
 
 #include <filesystem>
 #include <openssl/err.h>

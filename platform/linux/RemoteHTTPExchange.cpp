@@ -2,8 +2,7 @@
 
 #include "base/Concat.h"
 #include "base/Saturate.h"
-#include "platform/host/Challenges.h"
-#include "platform/host/HTTPRequestCheck.h"
+#include "platform/host/HTTPRequests.h"
 #include "platform/linux/AsBytes.h"
 
 #include <algorithm>

@@ -1,6 +1,6 @@
 #include "platform/linux/RemoteHTTPSessions.h"
 
-#include "platform/host/HTTPRequestCheck.h"
+#include "platform/host/HTTPRequests.h"
 #include "platform/host/RequestThreads.h"
 #include "platform/linux/HTTPSClient.h"
 #include "platform/linux/RemoteHTTPExchange.h"

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "platform/HTTPSession.h"
-#include "platform/host/HTTPLimits.h"
+#include "platform/host/HTTPRequests.h"
 #include "platform/linux/StopRequest.h"
 
 #include <chrono>

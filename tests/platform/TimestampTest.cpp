@@ -1,4 +1,4 @@
-#include "platform/Timestamp.h"
+#include "platform/Date.h"
 
 #include <gtest/gtest.h>
 

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "platform/Error.h"
+#include "platform/Result.h"
 
 #include <optional>
 #include <string>

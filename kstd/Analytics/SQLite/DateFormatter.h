@@ -1,6 +1,6 @@
 #pragma once
 
-#include "platform/Timestamp.h"
+#include "platform/Date.h"
 
 #include <optional>
 #include <string>

@@ -4,8 +4,8 @@
 #include "kstd/Analytics/SQLite/DatabaseTexts.h"
 #include "kstd/Analytics/SQLite/DateFormatter.h"
 #include "kstd/Analytics/SQLite/KSTDSQLiteStatement.h"
-#include "platform/Error.h"
-#include "platform/Timestamp.h"
+#include "platform/Date.h"
+#include "platform/Result.h"
 #include "platform/Value.h"
 
 #include <concepts>

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "base/Concat.h"
-#include "platform/host/HTTPRequestCheck.h"
+#include "platform/host/HTTPRequests.h"
 #include "platform/https/HTTPTransfer.h"
 #include "tests/support/Collector.h"
 #include "tests/support/HTTPRequests.h"
