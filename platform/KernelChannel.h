@@ -1,7 +1,7 @@
 #pragma once
 
+#include "platform/KernelConnections.h"
 #include "platform/ServiceRegistry.h"
-#include "platform/Status.h"
 
 #include <cstddef>
 #include <cstdint>

@@ -1,8 +1,8 @@
 #pragma once
 
 #include "platform/KernelChannel.h"
+#include "platform/KernelConnections.h"
 #include "platform/ServiceRegistry.h"
-#include "platform/Status.h"
 
 #include <cstddef>
 #include <cstdint>

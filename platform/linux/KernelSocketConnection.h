@@ -3,7 +3,6 @@
 #include "base/FileDescriptor.h"
 #include "base/UnixAddress.h"
 #include "platform/KernelConnections.h"
-#include "platform/Status.h"
 #include "platform/SystemLog.h"
 #include "wire/KernelSocket.h"
 
