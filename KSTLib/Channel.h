@@ -1,6 +1,7 @@
 #pragma once
 
 #include "KSTLib/Status.h"
+#include "base/NotCopied.h"
 #include "platform/KernelChannel.h"
 
 #include <cstddef>
@@ -23,11 +24,9 @@ struct CallState {
 
 /// One call of an exported function: whatever it sends has one time limit, LibraryPlatform's
 /// `callTime`. A call that a result block makes has its own.
-class CallScope {
+class CallScope : private base::NotCopied {
   public:
     CallScope() noexcept;
-    CallScope(const CallScope&) = delete;
-    CallScope& operator=(const CallScope&) = delete;
     ~CallScope();
 
   private:

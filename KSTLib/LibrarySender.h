@@ -4,6 +4,7 @@
 #include "KSTLib/Contexts.h"
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/Status.h"
+#include "base/NotCopied.h"
 #include "common/CommandSender.h"
 #include "common/Failure.h"
 
@@ -41,11 +42,8 @@ inline void updateLogLevelIfOpen() noexcept {
 /// A context that is made for one call on the global scope and destroyed at the end of the scope:
 /// also when the call's time is up, but then nobody waits for the kernel service's answer. When it
 /// cannot be told, and in a child that a block of the call forked, the object goes alone.
-class TemporaryContext {
+class TemporaryContext : private base::NotCopied {
   public:
-    TemporaryContext() = default;
-    TemporaryContext(const TemporaryContext&) = delete;
-    TemporaryContext& operator=(const TemporaryContext&) = delete;
     ~TemporaryContext();
 
     /// What KSTContextCreate fails with, reported by the caller's line too. To be called once.

@@ -18,8 +18,6 @@ class FileDescriptor {
         }
         return *this;
     }
-    FileDescriptor(const FileDescriptor&) = delete;
-    FileDescriptor& operator=(const FileDescriptor&) = delete;
     ~FileDescriptor() { reset(); }
 
     [[nodiscard]] int get() const { return number_; }

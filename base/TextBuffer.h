@@ -21,8 +21,6 @@ class TextBuffer {
         TextBuffer(std::move(other)).swap(*this);
         return *this;
     }
-    TextBuffer(const TextBuffer&) = delete;
-    TextBuffer& operator=(const TextBuffer&) = delete;
     ~TextBuffer() { release(); }
 
     void append(std::string_view text) {

@@ -4,6 +4,7 @@
 #include "KSTLib/KSTLib.h"
 #include "KSTLib/Platform.h"
 #include "base/Concat.h"
+#include "base/NotCopied.h"
 #include "bench/support/AllocationCount.h"
 #include "bench/support/Benchmark.h"
 #include "bench/support/Comparison.h"
@@ -34,7 +35,7 @@ struct Case {
 };
 
 /// The library on the Linux channel, with its connection open.
-class Product {
+class Product : private base::NotCopied {
   public:
     Product(const std::string& socketPath, const Case& sizes)
         : log_(platform::Paths("/")),
@@ -45,8 +46,6 @@ class Product {
         kst::installPlatform({log_, registry_, channel_});
         call();
     }
-    Product(const Product&) = delete;
-    Product& operator=(const Product&) = delete;
     ~Product() { kst::removePlatform(); }
 
     void call() {

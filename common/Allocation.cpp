@@ -1,5 +1,7 @@
 #include "common/Allocation.h"
 
+#include "base/NotCopied.h"
+
 #include <cstdlib>
 #include <limits>
 #include <sched.h>
@@ -56,15 +58,13 @@ std::atomic<CallBuffer*> firstCallBuffer = nullptr;
 std::atomic_flag callBuffersAreChanging;
 
 /// One change at a time. A child never waits for it.
-class CallBufferChange {
+class CallBufferChange : private base::NotCopied {
   public:
     CallBufferChange() {
         while (callBuffersAreChanging.test_and_set(std::memory_order_acquire)) {
             ::sched_yield();
         }
     }
-    CallBufferChange(const CallBufferChange&) = delete;
-    CallBufferChange& operator=(const CallBufferChange&) = delete;
     ~CallBufferChange() { callBuffersAreChanging.clear(std::memory_order_release); }
 };
 

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "KSTLib/AllocatedBytes.h"
+#include "base/NotCopied.h"
 
 #include <atomic>
 #include <cstddef>
@@ -29,11 +30,8 @@ void release(void* memory, std::size_t size, std::size_t written) noexcept;
 
 /// Stands between the library and its memory: a program's limit, or a test that lets the n-th
 /// allocation fail. Its operations must neither throw nor allocate from the library.
-class AllocationGate {
+class AllocationGate : private base::NotCopied {
   public:
-    AllocationGate() = default;
-    AllocationGate(const AllocationGate&) = delete;
-    AllocationGate& operator=(const AllocationGate&) = delete;
     virtual ~AllocationGate() = default;
 
     /// Whether an allocation of `size` bytes may be tried.
@@ -51,12 +49,10 @@ AllocationGate* setAllocationGate(AllocationGate* gate) noexcept;
 /// exists: a child of the process has no use for what other threads' calls held when it was forked.
 ///
 /// Threads may make and destroy theirs at the same time. Nothing here makes a fork wait.
-class CallBuffer {
+class CallBuffer : private base::NotCopied {
   public:
     CallBuffer() = default;
     CallBuffer(void* bytes, std::size_t size) noexcept { hold(bytes, size); }
-    CallBuffer(const CallBuffer&) = delete;
-    CallBuffer& operator=(const CallBuffer&) = delete;
     ~CallBuffer() { leave(); }
 
     /// To be called once, before anything secret is written. Null is nothing.
@@ -81,12 +77,10 @@ class CallBuffer {
 };
 
 /// Memory from `allocate` for one call, released at the end of the scope.
-class AllocatedMemory {
+class AllocatedMemory : private base::NotCopied {
   public:
     explicit AllocatedMemory(std::size_t size) noexcept
         : bytes_(static_cast<std::uint8_t*>(allocate(size))), size_(size), buffer_(bytes_, size) {}
-    AllocatedMemory(const AllocatedMemory&) = delete;
-    AllocatedMemory& operator=(const AllocatedMemory&) = delete;
     ~AllocatedMemory();
 
     /// Null when the allocation failed.

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "common/Allocation.h"
 
 #include <cstddef>
@@ -11,15 +12,13 @@ namespace kst {
 /// The levels that a walk through a tree is inside of, so that the depth of a tree costs memory of
 /// the library's and not the thread's stack. The first kRoomWithoutAllocation cost neither.
 template <typename Level>
-class LevelStack {
+class LevelStack : private base::NotCopied {
     static_assert(std::is_trivially_copyable_v<Level>);
 
   public:
     static constexpr std::size_t kRoomWithoutAllocation = 32;
 
     LevelStack() noexcept : levels_(room_) {}
-    LevelStack(const LevelStack&) = delete;
-    LevelStack& operator=(const LevelStack&) = delete;
     ~LevelStack() { releaseAllocated(); }
 
     /// False, with nothing pushed, when there is no memory.

@@ -5,6 +5,7 @@
 #include "KSTLib/Status.h"
 #include "base/ByteReader.h"
 #include "base/ByteWriter.h"
+#include "base/NotCopied.h"
 #include "common/Failure.h"
 
 #include <cstddef>
@@ -41,11 +42,8 @@ namespace kst {
 
 /// The age and the parameters at the end of a payload, released with the object unless they were
 /// handed out.
-class ReceivedParameters {
+class ReceivedParameters : private base::NotCopied {
   public:
-    ReceivedParameters() = default;
-    ReceivedParameters(const ReceivedParameters&) = delete;
-    ReceivedParameters& operator=(const ReceivedParameters&) = delete;
     ~ReceivedParameters();
 
     /// Reads the age, the count and the parameters. kKSTErrorBadParameter: they are cut short, more

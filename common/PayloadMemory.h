@@ -3,6 +3,7 @@
 #include "KSTLib/Command.h"
 #include "KSTLib/Status.h"
 #include "base/ByteReader.h"
+#include "base/NotCopied.h"
 #include "common/Allocation.h"
 #include "common/Failure.h"
 
@@ -17,11 +18,8 @@ namespace kst {
 /// A buffer on the stack for bytes that may be secret: zero at first, overwritten with zeros at the
 /// end of the scope.
 template <std::size_t Size>
-class WipedBytes {
+class WipedBytes : private base::NotCopied {
   public:
-    WipedBytes() = default;
-    WipedBytes(const WipedBytes&) = delete;
-    WipedBytes& operator=(const WipedBytes&) = delete;
     ~WipedBytes() { ::explicit_bzero(bytes_.data(), bytes_.size()); }
 
     [[nodiscard]] std::uint8_t* data() { return bytes_.data(); }
@@ -90,11 +88,8 @@ class BuiltPayload {
 };
 
 /// A copy of bytes from a payload, released with the object unless it was handed out.
-class ReceivedBlob {
+class ReceivedBlob : private base::NotCopied {
   public:
-    ReceivedBlob() = default;
-    ReceivedBlob(const ReceivedBlob&) = delete;
-    ReceivedBlob& operator=(const ReceivedBlob&) = delete;
     ~ReceivedBlob();
 
     /// Copies the next `length` bytes; none are a null pointer.

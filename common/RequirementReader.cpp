@@ -1,5 +1,6 @@
 #include "KSTLib/RequirementSerialization.h"
 #include "base/ByteReader.h"
+#include "base/NotCopied.h"
 #include "common/Allocation.h"
 #include "common/Failure.h"
 #include "common/LevelStack.h"
@@ -74,11 +75,9 @@ struct Level {
 
 /// Builds the tree at the start of a buffer. What has been built belongs to the builder until it is
 /// taken.
-class TreeBuilder {
+class TreeBuilder : private base::NotCopied {
   public:
     explicit TreeBuilder(Bytes bytes) : rest_(bytes) {}
-    TreeBuilder(const TreeBuilder&) = delete;
-    TreeBuilder& operator=(const TreeBuilder&) = delete;
     ~TreeBuilder() { DeallocRequirement(root_); }
 
     [[nodiscard]] KSTStatus build() {

@@ -7,6 +7,7 @@
 #include "KSTLib/LibCall.h"
 #include "KSTLib/Platform.h"
 #include "KSTLib/Serialization.h"
+#include "base/NotCopied.h"
 #include "fuzz/Payloads.h"
 
 #include <array>
@@ -166,11 +167,9 @@ void walk(const KSTRequirement* requirement) {
     KSTRequirementGetSubrequirements(requirement, walk);
 }
 
-class Client {
+class Client : private base::NotCopied {
   public:
     Client(Script& script, ScriptedKernel& kernel) : script_(script), kernel_(kernel) {}
-    Client(const Client&) = delete;
-    Client& operator=(const Client&) = delete;
     ~Client() { dropContext(); }
 
     void dropContext() {

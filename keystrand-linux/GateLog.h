@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <array>
 #include <cstddef>
 #include <string>
@@ -63,11 +65,8 @@ inline constexpr std::array<GateLineClass, 16> kGateLineClasses = {{
 }
 
 /// Where the gate's lines go.
-class GateLog {
+class GateLog : private base::NotCopied {
   public:
-    GateLog() = default;
-    GateLog(const GateLog&) = delete;
-    GateLog& operator=(const GateLog&) = delete;
     virtual ~GateLog() = default;
 
     /// One line, without its end; bytes of others are escaped already.

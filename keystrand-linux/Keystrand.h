@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "keystrand-linux/LockState.h"
 #include "keystrand-linux/MachineClock.h"
 #include "keystrand-linux/UsbGate.h"
@@ -28,7 +29,7 @@ struct PolicySwitches {
 /// mode, or asleep, or has just started and nobody knows yet.
 ///
 /// Everything happens on one thread. What the parts refer to outlives it.
-class Keystrand {
+class Keystrand : private base::NotCopied {
   public:
     struct Settings {
         /// Seconds from locking to restricted mode.
@@ -54,8 +55,6 @@ class Keystrand {
     };
 
     Keystrand(Parts parts, const Settings& settings);
-    Keystrand(const Keystrand&) = delete;
-    Keystrand& operator=(const Keystrand&) = delete;
 
     /// Takes up what an earlier service has left, closes the gate, and listens. Once.
     void start();

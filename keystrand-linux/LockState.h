@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <functional>
 
 namespace keystrand::usb {
@@ -9,7 +11,7 @@ namespace keystrand::usb {
 ///
 /// The machine is unlocked while at least one of its seats is: somebody sits there who has logged
 /// in and has not locked the screen. A seat at which nobody is logged in does not lock the others.
-class LockState {
+class LockState : private base::NotCopied {
   public:
     enum class Said {
         locked,
@@ -27,9 +29,6 @@ class LockState {
     };
     using Listener = std::function<void(Said said)>;
 
-    LockState() = default;
-    LockState(const LockState&) = delete;
-    LockState& operator=(const LockState&) = delete;
     virtual ~LockState() = default;
 
     /// From now on the listener is called, never from within this call. There is one listener.

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "keystrand-linux/GatePolicy.h"
 #include "keystrand/Clock.h"
 
@@ -9,11 +10,8 @@
 namespace keystrand::usb {
 
 /// The two clocks of a machine.
-class MachineClock {
+class MachineClock : private base::NotCopied {
   public:
-    MachineClock() = default;
-    MachineClock(const MachineClock&) = delete;
-    MachineClock& operator=(const MachineClock&) = delete;
     virtual ~MachineClock() = default;
 
     /// Sleep included; nobody can set it.

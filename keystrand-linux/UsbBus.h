@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "keystrand-linux/GatePolicy.h"
 #include "keystrand-linux/UsbDevice.h"
 
@@ -10,11 +11,8 @@
 namespace keystrand::usb {
 
 /// The machine's USB, as the gate sees it. Everything happens on the thread of the loop.
-class UsbBus {
+class UsbBus : private base::NotCopied {
   public:
-    UsbBus() = default;
-    UsbBus(const UsbBus&) = delete;
-    UsbBus& operator=(const UsbBus&) = delete;
     virtual ~UsbBus() = default;
 
     /// What is there now; none, with the reason for people in `problem`, where there is no USB or

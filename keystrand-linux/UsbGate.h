@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "keystrand-linux/GateLog.h"
 #include "keystrand-linux/GatePolicy.h"
 #include "keystrand-linux/GateRecord.h"
@@ -17,7 +18,7 @@ namespace keystrand::usb {
 /// nothing is left to be written. What it is going to write is in the record before it is written.
 ///
 /// Everything happens on one thread. Bus, files, log and clock outlive it.
-class UsbGate {
+class UsbGate : private base::NotCopied {
   public:
     struct Parts {
         UsbBus& bus;
@@ -33,8 +34,6 @@ class UsbGate {
 
     UsbGate(Parts parts, GateRules rules);
     ~UsbGate();
-    UsbGate(const UsbGate&) = delete;
-    UsbGate& operator=(const UsbGate&) = delete;
 
     /// Takes up what an earlier service of this start of the machine has left, without writing to
     /// the bus. None when there is none, or, with a line, none that can be understood.

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 #include "keystrand/EventLoop.h"
 #include "keystrand/Timers.h"
 
@@ -15,7 +16,7 @@ namespace keystrand::sessions {
 enum class Word { locked, unlocked, goingToSleep, awake };
 
 /// The way to keystrand. Everything happens on the thread of the loop.
-class KeystrandLink {
+class KeystrandLink : private base::NotCopied {
   public:
     struct Handlers {
         /// There is a connection, on which nothing has been said yet.
@@ -26,9 +27,6 @@ class KeystrandLink {
         std::function<void()> lost;
     };
 
-    KeystrandLink() = default;
-    KeystrandLink(const KeystrandLink&) = delete;
-    KeystrandLink& operator=(const KeystrandLink&) = delete;
     virtual ~KeystrandLink() = default;
 
     /// Once. No handler is called from within a call of the link's.

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <cstdint>
 #include <optional>
 #include <string>
@@ -38,11 +40,8 @@ struct LogindProcess {
 };
 
 /// What is told by a Logind, on the thread of the loop.
-class LogindListener {
+class LogindListener : private base::NotCopied {
   public:
-    LogindListener() = default;
-    LogindListener(const LogindListener&) = delete;
-    LogindListener& operator=(const LogindListener&) = delete;
     virtual ~LogindListener() = default;
 
     /// A logind is there, with these sessions and no others.
@@ -62,11 +61,8 @@ class LogindListener {
 ///
 /// It is looked for again and again while it is away, and nothing that happens meanwhile is lost:
 /// `isThere` tells all there is.
-class Logind {
+class Logind : private base::NotCopied {
   public:
-    Logind() = default;
-    Logind(const Logind&) = delete;
-    Logind& operator=(const Logind&) = delete;
     virtual ~Logind() = default;
 
     /// Once. The listener outlives the logind, and is never called from within a call of its own.

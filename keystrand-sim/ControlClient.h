@@ -32,8 +32,6 @@ class ControlClient {
 
     ControlClient(ControlClient&& other) noexcept;
     ControlClient& operator=(ControlClient&& other) noexcept;
-    ControlClient(const ControlClient&) = delete;
-    ControlClient& operator=(const ControlClient&) = delete;
     ~ControlClient();
 
     /// Sends one line and waits for its answer. After a failure to send or receive, and after a

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "keystrand/RestrictedModeTimer.h"
 
 #include <algorithm>
@@ -9,13 +10,10 @@
 namespace keystrand {
 
 /// The time in seconds since 1970-01-01 UTC, always between 1 and RestrictedModeTimer::kLatestTime.
-class Clock {
+class Clock : private base::NotCopied {
   public:
     using Seconds = RestrictedModeTimer::Seconds;
 
-    Clock() = default;
-    Clock(const Clock&) = delete;
-    Clock& operator=(const Clock&) = delete;
     virtual ~Clock() = default;
 
     [[nodiscard]] virtual Seconds now() const = 0;

@@ -5,6 +5,7 @@
 #include "KSTLib/RequestSerialization.h"
 #include "KSTLib/Serialization.h"
 #include "base/ByteReader.h"
+#include "base/NotCopied.h"
 #include "keystrand/ContextTable.h"
 #include "keystrand/CredentialSet.h"
 #include "keystrand/DispatchTable.h"
@@ -84,10 +85,7 @@ struct HandlePayload {
 };
 
 /// Bytes that a deserialiser handed out.
-struct ReceivedText {
-    ReceivedText() = default;
-    ReceivedText(const ReceivedText&) = delete;
-    ReceivedText& operator=(const ReceivedText&) = delete;
+struct ReceivedText : private base::NotCopied {
     ~ReceivedText() { DeallocDataBlob(data, length); }
 
     [[nodiscard]] std::string_view view() const {
@@ -100,15 +98,12 @@ struct ReceivedText {
 };
 
 /// Parameters that a deserialiser handed out.
-struct ReceivedParameters {
+struct ReceivedParameters : private base::NotCopied {
     static constexpr KSTParameterType kUser = 4;
     static constexpr std::size_t kHeaderSize = sizeof(KSTParameterType) + sizeof(std::uint32_t);
     static constexpr std::size_t kMaxWireSize =
         kKSTMaxParameters * (kHeaderSize + kKSTParameterMaxDataLength);
 
-    ReceivedParameters() = default;
-    ReceivedParameters(const ReceivedParameters&) = delete;
-    ReceivedParameters& operator=(const ReceivedParameters&) = delete;
     ~ReceivedParameters() { DeallocParameters(items, count); }
 
     [[nodiscard]] std::size_t wireSize() const;

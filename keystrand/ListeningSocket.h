@@ -32,8 +32,6 @@ class ListeningSocket {
 
     ListeningSocket(ListeningSocket&& other) noexcept = default;
     ListeningSocket& operator=(ListeningSocket&& other) = delete;
-    ListeningSocket(const ListeningSocket&) = delete;
-    ListeningSocket& operator=(const ListeningSocket&) = delete;
     ~ListeningSocket();
 
     [[nodiscard]] int fd() const { return fd_.get(); }

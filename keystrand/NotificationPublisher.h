@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "keystrand/NotificationRecord.h"
 #include "keystrand/Registry.h"
 
@@ -11,11 +12,8 @@
 namespace keystrand {
 
 /// Where events for the daemon go.
-class EventPoster {
+class EventPoster : private base::NotCopied {
   public:
-    EventPoster() = default;
-    EventPoster(const EventPoster&) = delete;
-    EventPoster& operator=(const EventPoster&) = delete;
     virtual ~EventPoster() = default;
 
     /// Takes the event over, to be delivered after all those taken earlier. False, with nothing

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "keystrand/DispatchTable.h"
 #include "keystrand/Registry.h"
 #include "wire/KernelSocket.h"
@@ -30,7 +31,7 @@ struct RequestOutcome {
 };
 
 /// Turns a request packet into a reply packet. Knows nothing of sockets.
-class RequestHandler {
+class RequestHandler : private base::NotCopied {
   public:
     /// Each of these outlives the handler.
     struct Parts {
@@ -40,8 +41,6 @@ class RequestHandler {
     };
 
     explicit RequestHandler(const Parts& parts) : parts_(parts) {}
-    RequestHandler(const RequestHandler&) = delete;
-    RequestHandler& operator=(const RequestHandler&) = delete;
     virtual ~RequestHandler() = default;
 
     [[nodiscard]] virtual RequestOutcome handle(std::span<const std::uint8_t> packet,

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "keystrand/EventLoop.h"
 
 #include <chrono>
@@ -12,11 +13,8 @@ namespace keystrand {
 
 /// Calls its handler once, when the time is over that it was started for last. It goes on while the
 /// machine sleeps.
-class Timer {
+class Timer : private base::NotCopied {
   public:
-    Timer() = default;
-    Timer(const Timer&) = delete;
-    Timer& operator=(const Timer&) = delete;
     virtual ~Timer() = default;
 
     virtual void startFor(std::chrono::milliseconds time) = 0;
@@ -24,11 +22,8 @@ class Timer {
 };
 
 /// Makes timers, which are not started yet and do not outlive it. None is made null.
-class Timers {
+class Timers : private base::NotCopied {
   public:
-    Timers() = default;
-    Timers(const Timers&) = delete;
-    Timers& operator=(const Timers&) = delete;
     virtual ~Timers() = default;
 
     [[nodiscard]] virtual std::unique_ptr<Timer> timer(std::function<void()> handler) = 0;

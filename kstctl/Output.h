@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 #include "kstctl/ExitStatus.h"
 #include "kstctl/Forms.h"
 #include "platform/Result.h"
@@ -126,7 +127,7 @@ class NewFile {
 
 /// Says on a terminal how far the work is, "kstctl: reading events: 40 %", once the program works
 /// for longer than a second; again ten times a second at most. Says nothing anywhere else.
-class Progress {
+class Progress : private base::NotCopied {
   public:
     using Now = std::function<std::chrono::steady_clock::time_point()>;
 
@@ -134,8 +135,6 @@ class Progress {
     Progress();
     /// On `descriptor`, which need not be a terminal.
     Progress(int descriptor, Now now);
-    Progress(const Progress&) = delete;
-    Progress& operator=(const Progress&) = delete;
     ~Progress() { end(); }
 
     /// Begins a part of the work, with so many steps.

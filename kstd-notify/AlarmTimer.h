@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Clock.h"
 #include "platform/Date.h"
 #include "platform/Result.h"
@@ -12,7 +13,7 @@ namespace notify {
 
 /// The init system's timer that starts the sender of due alarms. There is one, and it outlives this
 /// process. A call has taken effect when it returns.
-class AlarmTimerUnit {
+class AlarmTimerUnit : private base::NotCopied {
   public:
     /// Microseconds since 1970-01-01 UTC.
     using Time = std::int64_t;
@@ -22,9 +23,6 @@ class AlarmTimerUnit {
     /// The latest time that a timer can have: the end of the year 2199.
     static constexpr Time kLatest = 7'258'118'399'999'999;
 
-    AlarmTimerUnit() = default;
-    AlarmTimerUnit(const AlarmTimerUnit&) = delete;
-    AlarmTimerUnit& operator=(const AlarmTimerUnit&) = delete;
     virtual ~AlarmTimerUnit() = default;
 
     /// When the timer elapses; none when there is no timer, or none that will.

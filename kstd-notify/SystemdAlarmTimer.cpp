@@ -1,6 +1,7 @@
 #include "kstd-notify/SystemdAlarmTimer.h"
 
 #include "base/Concat.h"
+#include "base/NotCopied.h"
 
 #include <systemd/sd-bus.h>
 
@@ -22,14 +23,12 @@ namespace {
 /// A connection to systemd's manager over the system's message bus, for a few calls in a row.
 ///
 /// Every call waits for its answer, and a job for its end, as long as `kPatience`.
-class SystemdBus {
+class SystemdBus : private base::NotCopied {
   public:
     static constexpr std::chrono::seconds kPatience{5};
 
     /// `socket` is the file of the bus's socket. That nobody serves it shows in the calls.
     explicit SystemdBus(const std::string& socket);
-    SystemdBus(const SystemdBus&) = delete;
-    SystemdBus& operator=(const SystemdBus&) = delete;
     ~SystemdBus();
 
     [[nodiscard]] platform::Result<std::uint64_t>

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "kstd/KSTService.h"
 #include "kstd/LogLines.h"
 #include "platform/Host.h"
@@ -41,12 +42,10 @@ class Daemon {
 
 /// KSTLib in this process on the daemon's host, as long as it lives: what the services call of it
 /// works, and of its lines, those that an operator can act on have their class.
-class DaemonLibrary {
+class DaemonLibrary : private base::NotCopied {
   public:
     /// What the host refers to must outlive it.
     explicit DaemonLibrary(const platform::Host& host);
-    DaemonLibrary(const DaemonLibrary&) = delete;
-    DaemonLibrary& operator=(const DaemonLibrary&) = delete;
     ~DaemonLibrary();
 
   private:

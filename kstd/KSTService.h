@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Host.h"
 
 #include <cstdint>
@@ -12,12 +13,10 @@ namespace kstd {
 
 /// Base class of every service that the daemon hosts. It has no state of its own. All operations
 /// are called on the main thread.
-class KSTService {
+class KSTService : private base::NotCopied {
   public:
     /// What the host refers to must outlive the service.
     explicit KSTService(const platform::Host& host) : host_(host) {}
-    KSTService(const KSTService&) = delete;
-    KSTService& operator=(const KSTService&) = delete;
     virtual ~KSTService() = default;
 
     /// Called once, before any event is delivered. The base does nothing.

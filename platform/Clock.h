@@ -1,15 +1,13 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Date.h"
 
 namespace platform {
 
 /// The wall clock, which anybody may set forwards or backwards. May be called from any thread.
-class Clock {
+class Clock : private base::NotCopied {
   public:
-    Clock() = default;
-    Clock(const Clock&) = delete;
-    Clock& operator=(const Clock&) = delete;
     virtual ~Clock() = default;
 
     [[nodiscard]] virtual Date now() = 0;

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Value.h"
 
 #include <optional>
@@ -8,11 +9,8 @@
 namespace platform {
 
 /// What a component of the system was delivered with.
-class ConfigurationResource {
+class ConfigurationResource : private base::NotCopied {
   public:
-    ConfigurationResource() = default;
-    ConfigurationResource(const ConfigurationResource&) = delete;
-    ConfigurationResource& operator=(const ConfigurationResource&) = delete;
     virtual ~ConfigurationResource() = default;
 
     /// The property list `name` of the component, when it is there and is a map.

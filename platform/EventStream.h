@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Date.h"
 
 #include <functional>
@@ -19,13 +20,10 @@ struct Event {
 /// The on-demand event streams of the process, delivered on the main queue: handlers run on the
 /// main thread, from within MainRunLoop::runOnce, one event after the other in the order of their
 /// arrival over all streams.
-class EventStream {
+class EventStream : private base::NotCopied {
   public:
     using Handler = std::function<void(const Event&)>;
 
-    EventStream() = default;
-    EventStream(const EventStream&) = delete;
-    EventStream& operator=(const EventStream&) = delete;
     virtual ~EventStream() = default;
 
     /// Makes `handler` the receiver of the stream's events. Events that the system queued before
@@ -54,11 +52,8 @@ inline constexpr char kAlarmDateKey[] = "Date";
 /// Called on the main thread only. There is one registration for a stream and event name. It is
 /// kept by the system, not by the process: a process started later receives an alarm that became
 /// due while nobody ran.
-class AlarmEvent {
+class AlarmEvent : private base::NotCopied {
   public:
-    AlarmEvent() = default;
-    AlarmEvent(const AlarmEvent&) = delete;
-    AlarmEvent& operator=(const AlarmEvent&) = delete;
     virtual ~AlarmEvent() = default;
 
     /// Registers the event with the date under kAlarmDateKey, or cancels it when `dictionary` is

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <cstddef>
 #include <cstdint>
 #include <memory>
@@ -30,11 +32,8 @@ struct OpenFile {
 
 /// A file opened for writing through a stream. It is unbuffered: what `write` has counted is with
 /// the system.
-class FileStream {
+class FileStream : private base::NotCopied {
   public:
-    FileStream() = default;
-    FileStream(const FileStream&) = delete;
-    FileStream& operator=(const FileStream&) = delete;
     /// Closes the stream if that was not done.
     virtual ~FileStream() = default;
 
@@ -56,11 +55,8 @@ class FileStream {
 ///
 /// What fails, but for a file that is missing when it is loaded, leaves a line in the log with the
 /// reason: once for each reason until the same works again.
-class Files {
+class Files : private base::NotCopied {
   public:
-    Files() = default;
-    Files(const Files&) = delete;
-    Files& operator=(const Files&) = delete;
     virtual ~Files() = default;
 
     /// Opens `path` to read and write, makes it when it is not there, never truncates it. A new

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Link.h"
 #include "platform/Result.h"
 
@@ -22,11 +23,8 @@ enum class TrustResult : std::uint32_t {
 };
 
 /// The certificate that a server has shown, for the host that was asked for.
-class ServerTrust {
+class ServerTrust : private base::NotCopied {
   public:
-    ServerTrust() = default;
-    ServerTrust(const ServerTrust&) = delete;
-    ServerTrust& operator=(const ServerTrust&) = delete;
     virtual ~ServerTrust() = default;
 
     /// Checks the chain, the dates and the host's name against this machine's trust anchors, as one
@@ -66,11 +64,8 @@ enum class ChallengeDisposition {
 using ChallengeCompletion =
     std::function<void(ChallengeDisposition, std::optional<ServerTrustCredential>)>;
 
-class HTTPSessionDelegate {
+class HTTPSessionDelegate : private base::NotCopied {
   public:
-    HTTPSessionDelegate() = default;
-    HTTPSessionDelegate(const HTTPSessionDelegate&) = delete;
-    HTTPSessionDelegate& operator=(const HTTPSessionDelegate&) = delete;
     virtual ~HTTPSessionDelegate() = default;
 
     /// Called on a thread of the session, which waits for the completion. It may be called on any
@@ -127,11 +122,8 @@ using HTTPCompletion = std::function<void(const HTTPReply&)>;
 /// take depends on its method and its size only (platform/host/HTTPRequests.h); what takes longer
 /// ends it with kTimedOut. No header is sent but Host, Content-Length (with a body) and the
 /// session's own.
-class HTTPSession {
+class HTTPSession : private base::NotCopied {
   public:
-    HTTPSession() = default;
-    HTTPSession(const HTTPSession&) = delete;
-    HTTPSession& operator=(const HTTPSession&) = delete;
     /// Waits for the end of the requests that were started; their completions are called before.
     virtual ~HTTPSession() = default;
 
@@ -141,11 +133,8 @@ class HTTPSession {
 };
 
 /// Makes sessions. May be called from any thread.
-class HTTPSessions {
+class HTTPSessions : private base::NotCopied {
   public:
-    HTTPSessions() = default;
-    HTTPSessions(const HTTPSessions&) = delete;
-    HTTPSessions& operator=(const HTTPSessions&) = delete;
     virtual ~HTTPSessions() = default;
 
     /// A session whose requests carry `headers`. A delegate that is gone is as none: the session

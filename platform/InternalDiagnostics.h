@@ -1,15 +1,14 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <string_view>
 
 namespace platform {
 
 /// Whether a machine is one of the developers' own.
-class InternalDiagnostics {
+class InternalDiagnostics : private base::NotCopied {
   public:
-    InternalDiagnostics() = default;
-    InternalDiagnostics(const InternalDiagnostics&) = delete;
-    InternalDiagnostics& operator=(const InternalDiagnostics&) = delete;
     virtual ~InternalDiagnostics() = default;
 
     [[nodiscard]] virtual bool isEnabled(std::string_view subsystem) = 0;

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "base/TextBuffer.h"
 #include "platform/Result.h"
 #include "platform/Value.h"
@@ -41,11 +42,8 @@ class JSONText : public ValueSink {
 };
 
 /// JSON (RFC 8259). May be called from any thread.
-class JSON {
+class JSON : private base::NotCopied {
   public:
-    JSON() = default;
-    JSON(const JSON&) = delete;
-    JSON& operator=(const JSON&) = delete;
     virtual ~JSON() = default;
 
     [[nodiscard]] virtual std::unique_ptr<JSONText>

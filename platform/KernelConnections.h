@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <chrono>
 #include <cstdint>
 #include <optional>
@@ -29,13 +31,10 @@ inline constexpr Status kPlatformStatusBase = -1000;
 /// long they may take together, and the process that the connections belong to.
 ///
 /// A double that has neither time nor connections leaves these operations as they are.
-class KernelConnections {
+class KernelConnections : private base::NotCopied {
   public:
     using Deadline = std::chrono::steady_clock::time_point;
 
-    KernelConnections() = default;
-    KernelConnections(const KernelConnections&) = delete;
-    KernelConnections& operator=(const KernelConnections&) = delete;
     virtual ~KernelConnections() = default;
 
     /// Until when everything that is sent from now on must be answered; what is not fails with the

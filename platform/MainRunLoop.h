@@ -1,15 +1,13 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Date.h"
 
 namespace platform {
 
 /// The run loop of the main thread.
-class MainRunLoop {
+class MainRunLoop : private base::NotCopied {
   public:
-    MainRunLoop() = default;
-    MainRunLoop(const MainRunLoop&) = delete;
-    MainRunLoop& operator=(const MainRunLoop&) = delete;
     virtual ~MainRunLoop() = default;
 
     /// Waits until a source has something or the deadline has come, and handles what there is.

@@ -1,16 +1,15 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 namespace platform {
 
 /// The settings that a device management has put on this machine.
 ///
 /// A change is announced by the event "com.zerva.quorvane.effectivesettingschanged" on the stream
 /// "com.zerva.notifyd.matching". Called on the main thread only.
-class ManagedSettings {
+class ManagedSettings : private base::NotCopied {
   public:
-    ManagedSettings() = default;
-    ManagedSettings(const ManagedSettings&) = delete;
-    ManagedSettings& operator=(const ManagedSettings&) = delete;
     virtual ~ManagedSettings() = default;
 
     /// Whether restricted mode is allowed, as it stands now. Only a setting that can be read,

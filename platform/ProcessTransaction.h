@@ -1,16 +1,15 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <string_view>
 
 namespace platform {
 
 /// Keeps count of what the process has in hand. While the count is not zero the process is not
 /// ended for being idle. Called on the main thread only.
-class ProcessTransactions {
+class ProcessTransactions : private base::NotCopied {
   public:
-    ProcessTransactions() = default;
-    ProcessTransactions(const ProcessTransactions&) = delete;
-    ProcessTransactions& operator=(const ProcessTransactions&) = delete;
     virtual ~ProcessTransactions() = default;
 
     virtual void begin(std::string_view label) = 0;
@@ -18,14 +17,12 @@ class ProcessTransactions {
 };
 
 /// One thing in hand, from construction to destruction. The label must outlive it.
-class ProcessTransaction {
+class ProcessTransaction : private base::NotCopied {
   public:
     ProcessTransaction(ProcessTransactions& transactions, std::string_view label)
         : transactions_(transactions), label_(label) {
         transactions_.begin(label_);
     }
-    ProcessTransaction(const ProcessTransaction&) = delete;
-    ProcessTransaction& operator=(const ProcessTransaction&) = delete;
     ~ProcessTransaction() { transactions_.end(label_); }
 
   private:

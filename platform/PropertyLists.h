@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Result.h"
 #include "platform/Value.h"
 #include "platform/ValueBuilder.h"
@@ -13,11 +14,8 @@ namespace platform {
 
 /// Property lists: values as files keep them. Kinds: boolean, integer, real, text, bytes, date,
 /// list, map. May be called from any thread.
-class PropertyLists {
+class PropertyLists : private base::NotCopied {
   public:
-    PropertyLists() = default;
-    PropertyLists(const PropertyLists&) = delete;
-    PropertyLists& operator=(const PropertyLists&) = delete;
     virtual ~PropertyLists() = default;
 
     /// `value` in the binary form, version 1.0. Fails with an error of kGenericErrorDomain when a

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <functional>
 #include <memory>
 #include <string>
@@ -7,11 +9,8 @@
 namespace platform {
 
 /// Work that runs one item at a time.
-class SerialQueue {
+class SerialQueue : private base::NotCopied {
   public:
-    SerialQueue() = default;
-    SerialQueue(const SerialQueue&) = delete;
-    SerialQueue& operator=(const SerialQueue&) = delete;
     virtual ~SerialQueue() = default;
 
     /// Runs `work` after all work submitted before it and returns when it has run. What it throws
@@ -24,11 +23,8 @@ class SerialQueue {
 };
 
 /// Makes queues. May be called from any thread.
-class SerialQueues {
+class SerialQueues : private base::NotCopied {
   public:
-    SerialQueues() = default;
-    SerialQueues(const SerialQueues&) = delete;
-    SerialQueues& operator=(const SerialQueues&) = delete;
     virtual ~SerialQueues() = default;
 
     /// The name is for messages.

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <string_view>
 
 namespace platform {
@@ -24,11 +26,8 @@ struct LogFields {
 /// never fails as far as the caller can see, and leaves errno alone.
 ///
 /// May be called from any thread.
-class SystemLog {
+class SystemLog : private base::NotCopied {
   public:
-    SystemLog() = default;
-    SystemLog(const SystemLog&) = delete;
-    SystemLog& operator=(const SystemLog&) = delete;
     virtual ~SystemLog() = default;
 
     virtual void write(LogLevel level, std::string_view text, const LogFields& fields) = 0;

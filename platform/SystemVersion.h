@@ -1,16 +1,15 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <optional>
 #include <string>
 
 namespace platform {
 
 /// Which system this is.
-class SystemVersion {
+class SystemVersion : private base::NotCopied {
   public:
-    SystemVersion() = default;
-    SystemVersion(const SystemVersion&) = delete;
-    SystemVersion& operator=(const SystemVersion&) = delete;
     virtual ~SystemVersion() = default;
 
     /// The build of the system, or none when it is not known.

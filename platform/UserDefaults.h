@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Value.h"
 
 #include <string_view>
@@ -7,11 +8,8 @@
 namespace platform {
 
 /// What the administrator of this machine has set, by domain.
-class UserDefaults {
+class UserDefaults : private base::NotCopied {
   public:
-    UserDefaults() = default;
-    UserDefaults(const UserDefaults&) = delete;
-    UserDefaults& operator=(const UserDefaults&) = delete;
     virtual ~UserDefaults() = default;
 
     /// All that is set in the domain; empty when nothing is. Read anew on every call, as one state

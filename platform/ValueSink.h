@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Value.h"
 
 #include <cstdint>
@@ -13,11 +14,8 @@ namespace platform {
 ///
 /// A map is beginMap, then key and value for each entry, sorted by the keys' bytes with no key
 /// twice, then endMap. A list is beginList, the values, endList. Sources keep to this.
-class ValueSink {
+class ValueSink : private base::NotCopied {
   public:
-    ValueSink() = default;
-    ValueSink(const ValueSink&) = delete;
-    ValueSink& operator=(const ValueSink&) = delete;
     virtual ~ValueSink() = default;
 
     virtual void beginMap() = 0;

@@ -1,5 +1,6 @@
 #include "bench/support/Benchmark.h"
 
+#include "base/NotCopied.h"
 #include "bench/support/SystemError.h"
 
 #include <CLI/CLI.hpp>
@@ -19,7 +20,7 @@ namespace {
 constexpr int kMaxRounds = 1000000;
 constexpr int kMaxEvents = 10000000;
 
-class PrivateDirectory {
+class PrivateDirectory : private base::NotCopied {
   public:
     explicit PrivateDirectory(const std::string& parent) {
         std::string pattern = std::filesystem::absolute(parent) / "kstd-bench.XXXXXX";
@@ -28,8 +29,6 @@ class PrivateDirectory {
         }
         path_ = pattern;
     }
-    PrivateDirectory(const PrivateDirectory&) = delete;
-    PrivateDirectory& operator=(const PrivateDirectory&) = delete;
     ~PrivateDirectory() {
         std::error_code ignored;
         std::filesystem::remove_all(path_, ignored);

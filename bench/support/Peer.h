@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 #include "wire/KernelSocket.h"
 
 #include <cstddef>
@@ -36,12 +37,10 @@ struct PeerScript {
 /// to the same peer.
 ///
 /// One connection is in use at a time.
-class Peer {
+class Peer : private base::NotCopied {
   public:
     /// Listens when this returns. Its processes run on the CPUs of this one.
     Peer(const std::string& socketPath, const PeerScript& script);
-    Peer(const Peer&) = delete;
-    Peer& operator=(const Peer&) = delete;
     ~Peer();
 
     /// How many struct calls were answered so far.

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 #include "bench/support/SystemError.h"
 #include "platform/SystemLog.h"
 
@@ -18,7 +19,7 @@ class NullLog final : public platform::SystemLog {
 
 /// Sends standard error to /dev/null until the end of the scope, so that the daemon's own log does
 /// all its work and nobody has to read it.
-class QuietStandardError {
+class QuietStandardError : private base::NotCopied {
   public:
     QuietStandardError() : saved_(::fcntl(STDERR_FILENO, F_DUPFD_CLOEXEC, 0)) {
         const base::FileDescriptor nowhere(::open("/dev/null", O_WRONLY | O_CLOEXEC));
@@ -26,8 +27,6 @@ class QuietStandardError {
             throw systemError("cannot send standard error to /dev/null");
         }
     }
-    QuietStandardError(const QuietStandardError&) = delete;
-    QuietStandardError& operator=(const QuietStandardError&) = delete;
     ~QuietStandardError() { ::dup2(saved_.get(), STDERR_FILENO); }
 
   private:

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 
 #include <string>
 #include <string_view>
@@ -11,12 +12,10 @@ namespace bench {
 
 /// A program that runs as long as this lives, and is killed then. What it writes to its standard
 /// output and standard error is read by awaitText alone.
-class StartedProgram {
+class StartedProgram : private base::NotCopied {
   public:
     /// Throws when it cannot be started.
     explicit StartedProgram(const std::vector<std::string>& arguments);
-    StartedProgram(const StartedProgram&) = delete;
-    StartedProgram& operator=(const StartedProgram&) = delete;
     ~StartedProgram();
 
     [[nodiscard]] pid_t pid() const { return pid_; }

@@ -1,5 +1,6 @@
 #include "KSTLib/CredentialSerialization.h"
 #include "base/Concat.h"
+#include "base/NotCopied.h"
 #include "kstctl/decode/Decoded.h"
 #include "kstctl/decode/Decoders.h"
 #include "kstctl/decode/Payloads.h"
@@ -46,10 +47,7 @@ Report::Datum passphraseOf(const KSTCredential& credential, Bytes area, Secrets 
 }
 
 /// Gives a list back to the library at the end of the scope.
-struct CredentialList {
-    CredentialList() = default;
-    CredentialList(const CredentialList&) = delete;
-    CredentialList& operator=(const CredentialList&) = delete;
+struct CredentialList : private base::NotCopied {
     ~CredentialList() {
         if (credentials != nullptr) {
             DeallocCredentialList(credentials, count);

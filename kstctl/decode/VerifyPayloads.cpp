@@ -3,6 +3,7 @@
 #include "KSTLib/RequestSerialization.h"
 #include "KSTLib/Serialization.h"
 #include "base/ByteReader.h"
+#include "base/NotCopied.h"
 #include "base/Saturate.h"
 #include "kstctl/Report.h"
 #include "kstctl/decode/Decoded.h"
@@ -14,10 +15,7 @@
 namespace kstctl::decode {
 
 /// Bytes that a deserialiser hands out, given back at the end of the scope.
-struct ReceivedBlob {
-    ReceivedBlob() = default;
-    ReceivedBlob(const ReceivedBlob&) = delete;
-    ReceivedBlob& operator=(const ReceivedBlob&) = delete;
+struct ReceivedBlob : private base::NotCopied {
     ~ReceivedBlob() { DeallocDataBlob(data, length); }
 
     [[nodiscard]] Bytes bytes() const { return {static_cast<const std::uint8_t*>(data), length}; }
@@ -28,10 +26,7 @@ struct ReceivedBlob {
 
 /// The parameters of a verify request as a deserialiser hands them out, given back at the end of
 /// the scope.
-struct ReceivedParameters {
-    ReceivedParameters() = default;
-    ReceivedParameters(const ReceivedParameters&) = delete;
-    ReceivedParameters& operator=(const ReceivedParameters&) = delete;
+struct ReceivedParameters : private base::NotCopied {
     ~ReceivedParameters();
 
     /// What they take on the wire, their number not counted.

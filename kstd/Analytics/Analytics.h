@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "kstd/Analytics/KSTDAnalyticsLogger.h"
 
 namespace kstd {
@@ -27,11 +28,8 @@ class Analytics final : public KSTDAnalyticsLogger {
 /// The loggers, their stores and the cached system version are there once in a process and refer to
 /// the host; the end of the lifetime releases them. A logger that somebody still holds then goes
 /// with its last holder.
-class AnalyticsLifetime {
+class AnalyticsLifetime : private base::NotCopied {
   public:
-    AnalyticsLifetime() = default;
-    AnalyticsLifetime(const AnalyticsLifetime&) = delete;
-    AnalyticsLifetime& operator=(const AnalyticsLifetime&) = delete;
     ~AnalyticsLifetime();
 };
 

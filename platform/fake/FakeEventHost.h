@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Clock.h"
 #include "platform/Date.h"
 #include "platform/EventStream.h"
@@ -150,11 +151,9 @@ class FakeMainRunLoop final : public MainRunLoop {
 /// The events of one process: its streams, alarms, run loop and transactions over one queue and one
 /// virtual clock. The clock and the alarm store belong to the machine: a second FakeEventHost on
 /// the same ones is a process started later.
-class FakeEventHost {
+class FakeEventHost : private base::NotCopied {
   public:
     FakeEventHost(FakeClock& clock, FakeAlarmStore& alarmStore);
-    FakeEventHost(const FakeEventHost&) = delete;
-    FakeEventHost& operator=(const FakeEventHost&) = delete;
     /// Destroys the handlers and what they hold first, while all that they may use is still there.
     ~FakeEventHost();
 

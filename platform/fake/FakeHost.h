@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Host.h"
 #include "platform/fake/FakeClock.h"
 #include "platform/fake/FakeConfiguration.h"
@@ -16,10 +17,8 @@
 namespace platform {
 
 /// What outlives a process. It begins with an empty state directory, as an installed system does.
-struct FakeMachine {
+struct FakeMachine : private base::NotCopied {
     FakeMachine();
-    FakeMachine(const FakeMachine&) = delete;
-    FakeMachine& operator=(const FakeMachine&) = delete;
     ~FakeMachine();
 
     FakeClock clock;
@@ -32,11 +31,9 @@ struct FakeMachine {
 
 /// All that one process sees of a FakeMachine. A second FakeHost on the same machine is a process
 /// started later: it finds the files, the alarms and the kernel side as the first one left them.
-class FakeHost {
+class FakeHost : private base::NotCopied {
   public:
     explicit FakeHost(FakeMachine& machine);
-    FakeHost(const FakeHost&) = delete;
-    FakeHost& operator=(const FakeHost&) = delete;
     ~FakeHost();
 
     /// The host as a program gets it. It lasts as long as this.

@@ -1,6 +1,7 @@
 #include "platform/host/HTTPRequests.h"
 
 #include "base/Concat.h"
+#include "base/NotCopied.h"
 
 #include <algorithm>
 #include <condition_variable>
@@ -87,12 +88,10 @@ class FirstOutcome {
 };
 
 /// Refuses when nobody can answer any more.
-class PendingAnswer {
+class PendingAnswer : private base::NotCopied {
   public:
     PendingAnswer(std::shared_ptr<FirstOutcome> outcome, const AuthenticationChallenge& challenge)
         : outcome_(std::move(outcome)), trust_(challenge.trust) {}
-    PendingAnswer(const PendingAnswer&) = delete;
-    PendingAnswer& operator=(const PendingAnswer&) = delete;
     ~PendingAnswer() { outcome_->offer(ChallengeOutcome::refused); }
 
     void answer(ChallengeDisposition disposition,

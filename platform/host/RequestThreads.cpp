@@ -1,5 +1,7 @@
 #include "platform/host/RequestThreads.h"
 
+#include "base/NotCopied.h"
+
 #include <csignal>
 #include <iterator>
 #include <system_error>
@@ -10,15 +12,13 @@ namespace platform {
 namespace {
 
 /// Threads made while this lasts take no signals.
-class SignalsBlocked {
+class SignalsBlocked : private base::NotCopied {
   public:
     SignalsBlocked() {
         sigset_t all;
         ::sigfillset(&all);
         ::pthread_sigmask(SIG_SETMASK, &all, &before_);
     }
-    SignalsBlocked(const SignalsBlocked&) = delete;
-    SignalsBlocked& operator=(const SignalsBlocked&) = delete;
     ~SignalsBlocked() { ::pthread_sigmask(SIG_SETMASK, &before_, nullptr); }
 
   private:

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <functional>
 #include <list>
 #include <mutex>
@@ -10,11 +12,8 @@ namespace platform {
 /// A thread for each request of a session, which takes no signals: those of the process are for its
 /// main thread, and that of a broken connection must not end it. Those that have ended are joined
 /// when the next one starts. Any thread may start one, work of a request included.
-class RequestThreads {
+class RequestThreads : private base::NotCopied {
   public:
-    RequestThreads() = default;
-    RequestThreads(const RequestThreads&) = delete;
-    RequestThreads& operator=(const RequestThreads&) = delete;
     /// Waits for the end of all. Not from one of them.
     ~RequestThreads();
 

@@ -1,5 +1,7 @@
 #include "platform/host/SerialQueueOfOne.h"
 
+#include "base/NotCopied.h"
+
 #include <cstdio>
 #include <cstdlib>
 
@@ -17,7 +19,7 @@ namespace {
 } // namespace
 
 /// Begins when the caller's turn has come.
-class SerialQueueOfOne::Turn {
+class SerialQueueOfOne::Turn : private base::NotCopied {
   public:
     explicit Turn(SerialQueueOfOne& queue) : queue_(queue) {
         std::unique_lock lock(queue_.mutex_);
@@ -25,9 +27,6 @@ class SerialQueueOfOne::Turn {
         queue_.turnOver_.wait(lock, [&] { return queue_.served_ == ticket; });
         queue_.worker_ = std::this_thread::get_id();
     }
-
-    Turn(const Turn&) = delete;
-    Turn& operator=(const Turn&) = delete;
 
     ~Turn() {
         // Told with the lock held: the queue may be gone as soon as the last turn has let go of it.

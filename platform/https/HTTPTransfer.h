@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/HTTPSession.h"
 #include "platform/host/HTTPRequests.h"
 #include "platform/https/HTTPAnswer.h"
@@ -33,11 +34,8 @@ struct HTTPOptions {
 
 /// Who waits for the end of a transfer, and gives the body of its request piece by piece. Called on
 /// the thread that makes the transfer, while it does.
-class HTTPCaller {
+class HTTPCaller : private base::NotCopied {
   public:
-    HTTPCaller() = default;
-    HTTPCaller(const HTTPCaller&) = delete;
-    HTTPCaller& operator=(const HTTPCaller&) = delete;
     virtual ~HTTPCaller() = default;
 
     [[nodiscard]] virtual std::uint64_t bodySize() const = 0;
@@ -70,13 +68,10 @@ struct HTTPTransferSettings {
 ///
 /// A server that hangs up after an interim answer (a status below 200) has answered with it.
 /// A user and a password in a link are not sent.
-class HTTPTransfer {
+class HTTPTransfer : private base::NotCopied {
   public:
     HTTPTransfer(const HTTPRequest& request, const HTTPTransferSettings& settings,
                  HTTPCaller& caller);
-    HTTPTransfer(const HTTPTransfer&) = delete;
-    HTTPTransfer& operator=(const HTTPTransfer&) = delete;
-    ~HTTPTransfer() = default;
 
     /// Makes the request and waits for its end. Once.
     [[nodiscard]] HTTPReply perform();

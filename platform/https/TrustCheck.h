@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/HTTPSession.h"
 
 #include <memory>
@@ -31,13 +32,10 @@ class CertificateTrust final : public ServerTrust {
 
 /// Decides for a connection whether its server is trusted: evaluates, asks the delegate, and lets
 /// the handshake go on or fail.
-class TrustCheck {
+class TrustCheck : private base::NotCopied {
   public:
     /// `host` is a name or an address; `anchors` a file or a directory as in HTTPOptions.
     TrustCheck(std::string host, std::string anchors, std::weak_ptr<HTTPSessionDelegate> delegate);
-    TrustCheck(const TrustCheck&) = delete;
-    TrustCheck& operator=(const TrustCheck&) = delete;
-    ~TrustCheck() = default;
 
     /// Makes this the only check of the connections of `context`, with no other trust anchors. This
     /// must outlast them. False when `context` cannot be made to; it must then not be used.

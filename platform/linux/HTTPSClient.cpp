@@ -1,6 +1,7 @@
 #include "platform/linux/HTTPSClient.h"
 
 #include "base/Concat.h"
+#include "base/NotCopied.h"
 #include "platform/HTTPSession.h"
 #include "platform/linux/LocalConnection.h"
 #include "wire/HTTPMessages.h"
@@ -26,7 +27,7 @@ namespace {
 constexpr int kEndMilliseconds = 1000;
 
 /// What a program is started with.
-class SpawnSettings {
+class SpawnSettings : private base::NotCopied {
   public:
     explicit SpawnSettings(int connection) {
         ::posix_spawn_file_actions_init(&actions_);
@@ -42,8 +43,6 @@ class SpawnSettings {
         ::posix_spawnattr_setsigdefault(&attributes_, &signals);
         ::posix_spawnattr_setflags(&attributes_, POSIX_SPAWN_SETSIGMASK | POSIX_SPAWN_SETSIGDEF);
     }
-    SpawnSettings(const SpawnSettings&) = delete;
-    SpawnSettings& operator=(const SpawnSettings&) = delete;
     ~SpawnSettings() {
         ::posix_spawn_file_actions_destroy(&actions_);
         ::posix_spawnattr_destroy(&attributes_);

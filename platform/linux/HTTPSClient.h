@@ -27,8 +27,6 @@ class ConnectedProgram {
 
     ConnectedProgram(ConnectedProgram&& other) noexcept;
     ConnectedProgram& operator=(ConnectedProgram&&) = delete;
-    ConnectedProgram(const ConnectedProgram&) = delete;
-    ConnectedProgram& operator=(const ConnectedProgram&) = delete;
     /// Waits for the program's end for a little while and kills it then. It should have been hung
     /// up on before.
     ~ConnectedProgram();

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 #include "base/UnixAddress.h"
 #include "platform/KernelConnections.h"
 #include "platform/SystemLog.h"
@@ -24,11 +25,8 @@ inline constexpr std::chrono::milliseconds kKernelTimeout{5000};
 inline constexpr std::string_view kDaemonName = "kstd";
 
 /// Pages for one message at a time, and a mark in them. In a child of the process both are zero.
-class MessagePages {
+class MessagePages : private base::NotCopied {
   public:
-    MessagePages() = default;
-    MessagePages(const MessagePages&) = delete;
-    MessagePages& operator=(const MessagePages&) = delete;
     ~MessagePages();
 
     /// False when there is no memory. What is there already stays.
@@ -63,7 +61,7 @@ class MessagePages {
 ///
 /// A connection that cannot be made leaves a warning with the socket's path and the reason, under
 /// the program's name. A reason is told once, until a connection was made.
-class KernelSocketConnection {
+class KernelSocketConnection : private base::NotCopied {
   public:
     using Deadline = KernelConnections::Deadline;
 
@@ -72,11 +70,8 @@ class KernelSocketConnection {
 
     /// A reply, which points into the connection's pages until the next exchange. Its bytes are
     /// wiped when it goes, since they may be secret.
-    class Reply {
+    class Reply : private base::NotCopied {
       public:
-        Reply() = default;
-        Reply(const Reply&) = delete;
-        Reply& operator=(const Reply&) = delete;
         ~Reply();
 
         /// The kernel side's word on the request.
@@ -99,8 +94,6 @@ class KernelSocketConnection {
     KernelSocketConnection(std::string_view path, SystemLog& log, std::chrono::milliseconds timeout,
                            std::string_view program = kDaemonName)
         : KernelSocketConnection(base::UnixAddress::of(path), log, timeout, program) {}
-    KernelSocketConnection(const KernelSocketConnection&) = delete;
-    KernelSocketConnection& operator=(const KernelSocketConnection&) = delete;
     virtual ~KernelSocketConnection() = default;
 
     /// Connects if that is not done. A status other than 0 is the platform's or the greeting's.

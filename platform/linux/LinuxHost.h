@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 #include "platform/Host.h"
 #include "platform/SystemLog.h"
 #include "platform/linux/Paths.h"
@@ -40,13 +41,11 @@ struct LinuxHostOptions {
 ///
 /// Handlers and what they hold are destroyed first when the host goes, while every interface that
 /// they use is still there.
-class LinuxHost {
+class LinuxHost : private base::NotCopied {
   public:
     /// Throws std::system_error, and leaves a line, when the system refuses what the host cannot be
     /// without: descriptors, above all.
     explicit LinuxHost(LinuxHostOptions options);
-    LinuxHost(const LinuxHost&) = delete;
-    LinuxHost& operator=(const LinuxHost&) = delete;
     ~LinuxHost();
 
     [[nodiscard]] Host interfaces();

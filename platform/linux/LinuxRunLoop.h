@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/MainRunLoop.h"
 #include "platform/SystemLog.h"
 
@@ -17,12 +18,10 @@ class LinuxRunLoop;
 
 /// One thing that a run loop waits for; it stops waiting when this is destroyed, which the handler
 /// itself may do. Main thread only, and the run loop outlives it.
-class RunLoopSource {
+class RunLoopSource : private base::NotCopied {
   public:
     using Handler = std::function<void()>;
 
-    RunLoopSource(const RunLoopSource&) = delete;
-    RunLoopSource& operator=(const RunLoopSource&) = delete;
     ~RunLoopSource();
 
     void setEnabled(bool enabled);

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/HTTPSession.h"
 #include "platform/linux/RemoteHTTPSessions.h"
 #include "wire/HTTPConnection.h"
@@ -29,13 +30,10 @@ inline constexpr char kStoppedDescription[] = "transfer failed: the daemon is as
 
 /// One request over a connection to the HTTPS client: gives it the request, and whatever it asks
 /// for, until it has answered. The request must have passed refusalOf. All three must outlast this.
-class RemoteHTTPExchange {
+class RemoteHTTPExchange : private base::NotCopied {
   public:
     RemoteHTTPExchange(wire::HTTPConnection& connection, const HTTPRequest& request,
                        const RemoteHTTPSettings& settings);
-    RemoteHTTPExchange(const RemoteHTTPExchange&) = delete;
-    RemoteHTTPExchange& operator=(const RemoteHTTPExchange&) = delete;
-    ~RemoteHTTPExchange() = default;
 
     /// Makes the request and waits for its end, up to the limits. Once.
     [[nodiscard]] HTTPReply perform();

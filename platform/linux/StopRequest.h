@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 
 namespace platform {
 
@@ -10,12 +11,9 @@ namespace platform {
 ///
 /// Made before the process has other threads, because these take over what is blocked. When no
 /// descriptor can be had, the signal goes on ending the process at once.
-class StopRequest {
+class StopRequest : private base::NotCopied {
   public:
     StopRequest();
-    StopRequest(const StopRequest&) = delete;
-    StopRequest& operator=(const StopRequest&) = delete;
-    ~StopRequest() = default;
 
     /// Any thread.
     [[nodiscard]] bool isMade() const;

@@ -1,6 +1,7 @@
 // What C++ has beside the functions, without a kernel service.
 
 #include "KSTLib/KSTLib.hpp"
+#include "base/NotCopied.h"
 #include "tests/KSTLib/ChannelFixture.h"
 #include "tests/common/RequirementSamples.h"
 
@@ -115,14 +116,12 @@ TEST(CxxPassphrase, HoldsUpToItsRoomAndMovesOut) {
 }
 
 /// Both ends of a pipe with some bytes in it.
-struct FilledPipe {
+struct FilledPipe : private base::NotCopied {
     explicit FilledPipe(const std::string& bytes) {
         EXPECT_EQ(::pipe2(ends.data(), O_CLOEXEC), 0);
         EXPECT_EQ(::write(ends[1], bytes.data(), bytes.size()), static_cast<ssize_t>(bytes.size()));
         ::close(ends[1]);
     }
-    FilledPipe(const FilledPipe&) = delete;
-    FilledPipe& operator=(const FilledPipe&) = delete;
     ~FilledPipe() { ::close(ends[0]); }
 
     [[nodiscard]] kst::Result<kst::Passphrase> read() const {
@@ -150,11 +149,9 @@ TEST(CxxPassphrase, ALineThatIsTooLongIsReadToItsEnd) {
 }
 
 /// A terminal, and who sits at it.
-class Terminal {
+class Terminal : private base::NotCopied {
   public:
     Terminal() { EXPECT_EQ(::openpty(&keyboard_, &line_, nullptr, nullptr, nullptr), 0); }
-    Terminal(const Terminal&) = delete;
-    Terminal& operator=(const Terminal&) = delete;
     ~Terminal() {
         ::close(keyboard_);
         ::close(line_);

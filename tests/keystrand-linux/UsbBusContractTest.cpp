@@ -2,6 +2,7 @@
 // one that reads and writes a directory like sysfs, with a small kernel behind it.
 
 #include "base/Concat.h"
+#include "base/NotCopied.h"
 #include "keystrand-linux/SysfsUsbBus.h"
 #include "tests/keystrand-linux/FakeSysfs.h"
 #include "tests/keystrand/LoopTurns.h"
@@ -22,11 +23,8 @@ class NoLog : public GateLog {
 };
 
 /// A machine and the bus that shows it.
-class Bench {
+class Bench : private base::NotCopied {
   public:
-    Bench() = default;
-    Bench(const Bench&) = delete;
-    Bench& operator=(const Bench&) = delete;
     virtual ~Bench() = default;
 
     [[nodiscard]] virtual FakeUsbBus& machine() = 0;

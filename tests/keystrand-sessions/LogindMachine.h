@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "keystrand-sessions/Logind.h"
 
 #include <functional>
@@ -10,11 +11,8 @@ namespace keystrand::sessions {
 
 /// A machine with a logind: what happens there, for the tests of whoever listens to it. At first no
 /// logind runs.
-class LogindMachine {
+class LogindMachine : private base::NotCopied {
   public:
-    LogindMachine() = default;
-    LogindMachine(const LogindMachine&) = delete;
-    LogindMachine& operator=(const LogindMachine&) = delete;
     virtual ~LogindMachine() = default;
 
     /// The one that is listened to.

@@ -22,8 +22,6 @@ class PacketSocket {
     explicit PacketSocket(int fd) : fd_(fd) {}
     PacketSocket(PacketSocket&& other) noexcept;
     PacketSocket& operator=(PacketSocket&& other) noexcept;
-    PacketSocket(const PacketSocket&) = delete;
-    PacketSocket& operator=(const PacketSocket&) = delete;
     ~PacketSocket();
 
     /// A client of a listening SOCK_SEQPACKET socket.

@@ -44,8 +44,6 @@ class FakeTimers : public Timers {
             : all(timers), handler(std::move(called)) {
             all.timers_.push_back(this);
         }
-        FakeTimer(const FakeTimer&) = delete;
-        FakeTimer& operator=(const FakeTimer&) = delete;
         ~FakeTimer() override { std::erase(all.timers_, this); }
 
         void startFor(Time time) override { end = all.now_ + time; }

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "tests/support/ScriptedTransport.h"
 
 #include <optional>
@@ -7,11 +8,9 @@
 namespace support {
 
 /// A scripted transport for the functions that hand over a null context: one at a time.
-class ContextlessTransport : public ScriptedTransport {
+class ContextlessTransport : public ScriptedTransport, private base::NotCopied {
   public:
     ContextlessTransport() { current = this; }
-    ContextlessTransport(const ContextlessTransport&) = delete;
-    ContextlessTransport& operator=(const ContextlessTransport&) = delete;
     ~ContextlessTransport() { current = nullptr; }
 
     /// Whether every context that was handed over was null.

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <stdlib.h>
 #include <string>
 #include <utility>
@@ -7,13 +9,11 @@
 namespace support {
 
 /// A variable of the environment that is set for a while, and then not set at all.
-class EnvironmentVariable {
+class EnvironmentVariable : private base::NotCopied {
   public:
     EnvironmentVariable(std::string name, const std::string& value) : name_(std::move(name)) {
         ::setenv(name_.c_str(), value.c_str(), 1);
     }
-    EnvironmentVariable(const EnvironmentVariable&) = delete;
-    EnvironmentVariable& operator=(const EnvironmentVariable&) = delete;
     ~EnvironmentVariable() { ::unsetenv(name_.c_str()); }
 
   private:

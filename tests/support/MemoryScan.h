@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <algorithm>
 #include <array>
 #include <cstdint>
@@ -19,7 +21,7 @@ namespace support {
 
 /// Looks for a secret in everything that the process can write to. The secret is known here only
 /// with its bits turned round, so that looking for it makes no copy.
-class MemoryScan {
+class MemoryScan : private base::NotCopied {
   public:
     static constexpr std::size_t kSecretSize = 16;
     using Turned = std::array<std::uint8_t, kSecretSize>;
@@ -30,8 +32,6 @@ class MemoryScan {
             throw std::runtime_error("cannot read the process's memory");
         }
     }
-    MemoryScan(const MemoryScan&) = delete;
-    MemoryScan& operator=(const MemoryScan&) = delete;
     ~MemoryScan() { ::close(memory_); }
 
     /// How many places hold at least the first half of the secret.
@@ -107,7 +107,7 @@ class MemoryScan {
 
 /// A stack that one piece of work has for itself, and that can be looked at afterwards: nobody else
 /// has written over what was left on it.
-class OwnStack {
+class OwnStack : private base::NotCopied {
   public:
     /// Four bytes with their bits turned round, as with MemoryScan.
     using TurnedWord = std::array<std::uint8_t, 4>;
@@ -119,8 +119,6 @@ class OwnStack {
             throw std::runtime_error("no memory for a stack");
         }
     }
-    OwnStack(const OwnStack&) = delete;
-    OwnStack& operator=(const OwnStack&) = delete;
     ~OwnStack() { ::munmap(bytes_, kSize); }
 
     /// Runs `work` to its end.

@@ -1,12 +1,14 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <cstddef>
 #include <pthread.h>
 
 namespace support {
 
 /// Threads made while this lasts want more stack than there can be.
-class NoThreads {
+class NoThreads : private base::NotCopied {
   public:
     NoThreads() {
         ::pthread_getattr_default_np(&before_);
@@ -16,8 +18,6 @@ class NoThreads {
         ::pthread_setattr_default_np(&attributes);
         ::pthread_attr_destroy(&attributes);
     }
-    NoThreads(const NoThreads&) = delete;
-    NoThreads& operator=(const NoThreads&) = delete;
     ~NoThreads() {
         ::pthread_setattr_default_np(&before_);
         ::pthread_attr_destroy(&before_);

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <chrono>
 #include <optional>
 #include <string>
@@ -15,13 +17,11 @@ inline constexpr std::chrono::seconds kPatience{30};
 
 /// A program started by a test. Its standard output and standard error arrive as lines; it is
 /// killed at the end of the test if it still runs.
-class Program {
+class Program : private base::NotCopied {
   public:
     enum class Input { ofTest, pipe };
 
     explicit Program(const std::vector<std::string>& arguments, Input input = Input::ofTest);
-    Program(const Program&) = delete;
-    Program& operator=(const Program&) = delete;
     ~Program();
 
     [[nodiscard]] pid_t pid() const { return pid_; }

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <cstdint>
 #include <functional>
 #include <poll.h>
@@ -20,7 +22,7 @@ using Packet = std::vector<std::uint8_t>;
 /// A peer on a SOCK_SEQPACKET socket whose every move a test writes: it hands each connection to
 /// the test's function, on a thread for each. What the function writes is read after the server's
 /// end, or is atomic.
-class SeqpacketServer {
+class SeqpacketServer : private base::NotCopied {
   public:
     /// One connection, seen from the server.
     class Peer {
@@ -71,8 +73,6 @@ class SeqpacketServer {
         }
         thread_ = std::thread([this] { run(); });
     }
-    SeqpacketServer(const SeqpacketServer&) = delete;
-    SeqpacketServer& operator=(const SeqpacketServer&) = delete;
     ~SeqpacketServer() {
         const std::uint64_t one = 1;
         static_cast<void>(::write(stop_, &one, sizeof one));

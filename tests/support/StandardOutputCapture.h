@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <gtest/gtest.h>
 
 #include <cstdio>
@@ -15,7 +17,7 @@ namespace support {
 ///
 /// GoogleTest says on standard output why a test fails. So what was taken is given back at the end
 /// when the test has failed.
-class StandardOutputCapture {
+class StandardOutputCapture : private base::NotCopied {
   public:
     StandardOutputCapture()
         : file_(::memfd_create("standard-output", MFD_CLOEXEC)), saved_(::dup(STDOUT_FILENO)) {
@@ -24,8 +26,6 @@ class StandardOutputCapture {
             throw std::runtime_error("cannot capture standard output");
         }
     }
-    StandardOutputCapture(const StandardOutputCapture&) = delete;
-    StandardOutputCapture& operator=(const StandardOutputCapture&) = delete;
     ~StandardOutputCapture() {
         std::fflush(stdout);
         ::dup2(saved_, STDOUT_FILENO);

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <cstdint>
 #include <optional>
 #include <sys/types.h>
@@ -7,12 +9,10 @@
 namespace support {
 
 /// Holds a running program at its system calls, one stop before and one after each.
-class SystemCallStepper {
+class SystemCallStepper : private base::NotCopied {
   public:
     /// Stops the program where it is. It must be a child of this process.
     explicit SystemCallStepper(pid_t program);
-    SystemCallStepper(const SystemCallStepper&) = delete;
-    SystemCallStepper& operator=(const SystemCallStepper&) = delete;
     /// Lets the program go if it still runs.
     ~SystemCallStepper();
 

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <filesystem>
 #include <stdexcept>
 #include <stdlib.h>
@@ -8,7 +10,7 @@
 namespace support {
 
 /// A private directory for one test, removed with everything in it at the end.
-class TemporaryDirectory {
+class TemporaryDirectory : private base::NotCopied {
   public:
     TemporaryDirectory() {
         std::string pattern =
@@ -18,8 +20,6 @@ class TemporaryDirectory {
         }
         path_ = pattern;
     }
-    TemporaryDirectory(const TemporaryDirectory&) = delete;
-    TemporaryDirectory& operator=(const TemporaryDirectory&) = delete;
     ~TemporaryDirectory() {
         std::error_code ignored;
         std::filesystem::remove_all(path_, ignored);

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <csignal>
 #include <ctime>
 #include <unistd.h>
@@ -8,14 +10,12 @@ namespace support {
 
 /// SIGTERM for this process, which something in the test keeps from ending it. Afterwards it is as
 /// if there had been none: neither blocked nor pending.
-class TerminationSignal {
+class TerminationSignal : private base::NotCopied {
   public:
     TerminationSignal() {
         ::sigemptyset(&signals_);
         ::sigaddset(&signals_, SIGTERM);
     }
-    TerminationSignal(const TerminationSignal&) = delete;
-    TerminationSignal& operator=(const TerminationSignal&) = delete;
     ~TerminationSignal() {
         const timespec noTime{};
         ::sigtimedwait(&signals_, nullptr, &noTime);

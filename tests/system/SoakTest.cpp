@@ -2,6 +2,7 @@
 
 #include "KSTLib/AllocatedBytes.h"
 #include "KSTLib/Platform.h"
+#include "base/NotCopied.h"
 #include "kstd/Analytics/Analytics.h"
 #include "kstd/Daemon.h"
 #include "platform/linux/EventSocket.h"
@@ -48,15 +49,13 @@ struct Footprint {
 };
 
 /// Sends what is written to standard error nowhere while it lives.
-class QuietStandardError {
+class QuietStandardError : private base::NotCopied {
   public:
     QuietStandardError() : saved_(::dup(STDERR_FILENO)) {
         const int nowhere = ::open("/dev/null", O_WRONLY | O_CLOEXEC);
         ::dup2(nowhere, STDERR_FILENO);
         ::close(nowhere);
     }
-    QuietStandardError(const QuietStandardError&) = delete;
-    QuietStandardError& operator=(const QuietStandardError&) = delete;
     ~QuietStandardError() {
         ::dup2(saved_, STDERR_FILENO);
         ::close(saved_);

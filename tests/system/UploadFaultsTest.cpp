@@ -1,6 +1,7 @@
 // Uploads of the real daemon to servers that are not in order, or not there.
 
 #include "base/Concat.h"
+#include "base/NotCopied.h"
 #include "tests/system/UploadFixture.h"
 
 #include <arpa/inet.h>
@@ -16,7 +17,7 @@ using base::concat;
 constexpr char kFailed[] = "Error in uploading the events to splunk: ";
 
 /// A port of this machine that nobody listens on, and nobody else can take.
-class ClosedPort {
+class ClosedPort : private base::NotCopied {
   public:
     ClosedPort() : socket_(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
         address_.sin_family = AF_INET;
@@ -25,8 +26,6 @@ class ClosedPort {
         EXPECT_EQ(::bind(socket_, reinterpret_cast<sockaddr*>(&address_), size), 0);
         EXPECT_EQ(::getsockname(socket_, reinterpret_cast<sockaddr*>(&address_), &size), 0);
     }
-    ClosedPort(const ClosedPort&) = delete;
-    ClosedPort& operator=(const ClosedPort&) = delete;
     ~ClosedPort() { ::close(socket_); }
 
     [[nodiscard]] int number() const { return ntohs(address_.sin_port); }

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Date.h"
 
 #include <optional>
@@ -10,11 +11,8 @@ namespace kstd {
 
 /// Dates as texts in the pattern yyyy-MM-dd'T'HH:mm:ssZZZZZ, Gregorian calendar. Whoever wants
 /// another pattern overrides both directions. Has no state: may be used from any thread.
-class DateFormatter {
+class DateFormatter : private base::NotCopied {
   public:
-    DateFormatter() = default;
-    DateFormatter(const DateFormatter&) = delete;
-    DateFormatter& operator=(const DateFormatter&) = delete;
     virtual ~DateFormatter() = default;
 
     /// In UTC, with "Z". A fraction of a second is cut off towards the past. A date outside the

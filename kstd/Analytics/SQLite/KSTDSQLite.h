@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "kstd/Analytics/SQLite/DatabaseEnvironment.h"
 #include "kstd/Analytics/SQLite/DatabaseTexts.h"
 #include "kstd/Analytics/SQLite/DateFormatter.h"
@@ -29,11 +30,8 @@ class KSTDSQLite;
 
 /// Knows the revision of its owner's tables and how to bring older ones up to it. Called while the
 /// database is being opened, on the thread that opens it.
-class KSTDSQLiteDelegate {
+class KSTDSQLiteDelegate : private base::NotCopied {
   public:
-    KSTDSQLiteDelegate() = default;
-    KSTDSQLiteDelegate(const KSTDSQLiteDelegate&) = delete;
-    KSTDSQLiteDelegate& operator=(const KSTDSQLiteDelegate&) = delete;
     virtual ~KSTDSQLiteDelegate() = default;
 
     /// The revision that the tables shall have; 0 means that revisions are not used.
@@ -82,13 +80,11 @@ template <typename Record>
 /// and column names are put into texts as they stand, values never: they are bound.
 ///
 /// Takes no lock: one instance belongs to one serial queue at a time.
-class KSTDSQLite {
+class KSTDSQLite : private base::NotCopied {
   public:
     /// Does not touch the file. `path` is absolute. What the environment refers to outlives the
     /// database.
     KSTDSQLite(std::string path, std::string schema, const DatabaseEnvironment& environment);
-    KSTDSQLite(const KSTDSQLite&) = delete;
-    KSTDSQLite& operator=(const KSTDSQLite&) = delete;
     /// Closes once. A connection that is open even then is released without a line.
     virtual ~KSTDSQLite();
 

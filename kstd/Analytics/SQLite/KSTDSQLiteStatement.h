@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Value.h"
 
 #include <cstddef>
@@ -25,14 +26,12 @@ struct DatabaseEnvironment;
 ///
 /// Failures of SQLite are logged and otherwise ignored: a parameter stays unbound, a failed step
 /// reads as the end of the rows. Indexes count from 0. Belongs to the serial queue of its database.
-class KSTDSQLiteStatement {
+class KSTDSQLiteStatement : private base::NotCopied {
   public:
     /// `handle` may be null, which SQLite gives for a text without a statement. The statement owns
     /// it.
     KSTDSQLiteStatement(KSTDSQLite* SQLite, const DatabaseEnvironment& environment, std::string SQL,
                         sqlite3_stmt* handle);
-    KSTDSQLiteStatement(const KSTDSQLiteStatement&) = delete;
-    KSTDSQLiteStatement& operator=(const KSTDSQLiteStatement&) = delete;
     /// Frees the handle, whatever state it is in.
     ~KSTDSQLiteStatement();
 

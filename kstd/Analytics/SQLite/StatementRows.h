@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "kstd/Analytics/SQLite/KSTDSQLite.h"
 #include "kstd/Analytics/SQLite/KSTDSQLiteStatement.h"
 
@@ -10,11 +11,9 @@
 namespace kstd {
 
 /// One use of a statement: ends with its reset, also when something is thrown in between.
-class StatementUse {
+class StatementUse : private base::NotCopied {
   public:
     explicit StatementUse(KSTDSQLiteStatement& statement) : statement_(statement) {}
-    StatementUse(const StatementUse&) = delete;
-    StatementUse& operator=(const StatementUse&) = delete;
     ~StatementUse() { statement_.reset(); }
 
     KSTDSQLiteStatement& operator*() const { return statement_; }

@@ -1,16 +1,14 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Date.h"
 
 namespace platform {
 
 /// Sees to it that somebody looks at the alarms when the earliest of them becomes due: this
 /// process, or one that is launched for it. Main thread only.
-class AlarmWaker {
+class AlarmWaker : private base::NotCopied {
   public:
-    AlarmWaker() = default;
-    AlarmWaker(const AlarmWaker&) = delete;
-    AlarmWaker& operator=(const AlarmWaker&) = delete;
     virtual ~AlarmWaker() = default;
 
     /// Waits for `date`, in the place of what was armed. One that is past wakes at once; one beyond

@@ -1,14 +1,12 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Clock.h"
 #include "tests/platform/contract/ContractTest.h"
 
 namespace contract {
 
-struct ClockFixture {
-    ClockFixture() = default;
-    ClockFixture(const ClockFixture&) = delete;
-    ClockFixture& operator=(const ClockFixture&) = delete;
+struct ClockFixture : private base::NotCopied {
     virtual ~ClockFixture() = default;
 
     virtual platform::Clock& clock() = 0;

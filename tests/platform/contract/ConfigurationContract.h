@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/ConfigurationResource.h"
 #include "platform/InternalDiagnostics.h"
 #include "platform/SystemVersion.h"
@@ -13,10 +14,7 @@
 namespace contract {
 
 /// User defaults, nothing set at first.
-struct UserDefaultsFixture {
-    UserDefaultsFixture() = default;
-    UserDefaultsFixture(const UserDefaultsFixture&) = delete;
-    UserDefaultsFixture& operator=(const UserDefaultsFixture&) = delete;
+struct UserDefaultsFixture : private base::NotCopied {
     virtual ~UserDefaultsFixture() = default;
 
     virtual platform::UserDefaults& defaults() = 0;
@@ -28,10 +26,7 @@ struct UserDefaultsFixture {
 using UserDefaultsContract = ContractTest<UserDefaultsFixture>;
 
 /// Configuration resources, none at first.
-struct ConfigurationResourceFixture {
-    ConfigurationResourceFixture() = default;
-    ConfigurationResourceFixture(const ConfigurationResourceFixture&) = delete;
-    ConfigurationResourceFixture& operator=(const ConfigurationResourceFixture&) = delete;
+struct ConfigurationResourceFixture : private base::NotCopied {
     virtual ~ConfigurationResourceFixture() = default;
 
     virtual platform::ConfigurationResource& resources() = 0;
@@ -44,10 +39,7 @@ struct ConfigurationResourceFixture {
 using ConfigurationResourceContract = ContractTest<ConfigurationResourceFixture>;
 
 /// A system of which nothing is known at first.
-struct SystemVersionFixture {
-    SystemVersionFixture() = default;
-    SystemVersionFixture(const SystemVersionFixture&) = delete;
-    SystemVersionFixture& operator=(const SystemVersionFixture&) = delete;
+struct SystemVersionFixture : private base::NotCopied {
     virtual ~SystemVersionFixture() = default;
 
     virtual platform::SystemVersion& version() = 0;
@@ -59,10 +51,7 @@ struct SystemVersionFixture {
 using SystemVersionContract = ContractTest<SystemVersionFixture>;
 
 /// Internal diagnostics, all off at first.
-struct InternalDiagnosticsFixture {
-    InternalDiagnosticsFixture() = default;
-    InternalDiagnosticsFixture(const InternalDiagnosticsFixture&) = delete;
-    InternalDiagnosticsFixture& operator=(const InternalDiagnosticsFixture&) = delete;
+struct InternalDiagnosticsFixture : private base::NotCopied {
     virtual ~InternalDiagnosticsFixture() = default;
 
     virtual platform::InternalDiagnostics& diagnostics() = 0;

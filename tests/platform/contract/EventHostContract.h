@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/EventStream.h"
 #include "platform/MainRunLoop.h"
 #include "platform/ManagedSettings.h"
@@ -16,10 +17,7 @@ namespace contract {
 
 /// A process with its events, on a system that keeps alarms. Its run loop has a source from the
 /// start.
-struct EventHostFixture {
-    EventHostFixture() = default;
-    EventHostFixture(const EventHostFixture&) = delete;
-    EventHostFixture& operator=(const EventHostFixture&) = delete;
+struct EventHostFixture : private base::NotCopied {
     virtual ~EventHostFixture() = default;
 
     virtual platform::EventStream& events() = 0;

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/Files.h"
 #include "tests/platform/contract/ContractTest.h"
 
@@ -15,10 +16,7 @@ using Bytes = std::vector<std::uint8_t>;
 
 /// A process with Files, on a system that has the directory /var/root and nothing in it. Paths are
 /// the ones that programs know.
-struct FilesFixture {
-    FilesFixture() = default;
-    FilesFixture(const FilesFixture&) = delete;
-    FilesFixture& operator=(const FilesFixture&) = delete;
+struct FilesFixture : private base::NotCopied {
     virtual ~FilesFixture() = default;
 
     virtual platform::Files& files() = 0;

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/HTTPSession.h"
 #include "tests/platform/contract/ContractTest.h"
 
@@ -11,10 +12,7 @@
 namespace contract {
 
 /// A server that answers "200" without a body, and sessions that reach it.
-struct HTTPSessionFixture {
-    HTTPSessionFixture() = default;
-    HTTPSessionFixture(const HTTPSessionFixture&) = delete;
-    HTTPSessionFixture& operator=(const HTTPSessionFixture&) = delete;
+struct HTTPSessionFixture : private base::NotCopied {
     virtual ~HTTPSessionFixture() = default;
 
     virtual platform::HTTPSessions& sessions() = 0;

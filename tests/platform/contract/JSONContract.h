@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/JSON.h"
 #include "tests/platform/contract/ContractTest.h"
 
@@ -8,10 +9,7 @@
 
 namespace contract {
 
-struct JSONFixture {
-    JSONFixture() = default;
-    JSONFixture(const JSONFixture&) = delete;
-    JSONFixture& operator=(const JSONFixture&) = delete;
+struct JSONFixture : private base::NotCopied {
     virtual ~JSONFixture() = default;
 
     virtual platform::JSON& json() = 0;

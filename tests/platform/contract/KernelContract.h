@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/KernelChannel.h"
 #include "platform/ServiceRegistry.h"
 #include "tests/platform/contract/ContractTest.h"
@@ -21,10 +22,7 @@ struct KernelAnswer {
 /// A process with its registry and channel, and a kernel side with the entry
 /// "IOService:/IOResources/Keystrand" of the class "Keystrand", without properties, that answers
 /// success without output.
-struct KernelFixture {
-    KernelFixture() = default;
-    KernelFixture(const KernelFixture&) = delete;
-    KernelFixture& operator=(const KernelFixture&) = delete;
+struct KernelFixture : private base::NotCopied {
     virtual ~KernelFixture() = default;
 
     virtual platform::ServiceRegistry& registry() = 0;

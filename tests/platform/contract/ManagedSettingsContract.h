@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/ManagedSettings.h"
 #include "tests/platform/contract/ContractTest.h"
 
@@ -8,10 +9,7 @@
 namespace contract {
 
 /// Managed settings, nothing set at first.
-struct ManagedSettingsFixture {
-    ManagedSettingsFixture() = default;
-    ManagedSettingsFixture(const ManagedSettingsFixture&) = delete;
-    ManagedSettingsFixture& operator=(const ManagedSettingsFixture&) = delete;
+struct ManagedSettingsFixture : private base::NotCopied {
     virtual ~ManagedSettingsFixture() = default;
 
     virtual platform::ManagedSettings& settings() = 0;

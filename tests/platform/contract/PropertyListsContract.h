@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/PropertyLists.h"
 #include "tests/platform/contract/ContractTest.h"
 
@@ -7,10 +8,7 @@
 
 namespace contract {
 
-struct PropertyListsFixture {
-    PropertyListsFixture() = default;
-    PropertyListsFixture(const PropertyListsFixture&) = delete;
-    PropertyListsFixture& operator=(const PropertyListsFixture&) = delete;
+struct PropertyListsFixture : private base::NotCopied {
     virtual ~PropertyListsFixture() = default;
 
     virtual platform::PropertyLists& propertyLists() = 0;

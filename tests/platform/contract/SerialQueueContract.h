@@ -1,14 +1,12 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/SerialQueue.h"
 #include "tests/platform/contract/ContractTest.h"
 
 namespace contract {
 
-struct SerialQueueFixture {
-    SerialQueueFixture() = default;
-    SerialQueueFixture(const SerialQueueFixture&) = delete;
-    SerialQueueFixture& operator=(const SerialQueueFixture&) = delete;
+struct SerialQueueFixture : private base::NotCopied {
     virtual ~SerialQueueFixture() = default;
 
     virtual platform::SerialQueues& queues() = 0;

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "platform/SystemLog.h"
 #include "tests/platform/contract/ContractTest.h"
 
@@ -9,10 +10,7 @@
 namespace contract {
 
 /// A log, and a look at the lines that it has written.
-struct SystemLogFixture {
-    SystemLogFixture() = default;
-    SystemLogFixture(const SystemLogFixture&) = delete;
-    SystemLogFixture& operator=(const SystemLogFixture&) = delete;
+struct SystemLogFixture : private base::NotCopied {
     virtual ~SystemLogFixture() = default;
 
     virtual platform::SystemLog& log() = 0;

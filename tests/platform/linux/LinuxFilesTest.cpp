@@ -1,5 +1,6 @@
 #include "platform/linux/LinuxFiles.h"
 
+#include "base/NotCopied.h"
 #include "platform/fake/FakeSystemLog.h"
 #include "tests/platform/linux/OpenDescriptors.h"
 #include "tests/platform/linux/RootDirectory.h"
@@ -27,11 +28,9 @@ using Bytes = std::vector<std::uint8_t>;
 constexpr char kPath[] = "/var/root/state";
 
 /// Sets the umask, until it is destroyed.
-class Umask {
+class Umask : private base::NotCopied {
   public:
     explicit Umask(mode_t mask) : before_(::umask(mask)) {}
-    Umask(const Umask&) = delete;
-    Umask& operator=(const Umask&) = delete;
     ~Umask() { ::umask(before_); }
 
   private:

@@ -1,5 +1,6 @@
 #include "platform/linux/LinuxRunLoop.h"
 
+#include "base/NotCopied.h"
 #include "platform/fake/FakeSystemLog.h"
 #include "platform/linux/LinuxClock.h"
 
@@ -15,11 +16,9 @@ namespace platform {
 namespace {
 
 /// A descriptor that is readable once `signal` was called.
-class Signal {
+class Signal : private base::NotCopied {
   public:
     Signal() : descriptor_(::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {}
-    Signal(const Signal&) = delete;
-    Signal& operator=(const Signal&) = delete;
     ~Signal() { ::close(descriptor_); }
 
     [[nodiscard]] int descriptor() const { return descriptor_; }

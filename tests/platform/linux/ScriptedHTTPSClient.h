@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 #include "base/UnixAddress.h"
 #include "wire/HTTPConnection.h"
 
@@ -18,7 +19,7 @@ namespace support {
 
 /// A socket on which a thread takes one connection after the other and does with each what the test
 /// says. What the test's function writes is read after the server's end, or is atomic.
-class ConnectionServer {
+class ConnectionServer : private base::NotCopied {
   public:
     using Serve = std::function<void(base::FileDescriptor)>;
 
@@ -34,8 +35,6 @@ class ConnectionServer {
         }
         thread_ = std::thread([this] { run(); });
     }
-    ConnectionServer(const ConnectionServer&) = delete;
-    ConnectionServer& operator=(const ConnectionServer&) = delete;
     ~ConnectionServer() {
         const std::uint64_t one = 1;
         static_cast<void>(::write(stop_.get(), &one, sizeof one));

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <fcntl.h>
 #include <stdexcept>
 #include <string>
@@ -10,7 +12,7 @@
 namespace support {
 
 /// Takes this process's standard error, from construction to destruction.
-class StandardErrorCapture {
+class StandardErrorCapture : private base::NotCopied {
   public:
     StandardErrorCapture()
         : original_(::dup(STDERR_FILENO)), file_(::memfd_create("standard-error", MFD_CLOEXEC)) {
@@ -20,8 +22,6 @@ class StandardErrorCapture {
             throw std::runtime_error("cannot redirect standard error");
         }
     }
-    StandardErrorCapture(const StandardErrorCapture&) = delete;
-    StandardErrorCapture& operator=(const StandardErrorCapture&) = delete;
     ~StandardErrorCapture() {
         ::dup2(original_, STDERR_FILENO);
         ::close(original_);

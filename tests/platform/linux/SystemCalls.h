@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <cstddef>
 #include <deque>
 #include <string>
@@ -9,11 +11,9 @@ namespace support {
 
 /// The system calls by which the Linux platform saves files, as the linker has wrapped them for
 /// this test program: they are noted, and can be made to fail.
-class SystemCalls {
+class SystemCalls : private base::NotCopied {
   public:
     SystemCalls();
-    SystemCalls(const SystemCalls&) = delete;
-    SystemCalls& operator=(const SystemCalls&) = delete;
     ~SystemCalls();
 
     /// What was called on which file while this exists: "pwrite <path> 13", "fsync <path>",

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 
 #include <gtest/gtest.h>
 
@@ -13,7 +14,7 @@ namespace kstd {
 
 /// Another process that holds a database when it is told to. It must be made before this process
 /// opens a database: SQLite does not work on across a fork.
-class LockHolder {
+class LockHolder : private base::NotCopied {
   public:
     explicit LockHolder(const std::string& path) {
         int toChild[2] = {-1, -1};
@@ -30,8 +31,6 @@ class LockHolder {
         orders_ = base::FileDescriptor(toChild[1]);
         answers_ = base::FileDescriptor(fromChild[0]);
     }
-    LockHolder(const LockHolder&) = delete;
-    LockHolder& operator=(const LockHolder&) = delete;
     ~LockHolder() {
         orders_.reset();
         int status = -1;

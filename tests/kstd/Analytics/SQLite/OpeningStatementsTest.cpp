@@ -1,6 +1,7 @@
 // What an opening asks of SQLite, statement by statement, and what it makes of the answers.
 
 #include "base/Concat.h"
+#include "base/NotCopied.h"
 #include "tests/kstd/Analytics/SQLite/DatabaseFixture.h"
 
 #include <algorithm>
@@ -12,14 +13,12 @@ namespace {
 
 /// While it exists each new connection of the process is handed to `prepare` before anybody uses
 /// it.
-class NewConnections {
+class NewConnections : private base::NotCopied {
   public:
     explicit NewConnections(std::function<void(sqlite3* db)> prepare) {
         prepare_ = std::move(prepare);
         sqlite3_auto_extension(reinterpret_cast<void (*)()>(hand));
     }
-    NewConnections(const NewConnections&) = delete;
-    NewConnections& operator=(const NewConnections&) = delete;
     ~NewConnections() {
         sqlite3_reset_auto_extension();
         prepare_ = nullptr;

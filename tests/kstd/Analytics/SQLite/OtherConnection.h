@@ -1,5 +1,7 @@
 #pragma once
 
+#include "base/NotCopied.h"
+
 #include <gtest/gtest.h>
 
 #include <sqlite3.h>
@@ -9,15 +11,13 @@
 namespace kstd {
 
 /// Looks at a database file, and works on it, without the code under test.
-class OtherConnection {
+class OtherConnection : private base::NotCopied {
   public:
     explicit OtherConnection(const std::string& path) {
         EXPECT_EQ(sqlite3_open_v2(path.c_str(), &db_, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE,
                                   nullptr),
                   SQLITE_OK);
     }
-    OtherConnection(const OtherConnection&) = delete;
-    OtherConnection& operator=(const OtherConnection&) = delete;
     ~OtherConnection() { EXPECT_EQ(sqlite3_close(db_), SQLITE_OK); }
 
     /// The result code.

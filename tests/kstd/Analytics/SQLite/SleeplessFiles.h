@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "kstd/Analytics/SQLite/DatabaseFile.h"
 
 #include <functional>
@@ -10,7 +11,7 @@ namespace kstd {
 
 /// While it exists connections of the code under test never sleep: where one would wait for a lock,
 /// `onSleep` is called with the time in microseconds.
-class SleeplessFiles {
+class SleeplessFiles : private base::NotCopied {
   public:
     explicit SleeplessFiles(std::function<void(int microseconds)> onSleep) {
         onSleep_ = std::move(onSleep);
@@ -21,8 +22,6 @@ class SleeplessFiles {
             return microseconds;
         };
     }
-    SleeplessFiles(const SleeplessFiles&) = delete;
-    SleeplessFiles& operator=(const SleeplessFiles&) = delete;
     ~SleeplessFiles() {
         files_->xSleep = sleep_;
         onSleep_ = nullptr;

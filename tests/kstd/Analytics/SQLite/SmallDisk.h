@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 #include "tests/support/Program.h"
 
 #include <gtest/gtest.h>
@@ -18,7 +19,7 @@ namespace kstd {
 
 /// A small file system of its own, seen by this process and its children only. Without the right to
 /// mount one there is none.
-class SmallDisk {
+class SmallDisk : private base::NotCopied {
   public:
     enum class Blocks {
         /// 1 MiB of memory, in pages.
@@ -33,8 +34,6 @@ class SmallDisk {
                    ::mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0 &&
                    (blocks == Blocks::pages ? mountMemory() : mountImage());
     }
-    SmallDisk(const SmallDisk&) = delete;
-    SmallDisk& operator=(const SmallDisk&) = delete;
     ~SmallDisk() {
         if (mounted_) {
             EXPECT_EQ(::umount2(path_.c_str(), MNT_DETACH), 0);
