@@ -22,6 +22,7 @@ constexpr std::chrono::milliseconds kTurn{500};
 constexpr const char* kUnwantedHeaders[] = {"Accept:", "Content-Type:", "Expect:"};
 
 void initialiseLibrary() {
+    // Two threads must not do it at once.
     static std::once_flag once;
     std::call_once(once, [] { curl_global_init(CURL_GLOBAL_DEFAULT); });
 }
@@ -65,6 +66,7 @@ curl_socket_t openSocket(void* /*unused*/, curlsocktype /*purpose*/,
 } // extern "C"
 
 std::string headerLine(const std::string& name, const std::string& value) {
+    // After a colon without a value the library would leave the header out.
     return value.empty() ? base::concat(name, ';') : base::concat(name, ": ", value);
 }
 
@@ -308,6 +310,7 @@ bool HTTPTransfer::addHeader(const std::string& line) {
     if (longer == nullptr) {
         return false;
     }
+    // The longer list is the same one: nothing may free it in between.
     static_cast<void>(headers_.release());
     headers_.reset(longer);
     return true;
@@ -323,6 +326,7 @@ bool HTTPTransfer::makeHeaders() {
 }
 
 HTTPReply HTTPTransfer::replyFor(CURLcode code) {
+    // Before the code, which only says that one of our functions has ended it.
     if (answer_.excess()) {
         return failedReply(kAnswerTooLarge, *answer_.excess());
     }

@@ -51,6 +51,7 @@ bool TrustCheck::requireHost(X509_VERIFY_PARAM* parameters) const {
     if (X509_VERIFY_PARAM_set1_ip_asc(parameters, host_.c_str()) == 1) {
         return true;
     }
+    // No address but a name. The error would stay with the thread and be taken for a later one's.
     ERR_clear_error();
     X509_VERIFY_PARAM_set_hostflags(parameters, X509_CHECK_FLAG_NEVER_CHECK_SUBJECT |
                                                     X509_CHECK_FLAG_NO_PARTIAL_WILDCARDS);
@@ -62,12 +63,14 @@ bool TrustCheck::loadAnchors(SSL_CTX* context) {
     if (store == nullptr) {
         return false;
     }
+    // The store is the context's from here on.
     SSL_CTX_set_cert_store(context, store);
     std::error_code ignored;
     hasAnchors_ = (std::filesystem::is_directory(anchors_, ignored)
                        ? X509_STORE_load_path(store, anchors_.c_str())
                        : X509_STORE_load_file(store, anchors_.c_str())) == 1;
     ERR_clear_error();
+    // Any certificate among the anchors ends a chain, also one that is no root.
     return X509_STORE_set_flags(store, X509_V_FLAG_TRUSTED_FIRST | X509_V_FLAG_PARTIAL_CHAIN) == 1;
 }
 

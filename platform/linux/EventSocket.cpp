@@ -61,6 +61,7 @@ EventSocket::EventSocket(base::FileDescriptor socket, LinuxRunLoop& loop, System
       log_(log),
       receiver_(std::move(receiver)),
       owner_(ownerOf(socket_.get())) {
+    // A socket from the init system has it set by its unit; one that was handed over may not.
     acceptCredentials(socket_.get());
     source_ = loop.addReadable(socket_.get(), [this] { receiveOne(); });
 }
@@ -70,6 +71,8 @@ bool EventSocket::mayServe(uid_t sender) const {
 }
 
 void EventSocket::receiveOne() {
+    // One datagram a turn of the loop: what is left in the socket outlives this process, what was
+    // received does not.
     iovec data{buffer_.data(), buffer_.size()};
     // Room for the credentials and nothing else: descriptors that come along are closed by the
     // system.
@@ -79,6 +82,7 @@ void EventSocket::receiveOne() {
     message.msg_iovlen = 1;
     message.msg_control = control.data();
     message.msg_controllen = control.size();
+    // With MSG_TRUNC the length is the datagram's own, also of one that did not fit.
     const ssize_t length =
         ::recvmsg(socket_.get(), &message, MSG_DONTWAIT | MSG_TRUNC | MSG_CMSG_CLOEXEC);
     if (length < 0) {
@@ -125,6 +129,7 @@ base::FileDescriptor takeActivatedEventSocket() {
     char** names = nullptr;
     const int count = sd_listen_fds_with_names(1, &names);
     base::FileDescriptor found;
+    // By name, because their order is not always the same. What has another name is closed.
     for (int i = 0; i < count; ++i) {
         base::FileDescriptor candidate(SD_LISTEN_FDS_START + i);
         const bool isEvents = std::string_view(names[i]) == kActivationName &&
@@ -145,6 +150,7 @@ base::FileDescriptor makeEventSocket(const std::string& path) {
         return base::FileDescriptor();
     }
     acceptCredentials(socket.get());
+    // The file that an earlier process has left would refuse the address.
     ::unlink(path.c_str());
     // The mode of the socket's file is that of the descriptor less the umask; the change afterwards
     // makes it exact.

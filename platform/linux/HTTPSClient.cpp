@@ -35,6 +35,7 @@ class SpawnSettings : private base::NotCopied {
         ::posix_spawn_file_actions_adddup2(&actions_, connection, wire::kHTTPConnectionDescriptor);
         ::posix_spawn_file_actions_addopen(&actions_, STDIN_FILENO, "/dev/null", O_RDONLY, 0);
         ::posix_spawn_file_actions_addclosefrom_np(&actions_, wire::kHTTPConnectionDescriptor + 1);
+        // What this thread blocks and what this process ignores is not for the program.
         sigset_t signals;
         ::sigemptyset(&signals);
         ::posix_spawnattr_init(&attributes_);
@@ -53,6 +54,7 @@ class SpawnSettings : private base::NotCopied {
         std::vector<char*> words;
         words.reserve(arguments.size() + 1);
         for (const std::string& argument : arguments) {
+            // Nothing writes to them; the function is older than const.
             words.push_back(const_cast<char*>(argument.c_str()));
         }
         words.push_back(nullptr);
@@ -100,6 +102,7 @@ ConnectedProgram::ConnectedProgram(ConnectedProgram&& other) noexcept
     : process_(std::exchange(other.process_, -1)), connection_(std::move(other.connection_)) {}
 
 ConnectedProgram::~ConnectedProgram() {
+    // This is what asks it to end.
     connection_.reset();
     if (process_ < 0) {
         return;

@@ -115,6 +115,7 @@ struct LinuxHost::Parts {
         if (std::exchange(closed, true)) {
             return;
         }
+        // The request stays readable for good, and would be served before what is still queued.
         stop.reset();
         sd_notify(0, "STOPPING=1");
         eventSocket.reset();

@@ -88,6 +88,7 @@ LinuxRunLoop::~LinuxRunLoop() {
 }
 
 bool LinuxRunLoop::runOnce(Date deadline) {
+    // Without a source the library would wait for ever, and nothing in it counts them.
     if (liveSources_ == 0) {
         return false;
     }
@@ -145,6 +146,7 @@ std::unique_ptr<RunLoopSource> LinuxRunLoop::addTimer(RunLoopSource::Handler han
     const auto callback = [](sd_event_source*, std::uint64_t, void* self) {
         return RunLoopSource::dispatch(self);
     };
+    // The accuracy is given because 0 would mean the library's own: a quarter of a second.
     requireMade(sd_event_add_time(event_, &source->source_, CLOCK_MONOTONIC, 0, kOneMicrosecond,
                                   callback, source.get()));
     source->setEnabled(false);

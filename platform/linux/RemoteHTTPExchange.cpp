@@ -89,6 +89,7 @@ std::optional<wire::HTTPMessageBytes> RemoteHTTPExchange::requestMessage() const
 
 RemoteHTTPExchange::State RemoteHTTPExchange::handle(const wire::HTTPMessage& message) {
     using Type = wire::HTTPMessageType;
+    // An answer that has come counts, even when this process is asked to end.
     const bool isAnswer = message.type == Type::failure || message.type == Type::response;
     if (!isAnswer && settings_.options.mustStop()) {
         return State::interrupted;
@@ -154,6 +155,7 @@ RemoteHTTPExchange::State RemoteHTTPExchange::takeResponse(std::span<const std::
     }
     HTTPReply reply{
         std::nullopt, HTTPResponse{response->status, std::string(response->className)}, {}};
+    // The status decides about a document; no body is waited for.
     if (isPost()) {
         reply_ = std::move(reply);
         return State::open;
@@ -170,6 +172,7 @@ RemoteHTTPExchange::State RemoteHTTPExchange::takeResponse(std::span<const std::
 }
 
 RemoteHTTPExchange::State RemoteHTTPExchange::receiveBody(std::size_t size, std::string& body) {
+    // Room is made for what comes, not for what was announced.
     while (body.size() < size) {
         wire::HTTPMessage message;
         const State state = connection_.receive(message);

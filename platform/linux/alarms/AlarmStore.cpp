@@ -64,8 +64,10 @@ Line parse(std::string_view text) {
 }
 
 std::string readLine(const std::string& path) {
+    // Not blocking, because opening a pipe would wait for its writer.
     const base::FileDescriptor file(
         ::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
+    // A byte more than a line has, by which a file that goes on behind it is known.
     std::string text(kLineSize + 1, '\0');
     const ssize_t length = file.isOpen() ? ::read(file.get(), text.data(), text.size()) : 0;
     text.resize(length > 0 ? static_cast<std::size_t>(length) : 0);
@@ -104,6 +106,7 @@ int writeLine(int descriptor, std::string_view line) {
         return errno;
     }
     const auto size = static_cast<off_t>(line.size());
+    // Cut after the write, so that the file is at no time without a line.
     return status.st_size > size ? errorUnless(::ftruncate(descriptor, size) == 0) : 0;
 }
 
@@ -159,6 +162,7 @@ int cancel(const std::string& path) {
 
 /// None have been registered where there is no directory.
 int listNames(const std::string& directory, std::vector<std::string>& names) {
+    // Not std::filesystem, whose iterator throws when it goes on, whatever it was made with.
     DIR* const listing = ::opendir(directory.c_str());
     if (listing == nullptr) {
         return errno == ENOENT ? 0 : errno;

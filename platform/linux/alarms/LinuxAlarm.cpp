@@ -15,6 +15,7 @@ void LinuxAlarm::set(std::string_view stream, std::string_view event,
                      const EventDictionary* dictionary) {
     const Name name(stream, event);
     restore(stream);
+    // What the earlier registration has queued would be taken for this one's.
     events_.drop(stream, event);
     if (const auto date = alarmDateIn(dictionary)) {
         save(name, *date);
@@ -37,6 +38,7 @@ void LinuxAlarm::save(const Name& name, Date date) {
 }
 
 void LinuxAlarm::saveUnsaved() {
+    // A copy, because what gets onto disk is taken out.
     for (const auto& [name, date] : std::map(unsaved_)) {
         save(name, date);
     }
@@ -98,6 +100,7 @@ void LinuxAlarm::restore(std::string_view stream) {
 
 void LinuxAlarm::delivered(const Event& event) {
     const Name name(event.stream, event.name);
+    // With another of its name in the queue the alarm is still in hand.
     if (registrations_.hasFired(name) && !events_.holds(event.stream, event.name)) {
         cancel(name);
     }

@@ -13,6 +13,7 @@ namespace platform {
 namespace {
 
 int makeTimer() {
+    // The clock that wakes a sleeping machine takes a privilege, which a container may not give.
     const int waking = ::timerfd_create(CLOCK_REALTIME_ALARM, TFD_CLOEXEC | TFD_NONBLOCK);
     return waking >= 0 ? waking : ::timerfd_create(CLOCK_REALTIME, TFD_CLOEXEC | TFD_NONBLOCK);
 }
@@ -31,6 +32,7 @@ void RealTimeTimer::arm(Date date) {
     itimerspec time{};
     time.it_value.tv_sec = nanoseconds / kNanosecondsPerSecond;
     time.it_value.tv_nsec = nanoseconds % kNanosecondsPerSecond;
+    // A clock that is set then shows as ECANCELED.
     ::timerfd_settime(descriptor_.get(), TFD_TIMER_ABSTIME | TFD_TIMER_CANCEL_ON_SET, &time,
                       nullptr);
 }
