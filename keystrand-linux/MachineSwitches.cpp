@@ -3,6 +3,7 @@
 #include "base/Concat.h"
 #include "base/Digits.h"
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 #include "keystrand-linux/SmallFile.h"
 #include "wire/SystemPaths.h"
 
@@ -74,11 +75,9 @@ struct AccountLine {
 };
 
 /// What was read goes with it.
-class WipedBuffer {
+class WipedBuffer : private base::NotCopied {
   public:
     WipedBuffer() = default;
-    WipedBuffer(const WipedBuffer&) = delete;
-    WipedBuffer& operator=(const WipedBuffer&) = delete;
     ~WipedBuffer() { ::explicit_bzero(bytes_.data(), bytes_.size()); }
 
     [[nodiscard]] ssize_t fillFrom(int fd) { return ::read(fd, bytes_.data(), bytes_.size()); }

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 #include "keystrand-linux/MachineClock.h"
 #include "keystrand/EventLoop.h"
 
@@ -18,7 +19,7 @@ class SystemClocks : public MachineClock {
 /// Calls its handler each time that somebody sets the date, forwards, backwards, or to what it
 /// shows already; never otherwise. Also after a sleep of the machine, which sets the date for the
 /// kernel.
-class DateWatch {
+class DateWatch : private base::NotCopied {
   public:
     using Handler = std::function<void()>;
 

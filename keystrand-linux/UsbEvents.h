@@ -1,6 +1,7 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 #include "keystrand/EventLoop.h"
 
 #include <functional>
@@ -23,7 +24,7 @@ namespace keystrand::usb {
 
 /// Hears of what comes and goes for as long as it exists. On a netlink socket only the kernel is
 /// heard, not whoever else may send to it.
-class UsbEvents {
+class UsbEvents : private base::NotCopied {
   public:
     struct Handlers {
         /// Something changed, once for all that was waiting, or events were lost. May destroy the

@@ -72,12 +72,12 @@ class LoopDisk {
         if (::ioctl(disk_.get(), BLKPG, &what) != 0) {
             return 0;
         }
-        std::string number;
-        std::ifstream(base::concat("/sys/class/block/", name, "p1/dev")) >> number;
-        const std::size_t colon = number.find(':');
-        return colon == std::string::npos
-                   ? 0
-                   : makedev(std::stoul(number), std::stoul(number.substr(colon + 1)));
+        unsigned first = 0;
+        unsigned second = 0;
+        char colon = 0;
+        std::ifstream(base::concat("/sys/class/block/", name, "p1/dev")) >> first >> colon >>
+            second;
+        return colon == ':' ? makedev(first, second) : 0;
     }
 
     std::string name;

@@ -13,11 +13,11 @@ namespace keystrand {
 
 /// Runs the loop until that is so. False when patience ended.
 [[nodiscard]] inline bool turnUntil(EventLoop& loop, const std::function<bool()>& isDone) {
-    using Clock = std::chrono::steady_clock;
-    const auto end = Clock::now() + support::kPatience;
+    using Steady = std::chrono::steady_clock;
+    const auto end = Steady::now() + support::kPatience;
     while (!isDone()) {
         const auto left =
-            std::chrono::duration_cast<std::chrono::microseconds>(end - Clock::now()).count();
+            std::chrono::duration_cast<std::chrono::microseconds>(end - Steady::now()).count();
         if (left <= 0 || sd_event_run(loop.handle(), static_cast<std::uint64_t>(left)) < 0) {
             return false;
         }
