@@ -151,8 +151,7 @@ std::optional<BusView> FakeUsbBus::look(std::string& problem) {
 GateOutcome FakeUsbBus::setParameter(AuthorizedDefault value) {
     happen();
     writes_.push_back(base::concat("parameter=", std::to_string(value)));
-    parameter_ = read(value);
-    return {.kind = GateOutcome::Kind::done, .readBack = parameter_};
+    return writeDefault(parameter_, value);
 }
 
 GateOutcome FakeUsbBus::setRootHub(const RootHub& hub, AuthorizedDefault value) {
@@ -162,8 +161,15 @@ GateOutcome FakeUsbBus::setRootHub(const RootHub& hub, AuthorizedDefault value) 
         return {.kind = GateOutcome::Kind::vanished};
     }
     writes_.push_back(base::concat("usb", std::to_string(hub.bus), '=', std::to_string(value)));
-    found->second.authorizedDefault = read(value);
-    return {.kind = GateOutcome::Kind::done, .readBack = found->second.authorizedDefault};
+    return writeDefault(found->second.authorizedDefault, value);
+}
+
+GateOutcome FakeUsbBus::writeDefault(AuthorizedDefault& at, AuthorizedDefault value) const {
+    if (defaultsFail_) {
+        return {.kind = GateOutcome::Kind::failed, .readBack = at, .reason = "Input/output error"};
+    }
+    at = defaultsAreIgnored_ ? at : read(value);
+    return {.kind = GateOutcome::Kind::done, .readBack = at};
 }
 
 GateOutcome FakeUsbBus::accept(const UsbDevice& device) {

@@ -54,6 +54,9 @@ class FakeUsbBus : public UsbBus {
     void use(const std::string& port) { used_.insert(port); }
     /// The kernel knows 0 and 1 only.
     void knowOnlyTwoValues() { twoValues_ = true; }
+    /// Writes to the parameter and to root hubs fail, or are taken and change nothing.
+    void failDefaults() { defaultsFail_ = true; }
+    void ignoreDefaults() { defaultsAreIgnored_ = true; }
     /// Each write to a device fails that many times.
     void failWrites(unsigned count) { failures_ = count; }
     void setMissing(bool missing) { missing_ = missing; }
@@ -95,6 +98,7 @@ class FakeUsbBus : public UsbBus {
     [[nodiscard]] bool hubAboveIsIn(const std::string& port) const;
     [[nodiscard]] bool isUsed(const std::string& port) const;
     [[nodiscard]] GateOutcome write(const UsbDevice& device, bool authorized);
+    [[nodiscard]] GateOutcome writeDefault(AuthorizedDefault& at, AuthorizedDefault value) const;
     [[nodiscard]] AuthorizedDefault read(AuthorizedDefault value) const;
 
     std::map<std::uint32_t, RootHub> rootHubs_;
@@ -105,6 +109,8 @@ class FakeUsbBus : public UsbBus {
     std::uint64_t lastInode_ = 0;
     AuthorizedDefault parameter_ = kAsTheControllerHasIt;
     bool twoValues_ = false;
+    bool defaultsFail_ = false;
+    bool defaultsAreIgnored_ = false;
     bool missing_ = false;
     unsigned failures_ = 0;
     std::function<void()> meanwhile_;

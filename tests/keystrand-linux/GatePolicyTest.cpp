@@ -61,9 +61,69 @@ TEST_F(GatePolicyTest, KernelThatKnowsTwoValuesGetsTheStricterOne) {
     EXPECT_EQ(bus.parameter(), kNobody);
     EXPECT_EQ(bus.rootHubDefault(1), kNobody);
     EXPECT_EQ(bus.rootHubDefault(2), kNobody);
+    // What is known of one root hub is known of all.
+    bus.addRootHub(3);
+    bus.setRootHubDefault(3, kEverybody);
+    bus.forgetWrites();
+    gate->settle();
+    EXPECT_EQ(bus.writes(), Writes{"usb3=0"});
     gate->open();
     EXPECT_EQ(bus.parameter(), kAsTheControllerHasIt);
     EXPECT_EQ(bus.rootHubDefault(1), kEverybody);
+}
+
+TEST_F(GatePolicyTest, WhatOthersLeftToHardWiredPortsIsLeftToThemAgain) {
+    with({.internal = false});
+    bus.setParameterDefault(kHardWiredOnly);
+    bus.setRootHubDefault(1, kHardWiredOnly);
+    gate->close();
+    EXPECT_EQ(bus.rootHubDefault(1), kNobody);
+    bus.addRootHub(3);
+    bus.plug("1-1", aDisk());
+    gate->settle();
+    gate->open();
+    EXPECT_EQ(bus.parameter(), kHardWiredOnly);
+    EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
+    EXPECT_EQ(bus.rootHubDefault(3), kHardWiredOnly);
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+}
+
+TEST_F(GatePolicyTest, HardWiredPortThatIsClosedTooGetsNothing) {
+    with({.internal = false});
+    Plug inside = aMouse();
+    inside.hardWired = true;
+    gate->meanwhile(1, [&] { bus.plug("1-1", inside); });
+    gate->close();
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+}
+
+TEST_F(GatePolicyTest, DefaultsThatCannotBeWrittenAreGivenUp) {
+    bus.failDefaults();
+    gate->close();
+    bus.plug("1-1", aDisk());
+    gate->settle();
+    // It came in, and is taken back.
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+    gate->open();
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+    EXPECT_EQ(gate->policy.state(), GateState());
+}
+
+TEST_F(GatePolicyTest, DefaultsThatCannotBePutBackAreGivenUp) {
+    gate->close();
+    bus.failDefaults();
+    gate->open();
+    EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
+    EXPECT_EQ(gate->policy.state(), GateState());
+}
+
+TEST_F(GatePolicyTest, DefaultsThatReadWhatTheyLikeAreGivenUp) {
+    bus.ignoreDefaults();
+    gate->close();
+    EXPECT_EQ(bus.writes(),
+              (Writes{"parameter=2", "usb1=2", "usb2=2", "parameter=0", "usb1=0", "usb2=0"}));
+    gate->open();
+    EXPECT_EQ(gate->policy.state(), GateState());
 }
 
 TEST_F(GatePolicyTest, WhatIsAttachedStays) {
@@ -195,11 +255,17 @@ TEST_F(GatePolicyTest, HubsThatOthersClosedStayAsTheyAre) {
     EXPECT_EQ(bus.writes(), (Writes{"usb2=2"}));
     bus.plug("1-1", aDisk());
     bus.plug("1-2", aKeyboard());
+    bus.plug("1-3", aHub());
     bus.plug("2-1", aDisk());
+    Plug inside = aDisk();
+    inside.hardWired = true;
+    bus.plug("1-4", inside);
     gate->settle();
-    // Not even a keyboard in somebody else's place.
+    // Not even a keyboard in somebody else's place, nor a hub to look for one.
     EXPECT_FALSE(bus.isAuthorized("1-2"));
+    EXPECT_FALSE(bus.isAuthorized("1-3"));
     gate->open();
+    EXPECT_FALSE(bus.isAuthorized("1-4"));
     EXPECT_EQ(bus.rootHubDefault(1), kNobody);
     EXPECT_EQ(bus.parameter(), kNobody);
     EXPECT_FALSE(bus.isAuthorized("1-1"));
@@ -252,6 +318,40 @@ TEST_F(GatePolicyTest, NoKeyboardBesideAnAttachedOne) {
     gate->settle();
     EXPECT_FALSE(bus.isAuthorized("1-2"));
     EXPECT_FALSE(bus.isAuthorized("1-3"));
+}
+
+TEST_F(GatePolicyTest, KeyboardThatSomebodyTookAwayIsNone) {
+    bus.plug("1-1", aKeyboard());
+    gate->close();
+    bus.setAuthorized("1-1", false);
+    bus.plug("1-2", aKeyboard());
+    gate->settle();
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+    EXPECT_TRUE(bus.isAuthorized("1-2"));
+}
+
+TEST_F(GatePolicyTest, KeyboardThatIsToGoIsNone) {
+    gate->meanwhile(1, [&] { bus.plug("1-1", aKeyboardWithDisk()); });
+    bus.failWrites(1);
+    gate->close();
+    ASSERT_TRUE(bus.isAuthorized("1-1"));
+    bus.plug("1-2", aKeyboard());
+    gate->settle();
+    EXPECT_TRUE(bus.isAuthorized("1-2"));
+}
+
+TEST_F(GatePolicyTest, KeyboardThatCannotBeAcceptedIsGivenUp) {
+    gate->close();
+    bus.failWrites(1000);
+    bus.plug("1-1", aKeyboard());
+    gate->settle();
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+    // The next one has its chance.
+    bus.failWrites(0);
+    bus.plug("1-2", aKeyboard());
+    gate->settle();
+    EXPECT_TRUE(bus.isAuthorized("1-2"));
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
 }
 
 TEST_F(GatePolicyTest, NoKeyboardForAPortableMachine) {
@@ -329,6 +429,7 @@ TEST_F(GatePolicyTest, KeyboardKeepsTheHubsAboveIt) {
     // Not longer than it is there.
     bus.unplug("1-1.2.3");
     gate->settle();
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
     gate->pass(5s);
     EXPECT_FALSE(bus.isAuthorized("1-1"));
 }
@@ -408,6 +509,44 @@ TEST_F(GatePolicyTest, OnlyWhatIsKnownStays) {
     EXPECT_EQ(gate->standingAt("1-6"), Standing::inUse);
     gate->open();
     EXPECT_TRUE(bus.isAuthorized("1-1"));
+}
+
+TEST_F(GatePolicyTest, OnlyWhatWasAttachedIsHeldAgainstWhatIsKnown) {
+    with({.notKeyboards = {{0x1111, 0x2222}}});
+    bus.plug("1-1", aKeyboard());
+    gate->close();
+    bus.plug("1-2", aDisk());
+    gate->settle();
+    ASSERT_TRUE(gate->policy.accept(bus.attachmentAt("1-2"), gate->now()));
+    gate->settle();
+    gate->keepOnly([](const UsbDevice&) { return false; });
+    // It only looks like a keyboard.
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+    EXPECT_EQ(gate->standingAt("1-2"), Standing::administrator);
+    EXPECT_TRUE(bus.isAuthorized("1-2"));
+}
+
+TEST_F(GatePolicyTest, UnknownHubStaysForTheKeyboardBehindIt) {
+    bus.plug("1-1", aHub());
+    bus.plug("1-1.1", aKeyboard());
+    bus.plug("1-2", aHub());
+    gate->close();
+    gate->keepOnly([](const UsbDevice&) { return false; });
+    EXPECT_TRUE(bus.isAuthorized("1-1.1"));
+    EXPECT_EQ(gate->standingAt("1-1"), Standing::keyboardHub);
+    EXPECT_FALSE(bus.isAuthorized("1-2"));
+}
+
+TEST_F(GatePolicyTest, NextServiceRefusesAtOnceWhatWasToBeRefused) {
+    gate->meanwhile(1, [&] { bus.plug("1-1", aDisk()); });
+    bus.failWrites(1);
+    gate->close();
+    ASSERT_TRUE(bus.isAuthorized("1-1"));
+    const GateState left = gate->policy.state();
+    with({});
+    gate->policy.resume(left);
+    gate->settle();
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
 }
 
 TEST_F(GatePolicyTest, NextServiceGoesOn) {
