@@ -6,7 +6,7 @@
 #include "base/ByteWriter.h"
 #include "base/Concat.h"
 #include "keystrand/Commands.h"
-#include "keystrand/Requirement.h"
+#include "keystrand/PolicyRequirement.h"
 
 #include <algorithm>
 #include <cassert>
@@ -50,11 +50,11 @@ std::optional<Constraint> parseConstraint(TextParser& parser) {
     return requirement ? std::optional<Constraint>(std::move(*requirement)) : std::nullopt;
 }
 
-const Requirement* resolve(const Constraint& constraint, const PolicyTable& policies) {
+const PolicyRequirement* resolve(const Constraint& constraint, const PolicyTable& policies) {
     if (const auto* name = std::get_if<std::string>(&constraint)) {
         return policies.find(*name);
     }
-    return std::get_if<Requirement>(&constraint);
+    return std::get_if<PolicyRequirement>(&constraint);
 }
 
 std::optional<std::vector<AccessRule>> parseAccessList(TextParser& parser) {
@@ -75,29 +75,29 @@ std::optional<std::vector<AccessRule>> parseAccessList(TextParser& parser) {
 
 namespace {
 
-bool asksFor(const Requirement& requirement, std::uint32_t type) {
-    if (requirement.kind == Requirement::Kind::leaf) {
+bool asksFor(const PolicyRequirement& requirement, std::uint32_t type) {
+    if (requirement.kind == PolicyRequirement::Kind::leaf) {
         return requirement.type->credential == type;
     }
     return std::any_of(requirement.children.begin(), requirement.children.end(),
-                       [type](const Requirement& child) { return asksFor(child, type); });
+                       [type](const PolicyRequirement& child) { return asksFor(child, type); });
 }
 
 /// Whether the requirement could be met if there were every credential but those of that type.
-bool canBeMetWithout(const Requirement& requirement, std::uint32_t type) {
-    if (requirement.kind == Requirement::Kind::leaf) {
+bool canBeMetWithout(const PolicyRequirement& requirement, std::uint32_t type) {
+    if (requirement.kind == PolicyRequirement::Kind::leaf) {
         const std::uint32_t wanted = requirement.type->credential;
         return wanted != type && wanted != LeafType::kNoCredential;
     }
     return std::count_if(requirement.children.begin(), requirement.children.end(),
-                         [type](const Requirement& child) {
+                         [type](const PolicyRequirement& child) {
                              return canBeMetWithout(child, type);
                          }) >= static_cast<std::ptrdiff_t>(requirement.needed);
 }
 
 } // namespace
 
-Characteristics characteristicsOf(const Requirement& requirement) {
+Characteristics characteristicsOf(const PolicyRequirement& requirement) {
     Characteristics result;
     for (std::uint32_t type = 1; type <= kKSTCredentialTypeMax; ++type) {
         if (asksFor(requirement, type)) {
@@ -160,7 +160,7 @@ CommandResult describe(const std::vector<AccessRule>& rules, std::string_view op
         if (!operation.empty() && rule.operation != operation) {
             continue;
         }
-        const Requirement* requirement = resolve(rule.constraint, policies);
+        const PolicyRequirement* requirement = resolve(rule.constraint, policies);
         if (requirement == nullptr) {
             return endedWith(kKernelNoSuchPolicy);
         }

@@ -1,7 +1,7 @@
 #pragma once
 
+#include "keystrand/PolicyRequirement.h"
 #include "keystrand/PolicyTable.h"
-#include "keystrand/Requirement.h"
 #include "keystrand/TextParser.h"
 
 #include <cstddef>
@@ -14,7 +14,7 @@
 namespace keystrand {
 
 /// What an access-control list asks for: the name of a policy, or a requirement of its own.
-using Constraint = std::variant<std::string, Requirement>;
+using Constraint = std::variant<std::string, PolicyRequirement>;
 
 /// The longest constraint, and the longest list, that is read.
 inline constexpr std::size_t kMaxConstraintSize = 4096;
@@ -28,7 +28,8 @@ inline constexpr std::size_t kMaxConstraintSize = 4096;
 
 /// The requirement that a constraint stands for; null for a policy that is not there. Valid as long
 /// as both.
-[[nodiscard]] const Requirement* resolve(const Constraint& constraint, const PolicyTable& policies);
+[[nodiscard]] const PolicyRequirement* resolve(const Constraint& constraint,
+                                               const PolicyTable& policies);
 
 /// One line of an access-control list.
 struct AccessRule {
@@ -55,6 +56,6 @@ struct Characteristics {
     bool operator==(const Characteristics&) const = default;
 };
 
-[[nodiscard]] Characteristics characteristicsOf(const Requirement& requirement);
+[[nodiscard]] Characteristics characteristicsOf(const PolicyRequirement& requirement);
 
 } // namespace keystrand

@@ -31,7 +31,7 @@ bool agrees(const std::optional<Wanted>& wanted, const Actual& actual) {
     return !wanted || *wanted == actual;
 }
 
-Fit fitOf(const Requirement& leaf, const Member& member, std::uint32_t ageLimit,
+Fit fitOf(const PolicyRequirement& leaf, const Member& member, std::uint32_t ageLimit,
           const Situation& situation) {
     const KSTCredential& credential = *member.credential;
     const auto& user = leaf.user ? leaf.user : situation.user;
@@ -43,7 +43,7 @@ Fit fitOf(const Requirement& leaf, const Member& member, std::uint32_t ageLimit,
     return ageLimit == kNoAgeLimit || age <= ageLimit ? Fit::yes : Fit::tooOld;
 }
 
-void lookIn(const CredentialSet& set, const Requirement& leaf, std::uint32_t ageLimit,
+void lookIn(const CredentialSet& set, const PolicyRequirement& leaf, std::uint32_t ageLimit,
             const Situation& situation, Match& best) {
     for (const Member& member : set.members()) {
         const Fit fit = fitOf(leaf, member, ageLimit, situation);
@@ -53,7 +53,7 @@ void lookIn(const CredentialSet& set, const Requirement& leaf, std::uint32_t age
     }
 }
 
-Match bestMatch(const Requirement& leaf, const Situation& situation) {
+Match bestMatch(const PolicyRequirement& leaf, const Situation& situation) {
     const std::uint32_t ageLimit = leaf.maxAge.value_or(kNoAgeLimit);
     Match best;
     lookIn(situation.own, leaf, ageLimit, situation, best);
@@ -63,7 +63,7 @@ Match bestMatch(const Requirement& leaf, const Situation& situation) {
     return best;
 }
 
-std::optional<Missing> missingLeaf(const Requirement& leaf, const Situation& situation) {
+std::optional<Missing> missingLeaf(const PolicyRequirement& leaf, const Situation& situation) {
     const Fit fit = bestMatch(leaf, situation).fit;
     if (fit == Fit::yes) {
         return std::nullopt;
@@ -75,16 +75,16 @@ std::optional<Missing> missingLeaf(const Requirement& leaf, const Situation& sit
 }
 
 /// Appends what the requirement, which is met, uses up.
-void collect(const Requirement& requirement, const Situation& situation,
+void collect(const PolicyRequirement& requirement, const Situation& situation,
              std::vector<const KSTCredential*>& used) {
-    if (requirement.kind == Requirement::Kind::leaf) {
+    if (requirement.kind == PolicyRequirement::Kind::leaf) {
         if (requirement.once) {
             used.push_back(bestMatch(requirement, situation).credential);
         }
         return;
     }
     std::uint32_t left = requirement.needed;
-    for (const Requirement& child : requirement.children) {
+    for (const PolicyRequirement& child : requirement.children) {
         if (left > 0 && !whatIsMissing(child, situation)) {
             collect(child, situation, used);
             --left;
@@ -94,13 +94,14 @@ void collect(const Requirement& requirement, const Situation& situation,
 
 } // namespace
 
-std::optional<Missing> whatIsMissing(const Requirement& requirement, const Situation& situation) {
-    if (requirement.kind == Requirement::Kind::leaf) {
+std::optional<Missing> whatIsMissing(const PolicyRequirement& requirement,
+                                     const Situation& situation) {
+    if (requirement.kind == PolicyRequirement::Kind::leaf) {
         return missingLeaf(requirement, situation);
     }
     Missing missing;
     missing.requirement = &requirement;
-    for (const Requirement& child : requirement.children) {
+    for (const PolicyRequirement& child : requirement.children) {
         if (auto missingChild = whatIsMissing(child, situation)) {
             missing.children.push_back(std::move(*missingChild));
         }
@@ -113,7 +114,7 @@ std::optional<Missing> whatIsMissing(const Requirement& requirement, const Situa
     return missing;
 }
 
-std::vector<const KSTCredential*> whatIsUsedUp(const Requirement& requirement,
+std::vector<const KSTCredential*> whatIsUsedUp(const PolicyRequirement& requirement,
                                                const Situation& situation) {
     std::vector<const KSTCredential*> used;
     collect(requirement, situation, used);
@@ -127,17 +128,17 @@ struct RequirementRelease {
 };
 using NodePointer = std::unique_ptr<KSTRequirement, RequirementRelease>;
 
-std::uint32_t typeOf(const Requirement& requirement) {
+std::uint32_t typeOf(const PolicyRequirement& requirement) {
     switch (requirement.kind) {
-    case Requirement::Kind::allOf:
+    case PolicyRequirement::Kind::allOf:
         return kKSTRequirementTypeAnd;
-    case Requirement::Kind::anyOf:
+    case PolicyRequirement::Kind::anyOf:
         return kKSTRequirementTypeOr;
-    case Requirement::Kind::someOf:
+    case PolicyRequirement::Kind::someOf:
         return kKSTRequirementTypeKofN;
-    case Requirement::Kind::leaf:
+    case PolicyRequirement::Kind::leaf:
         return requirement.type->requirement;
-    case Requirement::Kind::always:
+    case PolicyRequirement::Kind::always:
         break;
     }
     // What is always met is never missing.
@@ -163,18 +164,18 @@ base::ByteWriter dataOf(const NodePointer& node) {
 }
 
 /// The first number of a leaf's data.
-std::uint32_t leafNumber(const Requirement& leaf) {
+std::uint32_t leafNumber(const PolicyRequirement& leaf) {
     return leaf.type->requirement == kKSTRequirementTypePassphraseEntered
                ? leaf.purpose.value_or(0)
                : leaf.maxAge.value_or(kNoAgeLimit);
 }
 
-bool beginsWithNumber(const Requirement& leaf) {
+bool beginsWithNumber(const PolicyRequirement& leaf) {
     return leaf.type->requirement <= kKSTRequirementTypeBiometryMatched;
 }
 
 NodePointer buildLeaf(const Missing& missing) {
-    const Requirement& leaf = *missing.requirement;
+    const PolicyRequirement& leaf = *missing.requirement;
     NodePointer node = makeNode(missing, leaf.type->dataSize);
     if (beginsWithNumber(leaf)) {
         [[maybe_unused]] const bool fits = dataOf(node).writeU32(leafNumber(leaf));
@@ -184,7 +185,7 @@ NodePointer buildLeaf(const Missing& missing) {
 }
 
 NodePointer build(const Missing& missing) {
-    if (missing.requirement->kind == Requirement::Kind::leaf) {
+    if (missing.requirement->kind == PolicyRequirement::Kind::leaf) {
         return buildLeaf(missing);
     }
     const auto count = static_cast<std::uint32_t>(missing.children.size());

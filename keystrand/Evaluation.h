@@ -1,7 +1,7 @@
 #pragma once
 
 #include "keystrand/CredentialSet.h"
-#include "keystrand/Requirement.h"
+#include "keystrand/PolicyRequirement.h"
 
 #include <cstdint>
 #include <optional>
@@ -31,7 +31,7 @@ struct Missing {
         tooOld = 2,
     };
 
-    const Requirement* requirement = nullptr;
+    const PolicyRequirement* requirement = nullptr;
     State state = State::absent;
     /// How many of the children that are missing are still asked for.
     std::uint32_t needed = 0;
@@ -41,13 +41,13 @@ struct Missing {
 
 /// None when the requirement is met. Every leaf is looked at for itself: one credential may meet
 /// several. The requirement outlives the result.
-[[nodiscard]] std::optional<Missing> whatIsMissing(const Requirement& requirement,
+[[nodiscard]] std::optional<Missing> whatIsMissing(const PolicyRequirement& requirement,
                                                    const Situation& situation);
 
 /// The credentials of both sets that a requirement which is met uses up: those of its leaves that
 /// are asked for once, of as many children as are needed, the first ones first. A leaf is met by
 /// the oldest credential that fits, a context's own before a global one.
-[[nodiscard]] std::vector<const KSTCredential*> whatIsUsedUp(const Requirement& requirement,
+[[nodiscard]] std::vector<const KSTCredential*> whatIsUsedUp(const PolicyRequirement& requirement,
                                                              const Situation& situation);
 
 /// The requirement tree that a client is told, on the wire: what is missing, each node with its

@@ -3,7 +3,7 @@
 #include "keystrand/AccessLists.h"
 #include "keystrand/Commands.h"
 #include "keystrand/Evaluation.h"
-#include "keystrand/Requirement.h"
+#include "keystrand/PolicyRequirement.h"
 
 #include <cstring>
 
@@ -27,7 +27,7 @@ struct Question {
     ReceivedParameters parameters;
 };
 
-CommandResult verify(KernelState& kernel, Context& context, const Requirement& requirement,
+CommandResult verify(KernelState& kernel, Context& context, const PolicyRequirement& requirement,
                      const Question& question, CredentialSet::Seconds now) {
     const Situation situation{.own = context.credentials,
                               .global = kernel.globalCredentials,
@@ -69,7 +69,7 @@ CommandResult verifyPolicy(KernelState& kernel, Payload payload, CredentialSet::
     if (context == nullptr) {
         return endedWith(kKernelNoSuchContext);
     }
-    const Requirement* requirement = kernel.policies.find(policyId);
+    const PolicyRequirement* requirement = kernel.policies.find(policyId);
     if (requirement == nullptr) {
         return endedWith(kKernelNoSuchPolicy);
     }
@@ -83,7 +83,7 @@ CommandResult verifyConstraint(KernelState& kernel, Context& context, std::strin
     if (!constraint || !parser.atEnd()) {
         return endedWith(kKernelBadConstraint);
     }
-    const Requirement* requirement = resolve(*constraint, kernel.policies);
+    const PolicyRequirement* requirement = resolve(*constraint, kernel.policies);
     if (requirement == nullptr) {
         return endedWith(kKernelNoSuchPolicy);
     }

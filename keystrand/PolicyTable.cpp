@@ -2,7 +2,7 @@
 
 #include "KSTLib/RequestSerialization.h"
 #include "base/Concat.h"
-#include "keystrand/Requirement.h"
+#include "keystrand/PolicyRequirement.h"
 
 #include <fstream>
 #include <sys/stat.h>
@@ -90,7 +90,7 @@ std::optional<std::string> PolicyTable::reload() {
     return load(path);
 }
 
-const Requirement* PolicyTable::find(std::string_view name) const {
+const PolicyRequirement* PolicyTable::find(std::string_view name) const {
     const auto found = policies_.find(name);
     return found == policies_.end() ? nullptr : &found->second;
 }

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "keystrand/Requirement.h"
+#include "keystrand/PolicyRequirement.h"
 #include "keystrand/TextParser.h"
 
 #include <cstddef>
@@ -14,7 +14,7 @@
 namespace keystrand {
 
 /// Policies by their names.
-using Policies = std::map<std::string, Requirement, std::less<>>;
+using Policies = std::map<std::string, PolicyRequirement, std::less<>>;
 
 inline constexpr std::size_t kMaxPolicies = 256;
 
@@ -40,7 +40,7 @@ class PolicyTable {
     void set(Policies policies) { policies_ = std::move(policies); }
 
     /// Null when there is no such policy. Valid until the next change.
-    [[nodiscard]] const Requirement* find(std::string_view name) const;
+    [[nodiscard]] const PolicyRequirement* find(std::string_view name) const;
 
     [[nodiscard]] const Policies& all() const { return policies_; }
 

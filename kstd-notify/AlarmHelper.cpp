@@ -105,7 +105,7 @@ AlarmHelper::Alarms AlarmHelper::alarms() {
 }
 
 void AlarmHelper::report(const std::string& reason) {
-    errors_ << "kstd-notify: no timer for the alarm: " << platform::logLine(reason) << '\n';
+    errors_ << "kstd-notify: no timer for the alarm: " << platform::printableLine(reason) << '\n';
 }
 
 std::vector<AlarmHelper::Question> AlarmHelper::takeQuestions() {

@@ -136,7 +136,7 @@ class StreamLog final : public platform::SystemLog {
 
     void write(platform::LogLevel /*level*/, std::string_view text,
                const platform::LogFields& /*fields*/) override {
-        stream_ << platform::logLine(text) << '\n';
+        stream_ << platform::printableLine(text) << '\n';
     }
 
   private:
@@ -177,7 +177,7 @@ ExitStatus run(std::span<const std::string_view> arguments, const platform::Path
     ExitStatus status = kSent;
     for (const Notice& notice : *notices) {
         if (const std::string reason = sender.send(notice); !reason.empty()) {
-            errors << "kstd-notify: cannot send " << platform::logLine(notice.name) << " to "
+            errors << "kstd-notify: cannot send " << platform::printableLine(notice.name) << " to "
                    << paths.eventSocket() << ": " << reason << '\n';
             status = kNotSent;
         }

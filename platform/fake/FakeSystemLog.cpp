@@ -9,7 +9,7 @@ namespace platform {
 
 void FakeSystemLog::write(LogLevel level, std::string_view text, const LogFields& fields) {
     const std::lock_guard lock(mutex_);
-    lines_.push_back({level, logLine(text), std::string(fields.file), fields.line,
+    lines_.push_back({level, printableLine(text), std::string(fields.file), fields.line,
                       std::string(fields.function), std::string(fields.messageId)});
 }
 

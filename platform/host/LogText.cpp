@@ -79,7 +79,7 @@ char* showLogText(std::string_view text, char* line) noexcept {
     return line;
 }
 
-std::string logLine(std::string_view text) {
+std::string printableLine(std::string_view text) {
     const std::string_view shown = withoutFinalNewline(text);
     std::string line(shown.size() * kLogTextGrowth, '\0');
     const char* const end = showLogText(shown, line.data());

@@ -20,6 +20,6 @@ char* showLogText(std::string_view text, char* line) noexcept;
 }
 
 /// The text as one printable line: what showLogText makes of it without its final newline.
-[[nodiscard]] std::string logLine(std::string_view text);
+[[nodiscard]] std::string printableLine(std::string_view text);
 
 } // namespace platform

@@ -1,7 +1,7 @@
 #include "keystrand/Evaluation.h"
 
 #include "keystrand/AccessLists.h"
-#include "keystrand/Requirement.h"
+#include "keystrand/PolicyRequirement.h"
 #include "tests/keystrand/Credentials.h"
 
 #include <gtest/gtest.h>
@@ -14,7 +14,7 @@ namespace {
 
 constexpr CredentialSet::Seconds kNow = 1000;
 
-Requirement parse(const std::string& text) {
+PolicyRequirement parse(const std::string& text) {
     TextParser parser(text);
     auto requirement = parseRequirement(parser);
     EXPECT_TRUE(requirement && parser.atEnd()) << text;
@@ -24,7 +24,7 @@ Requirement parse(const std::string& text) {
 /// What is missing, as text: a leaf by its name, with '!' for one that is too old, a composite by
 /// how many it still needs.
 std::string textOf(const Missing& missing) {
-    if (missing.requirement->kind == Requirement::Kind::leaf) {
+    if (missing.requirement->kind == PolicyRequirement::Kind::leaf) {
         return std::string(missing.requirement->type->name) +
                (missing.state == Missing::State::tooOld ? "!" : "");
     }
@@ -51,7 +51,7 @@ class EvaluationTest : public testing::Test {
 
     /// What is missing of the requirement, "met" when nothing is.
     [[nodiscard]] std::string ask(const std::string& text) const {
-        const Requirement requirement = parse(text);
+        const PolicyRequirement requirement = parse(text);
         const auto missing = whatIsMissing(requirement, situation());
         return missing ? textOf(*missing) : "met";
     }
@@ -59,7 +59,7 @@ class EvaluationTest : public testing::Test {
     /// The types of the credentials that are used up.
     [[nodiscard]] std::vector<std::uint32_t> used(const std::string& text) const {
         std::vector<std::uint32_t> types;
-        const Requirement requirement = parse(text);
+        const PolicyRequirement requirement = parse(text);
         for (const KSTCredential* credential : whatIsUsedUp(requirement, situation())) {
             types.push_back(credential->type);
         }
@@ -225,7 +225,7 @@ TEST_F(EvaluationTest, OldestOwnCredentialIsUsedUpFirst) {
     add(own_, plainCredential(1, 6), 10);
     maxGlobalAge_ = 0xffffffff;
     const auto usedUser = [this](const std::string& text) {
-        const Requirement requirement = parse(text);
+        const PolicyRequirement requirement = parse(text);
         return whatIsUsedUp(requirement, situation()).at(0)->userId;
     };
     EXPECT_EQ(usedUser("passcode(once)"), 5U);

@@ -2,7 +2,7 @@
 
 #include "KSTLib/AllocatedBytes.h"
 #include "keystrand/Commands.h"
-#include "keystrand/Requirement.h"
+#include "keystrand/PolicyRequirement.h"
 #include "tests/keystrand/Credentials.h"
 
 #include <gtest/gtest.h>

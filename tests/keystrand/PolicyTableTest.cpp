@@ -133,7 +133,7 @@ TEST_F(PolicyTableTest, ConstraintIsAPolicyOrARequirement) {
         TextParser parser(text);
         const auto constraint = parseConstraint(parser);
         ASSERT_EQ(constraint.has_value(), isTaken);
-        const Requirement* found = isTaken ? resolve(*constraint, table_) : nullptr;
+        const PolicyRequirement* found = isTaken ? resolve(*constraint, table_) : nullptr;
         EXPECT_EQ(found == nullptr ? "" : toText(*found), requirement);
     }
 }

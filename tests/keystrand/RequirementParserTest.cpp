@@ -1,4 +1,4 @@
-#include "keystrand/Requirement.h"
+#include "keystrand/PolicyRequirement.h"
 
 #include <gtest/gtest.h>
 
@@ -8,7 +8,7 @@ namespace keystrand::test {
 
 namespace {
 
-std::optional<Requirement> parseWhole(const std::string& text) {
+std::optional<PolicyRequirement> parseWhole(const std::string& text) {
     TextParser parser(text);
     auto requirement = parseRequirement(parser);
     return parser.atEnd() ? std::move(requirement) : std::nullopt;

@@ -1,7 +1,7 @@
 #include "KSTLib/AllocatedBytes.h"
 #include "KSTLib/RequirementSerialization.h"
 #include "keystrand/Evaluation.h"
-#include "keystrand/Requirement.h"
+#include "keystrand/PolicyRequirement.h"
 #include "tests/keystrand/Credentials.h"
 
 #include <gtest/gtest.h>

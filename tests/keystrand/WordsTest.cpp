@@ -4,7 +4,7 @@
 
 #include "keystrand/DispatchTable.h"
 #include "keystrand/Evaluation.h"
-#include "keystrand/Requirement.h"
+#include "keystrand/PolicyRequirement.h"
 
 #include <gtest/gtest.h>
 

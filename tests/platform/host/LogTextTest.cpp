@@ -7,30 +7,30 @@
 
 namespace {
 
-using platform::logLine;
+using platform::printableLine;
 
 TEST(LogTextTest, PlainTextStaysAsItIs) {
-    EXPECT_EQ(logLine("kstd: main: Entering the main runloop."),
+    EXPECT_EQ(printableLine("kstd: main: Entering the main runloop."),
               "kstd: main: Entering the main runloop.");
 }
 
 TEST(LogTextTest, EmptyTextIsAnEmptyLine) {
-    EXPECT_EQ(logLine(""), "");
-    EXPECT_EQ(logLine("\n"), "");
+    EXPECT_EQ(printableLine(""), "");
+    EXPECT_EQ(printableLine("\n"), "");
 }
 
 TEST(LogTextTest, OneNewlineAtTheEndIsDropped) {
-    EXPECT_EQ(logLine("text\n"), "text");
+    EXPECT_EQ(printableLine("text\n"), "text");
 }
 
 TEST(LogTextTest, OtherNewlinesAreShown) {
-    EXPECT_EQ(logLine("text\n\n"), "text\\n");
-    EXPECT_EQ(logLine("first\nsecond\n"), "first\\nsecond");
-    EXPECT_EQ(logLine("\ntext"), "\\ntext");
+    EXPECT_EQ(printableLine("text\n\n"), "text\\n");
+    EXPECT_EQ(printableLine("first\nsecond\n"), "first\\nsecond");
+    EXPECT_EQ(printableLine("\ntext"), "\\ntext");
 }
 
 TEST(LogTextTest, OnlyTheFinalNewlineOfALineEndIsDropped) {
-    EXPECT_EQ(logLine("text\r\n"), "text\\r");
+    EXPECT_EQ(printableLine("text\r\n"), "text\\r");
 }
 
 TEST(LogTextTest, EachControlCharacterIsShown) {
@@ -52,17 +52,18 @@ TEST(LogTextTest, EachControlCharacterIsShown) {
             expected = std::string("\\x") + kDigits[code / 16] + kDigits[code % 16];
         }
         }
-        EXPECT_EQ(logLine(std::string("a") + character + "b"), "a" + expected + "b") << code;
+        EXPECT_EQ(printableLine(std::string("a") + character + "b"), "a" + expected + "b") << code;
     }
-    EXPECT_EQ(logLine("a\x7f"), "a\\x7f");
+    EXPECT_EQ(printableLine("a\x7f"), "a\\x7f");
 }
 
 TEST(LogTextTest, NeighboursOfControlCharactersStayAsTheyAre) {
-    EXPECT_EQ(logLine(" ~"), " ~");
+    EXPECT_EQ(printableLine(" ~"), " ~");
 }
 
 TEST(LogTextTest, CharactersBeyondAsciiStayAsTheyAre) {
-    EXPECT_EQ(logLine("Schl\xc3\xbcssel \xf0\x9f\x94\x91"), "Schl\xc3\xbcssel \xf0\x9f\x94\x91");
+    EXPECT_EQ(printableLine("Schl\xc3\xbcssel \xf0\x9f\x94\x91"),
+              "Schl\xc3\xbcssel \xf0\x9f\x94\x91");
 }
 
 std::string utf8(unsigned character) {
@@ -86,24 +87,24 @@ TEST(LogTextTest, WhatDeceivesAReaderIsShown) {
         for (unsigned character = range.first; character <= range.last; ++character) {
             char expected[16];
             std::snprintf(expected, sizeof expected, "a\\u{%x}b", character);
-            EXPECT_EQ(logLine("a" + utf8(character) + "b"), expected);
+            EXPECT_EQ(printableLine("a" + utf8(character) + "b"), expected);
         }
     }
 }
 
 TEST(LogTextTest, NeighboursOfWhatDeceivesStayAsTheyAre) {
     for (const unsigned character : {0xa0U, 0x2027U, 0x202fU, 0x2065U, 0x206aU}) {
-        EXPECT_EQ(logLine(utf8(character)), utf8(character)) << character;
+        EXPECT_EQ(printableLine(utf8(character)), utf8(character)) << character;
     }
 }
 
 TEST(LogTextTest, BytesThatAreNoCharacterAreShown) {
-    EXPECT_EQ(logLine("a\x80\xff"), "a\\x80\\xff");
+    EXPECT_EQ(printableLine("a\x80\xff"), "a\\x80\\xff");
     // Cut short, longer than need be, a surrogate, and beyond the last character.
-    EXPECT_EQ(logLine("\xe2\x80"), "\\xe2\\x80");
-    EXPECT_EQ(logLine("\xc0\x8a"), "\\xc0\\x8a");
-    EXPECT_EQ(logLine("\xed\xa0\x80"), "\\xed\\xa0\\x80");
-    EXPECT_EQ(logLine("\xf4\x90\x80\x80"), "\\xf4\\x90\\x80\\x80");
+    EXPECT_EQ(printableLine("\xe2\x80"), "\\xe2\\x80");
+    EXPECT_EQ(printableLine("\xc0\x8a"), "\\xc0\\x8a");
+    EXPECT_EQ(printableLine("\xed\xa0\x80"), "\\xed\\xa0\\x80");
+    EXPECT_EQ(printableLine("\xf4\x90\x80\x80"), "\\xf4\\x90\\x80\\x80");
 }
 
 TEST(LogTextTest, NoTextOutgrowsItsRoom) {

@@ -1,4 +1,4 @@
-#include "keystrand/Requirement.h"
+#include "keystrand/PolicyRequirement.h"
 
 #include "KSTLib/Credential.h"
 #include "KSTLib/Requirement.h"
@@ -57,7 +57,7 @@ const LeafType* findLeafType(std::string_view name) {
 
 namespace {
 
-std::string optionsText(const Requirement& leaf) {
+std::string optionsText(const PolicyRequirement& leaf) {
     std::string text;
     const auto add = [&text](const std::string& option) {
         text += text.empty() ? "(" : ", ";
@@ -79,11 +79,11 @@ std::string optionsText(const Requirement& leaf) {
     return text.empty() ? text : base::concat(text, ')');
 }
 
-std::string headText(const Requirement& composite) {
+std::string headText(const PolicyRequirement& composite) {
     switch (composite.kind) {
-    case Requirement::Kind::allOf:
+    case PolicyRequirement::Kind::allOf:
         return "all-of";
-    case Requirement::Kind::anyOf:
+    case PolicyRequirement::Kind::anyOf:
         return "any-of";
     default:
         return base::concat(composite.needed, "-of");
@@ -92,32 +92,32 @@ std::string headText(const Requirement& composite) {
 
 } // namespace
 
-std::size_t wireSize(const Requirement& requirement) {
-    if (requirement.kind == Requirement::Kind::always) {
+std::size_t wireSize(const PolicyRequirement& requirement) {
+    if (requirement.kind == PolicyRequirement::Kind::always) {
         // It is met, so it is missing in no answer.
         return 0;
     }
-    if (requirement.kind == Requirement::Kind::leaf) {
+    if (requirement.kind == PolicyRequirement::Kind::leaf) {
         return sizeof(KSTRequirement) + requirement.type->dataSize;
     }
-    std::size_t size = requirement.kind == Requirement::Kind::someOf
+    std::size_t size = requirement.kind == PolicyRequirement::Kind::someOf
                            ? kst::kKofNLayout.childrenOffset
                            : kst::kListLayout.childrenOffset;
-    for (const Requirement& child : requirement.children) {
+    for (const PolicyRequirement& child : requirement.children) {
         size += wireSize(child);
     }
     return size;
 }
 
-std::string toText(const Requirement& requirement) {
-    if (requirement.kind == Requirement::Kind::always) {
+std::string toText(const PolicyRequirement& requirement) {
+    if (requirement.kind == PolicyRequirement::Kind::always) {
         return std::string(kAlways);
     }
-    if (requirement.kind == Requirement::Kind::leaf) {
+    if (requirement.kind == PolicyRequirement::Kind::leaf) {
         return base::concat(requirement.type->name, optionsText(requirement));
     }
     std::string text = headText(requirement);
-    for (const Requirement& child : requirement.children) {
+    for (const PolicyRequirement& child : requirement.children) {
         text += &child == &requirement.children.front() ? "(" : ", ";
         text += toText(child);
     }
@@ -126,15 +126,15 @@ std::string toText(const Requirement& requirement) {
 
 namespace {
 
-using Kind = Requirement::Kind;
+using Kind = PolicyRequirement::Kind;
 
 constexpr std::string_view kSomeOfSuffix = "-of";
 
-std::optional<Requirement> parseNode(TextParser& parser, std::size_t depth);
+std::optional<PolicyRequirement> parseNode(TextParser& parser, std::size_t depth);
 
 /// The composite that the word begins, without children; none for a word that begins none.
-std::optional<Requirement> compositeOf(std::string_view word) {
-    Requirement composite;
+std::optional<PolicyRequirement> compositeOf(std::string_view word) {
+    PolicyRequirement composite;
     if (word == "all-of") {
         composite.kind = Kind::allOf;
         return composite;
@@ -157,7 +157,7 @@ std::optional<Requirement> compositeOf(std::string_view word) {
     return composite;
 }
 
-bool parseChildren(TextParser& parser, Requirement& composite, std::size_t depth) {
+bool parseChildren(TextParser& parser, PolicyRequirement& composite, std::size_t depth) {
     if (depth == kMaxRequirementDepth) {
         parser.fail("nested too deeply");
         return false;
@@ -175,7 +175,7 @@ bool parseChildren(TextParser& parser, Requirement& composite, std::size_t depth
     return parser.mark(')');
 }
 
-bool settleNeeded(TextParser& parser, Requirement& composite) {
+bool settleNeeded(TextParser& parser, PolicyRequirement& composite) {
     const std::size_t count = composite.children.size();
     if (composite.kind == Kind::allOf) {
         composite.needed = static_cast<std::uint32_t>(count);
@@ -188,8 +188,8 @@ bool settleNeeded(TextParser& parser, Requirement& composite) {
 }
 
 /// Where the number of an option goes; null when the leaf has no such option.
-std::optional<std::uint32_t>* optionOf(Requirement& leaf, std::optional<std::uint32_t>& priority,
-                                       std::string_view name) {
+std::optional<std::uint32_t>*
+optionOf(PolicyRequirement& leaf, std::optional<std::uint32_t>& priority, std::string_view name) {
     if (name == "user") {
         return &leaf.user;
     }
@@ -203,7 +203,7 @@ std::optional<std::uint32_t>* optionOf(Requirement& leaf, std::optional<std::uin
     return name == "purpose" && isPassphrase ? &leaf.purpose : nullptr;
 }
 
-bool parseNumberOption(TextParser& parser, Requirement& leaf,
+bool parseNumberOption(TextParser& parser, PolicyRequirement& leaf,
                        std::optional<std::uint32_t>& priority, std::string_view name) {
     std::optional<std::uint32_t>* option = optionOf(leaf, priority, name);
     if (option == nullptr) {
@@ -217,7 +217,7 @@ bool parseNumberOption(TextParser& parser, Requirement& leaf,
     return option->has_value();
 }
 
-bool parseOptions(TextParser& parser, Requirement& leaf) {
+bool parseOptions(TextParser& parser, PolicyRequirement& leaf) {
     std::set<std::string_view> seen;
     std::optional<std::uint32_t> priority;
     do {
@@ -239,7 +239,7 @@ bool parseOptions(TextParser& parser, Requirement& leaf) {
     return parser.mark(')');
 }
 
-std::optional<Requirement> parseNode(TextParser& parser, std::size_t depth) {
+std::optional<PolicyRequirement> parseNode(TextParser& parser, std::size_t depth) {
     const auto word = parser.word("requirement");
     if (!word) {
         return std::nullopt;
@@ -249,7 +249,7 @@ std::optional<Requirement> parseNode(TextParser& parser, std::size_t depth) {
             parseChildren(parser, *composite, depth) && settleNeeded(parser, *composite);
         return isWhole ? std::move(composite) : std::nullopt;
     }
-    Requirement leaf;
+    PolicyRequirement leaf;
     if (*word == kAlways) {
         leaf.kind = Kind::always;
         return leaf;
@@ -267,7 +267,7 @@ std::optional<Requirement> parseNode(TextParser& parser, std::size_t depth) {
 
 } // namespace
 
-std::optional<Requirement> parseRequirement(TextParser& parser) {
+std::optional<PolicyRequirement> parseRequirement(TextParser& parser) {
     auto requirement = parseNode(parser, 1);
     if (requirement && wireSize(*requirement) > kMaxRequirementWireSize) {
         parser.fail("the requirement is too large");

@@ -36,7 +36,7 @@ inline constexpr std::string_view kAlways = "always";
 
 /// What a policy asks for: a leaf, which one credential meets, a number of its children, or
 /// nothing.
-struct Requirement {
+struct PolicyRequirement {
     enum class Kind { leaf, allOf, anyOf, someOf, always };
 
     Kind kind = Kind::leaf;
@@ -51,16 +51,16 @@ struct Requirement {
     bool once = false;
 
     /// At least one of allOf, anyOf and someOf.
-    std::vector<Requirement> children;
+    std::vector<PolicyRequirement> children;
     /// How many of the children are asked for, 1 to all of them; 0 of always.
     std::uint32_t needed = 0;
 };
 
 /// The bytes of the requirement on the wire.
-[[nodiscard]] std::size_t wireSize(const Requirement& requirement);
+[[nodiscard]] std::size_t wireSize(const PolicyRequirement& requirement);
 
 /// The requirement as policies write it, on one line.
-[[nodiscard]] std::string toText(const Requirement& requirement);
+[[nodiscard]] std::string toText(const PolicyRequirement& requirement);
 
 inline constexpr std::size_t kMaxRequirementDepth = 16;
 /// What fits into the answer to a client beside the four bytes before it.
@@ -75,6 +75,6 @@ inline constexpr std::size_t kMaxRequirementWireSize = 4096 - 4;
 ///
 /// None, with the parser's error set, when something else is there, or when the requirement is too
 /// deep or too large.
-[[nodiscard]] std::optional<Requirement> parseRequirement(TextParser& parser);
+[[nodiscard]] std::optional<PolicyRequirement> parseRequirement(TextParser& parser);
 
 } // namespace keystrand
