@@ -4,7 +4,7 @@
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/Platform.h"
 #include "common/Allocation.h"
-#include "common/CommandHeader.h"
+#include "common/PayloadMemory.h"
 #include "wire/RestrictedMode.h"
 
 #include <cerrno>

@@ -2,7 +2,6 @@
 
 #include "KSTLib/Command.h"
 #include "common/Allocation.h"
-#include "common/CommandHeader.h"
 #include "common/Failure.h"
 #include "common/PayloadMemory.h"
 

@@ -1,7 +1,7 @@
 #include "KSTLib/Command.h"
 
 #include "KSTLib/Status.h"
-#include "common/CommandHeader.h"
+#include "common/PayloadMemory.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
