@@ -23,6 +23,34 @@ std::size_t policyIdLength(const void* policyId, std::size_t size) {
                      std::min<std::size_t>(size, kKSTPolicyIdMaxLength + 1));
 }
 
+struct Measured {
+    std::size_t policyLength = 0;
+    std::uint64_t size = 0;
+};
+
+/// The sizes of a payload whose policy is there.
+KSTStatus measure(const char* policyId, const KSTParameter* parameters,
+                  std::uint32_t parametersCount, Measured& measured) {
+    measured.policyLength = policyIdLength(policyId, SIZE_MAX);
+    if (measured.policyLength > kKSTPolicyIdMaxLength) {
+        return kst::fail(serializationContext(), "policyLength <= 128", 0, kKSTErrorBadParameter);
+    }
+    std::uint32_t parametersLength = 0;
+    const KSTStatus err = kst::measureParameters(parameters, parametersCount, parametersLength);
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    measured.size = measured.policyLength + kFixedSize + parametersLength;
+    if (measured.size <= parametersLength) {
+        return kst::fail(serializationContext(),
+                         "sizeof(KSTHandle) + policyLength + 1 + sizeof(uint8_t) + "
+                         "sizeof(uint32_t) + sizeof(uint32_t) + parametersLength > "
+                         "parametersLength",
+                         0, kKSTErrorBadParameter);
+    }
+    return kKSTErrorSuccess;
+}
+
 KSTStatus readPolicyId(base::ByteReader& reader, kst::ReceivedBlob& policyId) {
     const std::size_t length = policyIdLength(reader.rest().data(), reader.left());
     if (length > kKSTPolicyIdMaxLength) {
@@ -43,33 +71,20 @@ KSTStatus GetSerializedVerifyPolicySize(const KSTHandle* handle, const char* pol
                                         const KSTParameter* parameters,
                                         std::uint32_t parametersCount,
                                         std::size_t* outSize) noexcept {
-    const KSTStatus missing = serializationContext().requireArguments({
+    KSTStatus err = serializationContext().requireArguments({
         kst::Argument(handle, "handle"),
         kst::Argument(policyId, "policyId"),
         kst::Argument(outSize, "outSize"),
     });
-    if (missing != kKSTErrorSuccess) {
-        return missing;
-    }
-    const std::size_t policyLength = policyIdLength(policyId, SIZE_MAX);
-    if (policyLength > kKSTPolicyIdMaxLength) {
-        return kst::fail(serializationContext(), "policyLength <= 128", 0, kKSTErrorBadParameter);
-    }
-    std::uint32_t parametersLength = 0;
-    const KSTStatus err = kst::measureParameters(parameters, parametersCount, parametersLength);
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    const std::uint64_t size = policyLength + kFixedSize + parametersLength;
-    if (size <= parametersLength) {
-        return kst::fail(serializationContext(),
-                         "sizeof(KSTHandle) + policyLength + 1 + sizeof(uint8_t) + "
-                         "sizeof(uint32_t) + sizeof(uint32_t) + parametersLength > "
-                         "parametersLength",
-                         0, kKSTErrorBadParameter);
+    Measured measured;
+    err = measure(policyId, parameters, parametersCount, measured);
+    if (err == kKSTErrorSuccess) {
+        *outSize = measured.size;
     }
-    *outSize = size;
-    return kKSTErrorSuccess;
+    return err;
 }
 
 KSTStatus SerializeVerifyPolicy(const KSTHandle* handle, const char* policyId,
@@ -87,10 +102,9 @@ KSTStatus SerializeVerifyPolicy(const KSTHandle* handle, const char* policyId,
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    std::size_t requiredSize = 0;
-    err = GetSerializedVerifyPolicySize(handle, policyId, preflight, maxGlobalCredentialAge,
-                                        parameters, parametersCount, &requiredSize);
-    err = kst::checkRoom(err, requiredSize, *outSize);
+    Measured measured;
+    err = measure(policyId, parameters, parametersCount, measured);
+    err = kst::checkRoom(err, measured.size, *outSize);
     if (err == kKSTErrorSuccess) {
         err = kst::checkParameters(parameters, parametersCount);
     }
@@ -98,8 +112,7 @@ KSTStatus SerializeVerifyPolicy(const KSTHandle* handle, const char* policyId,
         return err;
     }
     base::ByteWriter writer(outBuffer, *outSize);
-    const std::size_t policyLength = policyIdLength(policyId, SIZE_MAX);
-    if (!kst::writeHandle(writer, handle) || !writer.writeBytes(policyId, policyLength) ||
+    if (!kst::writeHandle(writer, handle) || !writer.writeBytes(policyId, measured.policyLength) ||
         !writer.writeU8(0) || !writer.writeU8(preflight) ||
         !writer.writeU32(maxGlobalCredentialAge) ||
         !kst::writeParameters(writer, parameters, parametersCount)) {
