@@ -192,15 +192,20 @@ KSTStatus postCommand(std::uint8_t code, const void* inData, std::size_t inSize)
     return err == kKSTErrorSuccess ? err : failCall(libraryContext(), asLibraryStatus(err));
 }
 
-KSTStatus channelTransport(void* /*transportContext*/, std::uint32_t code, std::uint32_t thirdByte,
+KSTStatus openChannelTransport(void* /*transportContext*/, std::uint32_t code,
+                               std::uint32_t thirdByte, const void* inData, std::size_t inSize,
+                               void* outData, std::size_t* outSize) noexcept {
+    return performCommand(static_cast<std::uint8_t>(code), static_cast<std::uint8_t>(thirdByte),
+                          inData, inSize, outData, outSize);
+}
+
+KSTStatus channelTransport(void* transportContext, std::uint32_t code, std::uint32_t thirdByte,
                            const void* inData, std::size_t inSize, void* outData,
                            std::size_t* outSize) noexcept {
     const KSTStatus err = init();
-    if (err != kKSTErrorSuccess) {
-        return err;
-    }
-    return performCommand(static_cast<std::uint8_t>(code), static_cast<std::uint8_t>(thirdByte),
-                          inData, inSize, outData, outSize);
+    return err == kKSTErrorSuccess ? openChannelTransport(transportContext, code, thirdByte, inData,
+                                                          inSize, outData, outSize)
+                                   : err;
 }
 
 void updateLogLevel() noexcept {

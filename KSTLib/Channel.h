@@ -72,6 +72,11 @@ KSTStatus channelTransport(void* transportContext, std::uint32_t code, std::uint
                            const void* inData, std::size_t inSize, void* outData,
                            std::size_t* outSize) noexcept;
 
+/// `channelTransport` for a call that has opened the channel itself.
+KSTStatus openChannelTransport(void* transportContext, std::uint32_t code, std::uint32_t thirdByte,
+                               const void* inData, std::size_t inSize, void* outData,
+                               std::size_t* outSize) noexcept;
+
 /// Asks the kernel service for the library's log level and takes it over; the level stays when that
 /// fails. Does not open the channel.
 void updateLogLevel() noexcept;

@@ -14,8 +14,9 @@
 /// call.
 namespace kst {
 
+/// To be used behind `openChannel`.
 [[nodiscard]] inline CommandSender librarySender() noexcept {
-    return {libraryContext(), channelTransport};
+    return {libraryContext(), openChannelTransport};
 }
 
 /// `init`, with a failure reported by the caller's line too.
