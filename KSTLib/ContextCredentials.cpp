@@ -15,26 +15,27 @@ namespace {
 KSTStatus sendCredential(const kst::CredentialCommand& command, KSTContextRef context,
                          const KSTCredential* credential, KSTScope scope) {
     KSTStatus err = kst::checkCredential(kst::libraryContext(), context, credential, scope);
-    if (err == kKSTErrorSuccess) {
-        err = kst::openChannel();
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = kst::sendCredential(kst::librarySender(), command, context, credential, scope);
+    err = kst::openChannel();
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    return err;
+    return kst::sendCredential(kst::librarySender(), command, context, credential, scope);
 }
 
 KSTStatus removeByNumber(std::uint32_t code, KSTContextRef context, std::uint32_t number,
                          KSTScope scope) {
     KSTStatus err = kst::checkScope(kst::libraryContext(), context, scope);
-    if (err == kKSTErrorSuccess) {
-        err = kst::openChannel();
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err =
-            kst::sendNumbers(kst::librarySender(), code, context, number, scope, nullptr, nullptr);
+    err = kst::openChannel();
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    return err;
+    return kst::sendNumbers(kst::librarySender(), code, context, number, scope, nullptr, nullptr);
 }
 
 /// The kernel service's no is a status too. The size of the reply is not looked at.
@@ -46,10 +47,11 @@ KSTStatus isContained(std::uint32_t code, KSTContextRef context, std::uint32_t n
     }
     kst::WipedBytes<sizeof(std::uint32_t)> reply;
     std::size_t outSize = reply.size();
-    if (err == kKSTErrorSuccess) {
-        err = kst::sendNumbers(kst::librarySender(), code, context, number, argument, reply.data(),
-                               &outSize);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
+    err = kst::sendNumbers(kst::librarySender(), code, context, number, argument, reply.data(),
+                           &outSize);
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -78,13 +80,14 @@ KSTStatus addGlobally(const KSTCredential* credential) {
     KSTStatus err =
         kst::libraryContext().requireArguments({kst::Argument(credential, "credential")});
     kst::TemporaryContext context;
-    if (err == kKSTErrorSuccess) {
-        err = context.create();
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = addCredential(context.get(), credential, kKSTScopeGlobal);
+    err = context.create();
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    return err;
+    return addCredential(context.get(), credential, kKSTScopeGlobal);
 }
 
 KSTStatus removeGlobally(std::uint32_t type) {

@@ -39,9 +39,10 @@ KSTStatus requestContext(std::uint8_t* reply) {
 
 KSTStatus create(const char* function, KSTContextRef* context) {
     KSTStatus err = kst::libraryContext().requireArguments({kst::Argument(context, "context")});
-    if (err == kKSTErrorSuccess) {
-        err = kst::openChannel();
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
+    err = kst::openChannel();
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -78,13 +79,14 @@ KSTStatus readOpenReply(const kst::AllocatedMemory& reply, const void* externalF
 KSTStatus open(const void* externalForm, std::size_t dataLength, KSTContextRef& context) {
     KSTStatus err =
         kst::libraryContext().requireArguments({kst::Argument(externalForm, "externalForm")});
-    if (err == kKSTErrorSuccess && dataLength != kKSTHandleSize) {
-        err = kst::fail(kst::libraryContext(), "dataLength == sizeof(KSTHandle)", 0,
-                        kKSTErrorBadParameter);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = kst::openChannel();
+    if (dataLength != kKSTHandleSize) {
+        return kst::fail(kst::libraryContext(), "dataLength == sizeof(KSTHandle)", 0,
+                         kKSTErrorBadParameter);
     }
+    err = kst::openChannel();
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -116,13 +118,17 @@ KSTStatus sendHandle(std::uint32_t code, KSTContextRef context) {
 
 KSTStatus deleteContextInternal(KSTContextRef context, bool destroy) {
     KSTStatus err = kst::libraryContext().requireArguments({kst::Argument(context, "context")});
-    if (err == kKSTErrorSuccess && destroy) {
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    if (destroy) {
         err = sendHandle(kKSTCommandContextDelete, context);
     }
-    if (err == kKSTErrorSuccess) {
-        kst::disposeOfContext(context);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    return err;
+    kst::disposeOfContext(context);
+    return kKSTErrorSuccess;
 }
 
 KSTStatus getExternalForm(KSTContextRef context, const KSTDataBlock& processExternalForm) {
@@ -130,14 +136,15 @@ KSTStatus getExternalForm(KSTContextRef context, const KSTDataBlock& processExte
         kst::Argument(context, "context"),
         kst::Argument(processExternalForm, "processExternalForm"),
     });
-    if (err == kKSTErrorSuccess) {
-        err = sendHandle(kKSTCommandContextGetExternalForm, context);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        processExternalForm.invoke(processExternalForm.captured, context->handle.bytes,
-                                   kKSTHandleSize);
+    err = sendHandle(kKSTCommandContextGetExternalForm, context);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    return err;
+    processExternalForm.invoke(processExternalForm.captured, context->handle.bytes, kKSTHandleSize);
+    return kKSTErrorSuccess;
 }
 
 } // namespace

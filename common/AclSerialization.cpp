@@ -34,17 +34,20 @@ GetSerializedVerifyAclConstraintSize(const KSTHandle* /*handle*/, const void* ac
         kst::Argument(aclConstraint, "aclConstraint"),
         kst::Argument(outSize, "outSize"),
     });
-    if (err == kKSTErrorSuccess) {
-        err = kst::checkParameterList(parameters, parametersCount);
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    err = kst::checkParameterList(parameters, parametersCount);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
     std::uint64_t size = 0;
-    if (err == kKSTErrorSuccess) {
-        err = measureConstraint(aclConstraintLength, parameters, parametersCount, size);
+    err = measureConstraint(aclConstraintLength, parameters, parametersCount, size);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        *outSize = static_cast<std::uint32_t>(size);
-    }
-    return err;
+    *outSize = static_cast<std::uint32_t>(size);
+    return kKSTErrorSuccess;
 }
 
 KSTStatus SerializeVerifyAclConstraint(const KSTHandle* handle, const void* aclConstraint,
@@ -55,18 +58,20 @@ KSTStatus SerializeVerifyAclConstraint(const KSTHandle* handle, const void* aclC
                                        std::uint32_t* outSize) noexcept {
     const kst::AssertionContext context = serializationContext();
     KSTStatus err = context.requireArguments({kst::Argument(aclConstraint, "aclConstraint")});
-    if (err == kKSTErrorSuccess) {
-        err = kst::checkWriter(parameters, parametersCount, outBuffer, outSize);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
+    err = kst::checkWriter(parameters, parametersCount, outBuffer, outSize);
     if (err != kKSTErrorSuccess) {
         return err;
     }
     std::uint64_t requiredSize = 0;
     err = measureConstraint(aclConstraintLength, parameters, parametersCount, requiredSize);
     err = kst::checkRoom(err, requiredSize, *outSize);
-    if (err == kKSTErrorSuccess) {
-        err = kst::checkParameters(parameters, parametersCount);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
+    err = kst::checkParameters(parameters, parametersCount);
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -97,22 +102,26 @@ KSTStatus DeserializeVerifyAclConstraint(const void* buffer, std::uint32_t size,
         kst::Argument(outAclConstraintLength, "aclConstraintLength"),
         kst::Argument(outPreflight, "preflight"),
     });
-    if (err == kKSTErrorSuccess) {
-        err = constraint.readWithLength(payload.rest(), "constraint",
-                                        "(size - offset) >= constraintLength");
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = payload.readFlag(preflight);
+    err = constraint.readWithLength(payload.rest(), "constraint",
+                                    "(size - offset) >= constraintLength");
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = payload.finish();
+    err = payload.readFlag(preflight);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        *outAclConstraintLength = static_cast<std::uint32_t>(constraint.length());
-        *outAclConstraint = constraint.handOut();
-        *outPreflight = preflight;
+    err = payload.finish();
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    return err;
+    *outAclConstraintLength = static_cast<std::uint32_t>(constraint.length());
+    *outAclConstraint = constraint.handOut();
+    *outPreflight = preflight;
+    return kKSTErrorSuccess;
 }
 
 namespace {
@@ -163,20 +172,24 @@ KSTStatus GetSerializedProcessAclSize(const KSTHandle* /*handle*/, const void* a
                                       const KSTParameter* parameters, std::uint32_t parametersCount,
                                       std::uint32_t* outSize) noexcept {
     KSTStatus err = checkAcl(acl, aclLength);
-    if (err == kKSTErrorSuccess) {
-        err = serializationContext().requireArguments({kst::Argument(outSize, "outSize")});
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = kst::checkParameterList(parameters, parametersCount);
+    err = serializationContext().requireArguments({kst::Argument(outSize, "outSize")});
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    err = kst::checkParameterList(parameters, parametersCount);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
     std::uint64_t size = 0;
-    if (err == kKSTErrorSuccess) {
-        err = measureAcl(aclLength, operationLength, parameters, parametersCount, size);
+    err = measureAcl(aclLength, operationLength, parameters, parametersCount, size);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        *outSize = static_cast<std::uint32_t>(size);
-    }
-    return err;
+    *outSize = static_cast<std::uint32_t>(size);
+    return kKSTErrorSuccess;
 }
 
 KSTStatus SerializeProcessAcl(const KSTHandle* handle, const void* acl, std::uint32_t aclLength,
@@ -186,21 +199,23 @@ KSTStatus SerializeProcessAcl(const KSTHandle* handle, const void* acl, std::uin
                               std::uint32_t* outSize) noexcept {
     const kst::AssertionContext context = serializationContext();
     KSTStatus err = checkAcl(acl, aclLength);
-    if (err == kKSTErrorSuccess) {
-        err = kst::checkWriter(parameters, parametersCount, outBuffer, outSize);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
+    err = kst::checkWriter(parameters, parametersCount, outBuffer, outSize);
     if (err != kKSTErrorSuccess) {
         return err;
     }
     std::uint64_t requiredSize = 0;
     err = measureAcl(aclLength, operationLength, parameters, parametersCount, requiredSize);
     err = kst::checkRoom(err, requiredSize, *outSize);
-    if (err == kKSTErrorSuccess && operation == nullptr && operationLength != 0) {
-        err = kst::fail(context, "operation || !operationLength", 0, kKSTErrorBadParameter);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = kst::checkParameters(parameters, parametersCount);
+    if (operation == nullptr && operationLength != 0) {
+        return kst::fail(context, "operation || !operationLength", 0, kKSTErrorBadParameter);
     }
+    err = kst::checkParameters(parameters, parametersCount);
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -232,20 +247,24 @@ KSTStatus DeserializeProcessAcl(const void* buffer, std::uint32_t size, KSTHandl
         kst::Argument(outOperation, "operation"),
         kst::Argument(outOperationLength, "operationLength"),
     });
-    if (err == kKSTErrorSuccess) {
-        err = acl.readWithLength(payload.rest(), "tmpAcl", "(size - offset) >= tmpAclLength");
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = operation.readWithLength(payload.rest(), "op", "(size - offset) >= opLen");
+    err = acl.readWithLength(payload.rest(), "tmpAcl", "(size - offset) >= tmpAclLength");
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = payload.finish();
+    err = operation.readWithLength(payload.rest(), "op", "(size - offset) >= opLen");
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        *outAclLength = static_cast<std::uint32_t>(acl.length());
-        *outAcl = acl.handOut();
-        *outOperationLength = static_cast<std::uint32_t>(operation.length());
-        *outOperation = operation.handOut();
+    err = payload.finish();
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    return err;
+    *outAclLength = static_cast<std::uint32_t>(acl.length());
+    *outAcl = acl.handOut();
+    *outOperationLength = static_cast<std::uint32_t>(operation.length());
+    *outOperation = operation.handOut();
+    return kKSTErrorSuccess;
 }

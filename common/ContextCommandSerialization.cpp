@@ -26,12 +26,13 @@ KSTStatus passUp(KSTStatus err, kst::CheckPlace place = kst::CheckPlace::here())
 KSTStatus GetSerializedAddCredentialSize(const KSTHandle* handle, const KSTCredential* credential,
                                          KSTScope scope, std::size_t* outSize) noexcept {
     KSTStatus err = checkScope(handle, scope);
-    if (err == kKSTErrorSuccess) {
-        err = serializationContext().requireArguments({
-            kst::Argument(credential, "credential"),
-            kst::Argument(outSize, "outSize"),
-        });
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
+    err = serializationContext().requireArguments({
+        kst::Argument(credential, "credential"),
+        kst::Argument(outSize, "outSize"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -48,13 +49,14 @@ KSTStatus SerializeAddCredential(const KSTHandle* handle, const KSTCredential* c
                                  KSTScope scope, void* outBuffer, std::size_t* outSize) noexcept {
     const kst::AssertionContext context = serializationContext();
     KSTStatus err = checkScope(handle, scope);
-    if (err == kKSTErrorSuccess) {
-        err = context.requireArguments({
-            kst::Argument(credential, "credential"),
-            kst::Argument(outBuffer, "outBuffer"),
-            kst::Argument(outSize, "outSize"),
-        });
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
+    err = context.requireArguments({
+        kst::Argument(credential, "credential"),
+        kst::Argument(outBuffer, "outBuffer"),
+        kst::Argument(outSize, "outSize"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -86,18 +88,19 @@ KSTStatus DeserializeAddCredential(const void* buffer, std::size_t size, KSTHand
                                    KSTCredential** outCredential, KSTScope* outScope) noexcept {
     const kst::AssertionContext context = serializationContext();
     KSTStatus err = context.requireArguments({kst::Argument(buffer, "buffer")});
-    if (err == kKSTErrorSuccess && size < kSmallestSize) {
-        err = kst::fail(context,
-                        "size >= sizeof(KSTHandle) + sizeof(KSTCredential) + sizeof(KSTScope)", 0,
-                        kKSTErrorBadParameter);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = context.requireArguments({
-            kst::Argument(outHandle, "handle"),
-            kst::Argument(outCredential, "credential"),
-            kst::Argument(outScope, "scope"),
-        });
+    if (size < kSmallestSize) {
+        return kst::fail(context,
+                         "size >= sizeof(KSTHandle) + sizeof(KSTCredential) + sizeof(KSTScope)", 0,
+                         kKSTErrorBadParameter);
     }
+    err = context.requireArguments({
+        kst::Argument(outHandle, "handle"),
+        kst::Argument(outCredential, "credential"),
+        kst::Argument(outScope, "scope"),
+    });
     if (err != kKSTErrorSuccess) {
         return err;
     }

@@ -17,9 +17,10 @@ KSTStatus checkTransport(const kst::CommandSender& sender) {
 
 KSTStatus create(const kst::CommandSender& sender, KSTContextRef* context, std::uint8_t* logLevel) {
     KSTStatus err = checkTransport(sender);
-    if (err == kKSTErrorSuccess) {
-        err = sender.context.requireArguments({kst::Argument(context, "context")});
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
+    err = sender.context.requireArguments({kst::Argument(context, "context")});
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -45,74 +46,82 @@ KSTStatus create(const kst::CommandSender& sender, KSTContextRef* context, std::
 
 KSTStatus deleteContext(const kst::CommandSender& sender, KSTContextRef context, bool destroy) {
     KSTStatus err = checkTransport(sender);
-    if (err == kKSTErrorSuccess) {
-        err = sender.context.requireArguments({kst::Argument(context, "context")});
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess && destroy) {
+    err = sender.context.requireArguments({kst::Argument(context, "context")});
+    if (err != kKSTErrorSuccess) {
+        return err;
+    }
+    if (destroy) {
         err = sender.send(kKSTCommandContextDelete, context->handle.bytes, kKSTHandleSize, nullptr,
                           nullptr);
     }
-    if (err == kKSTErrorSuccess) {
-        kst::disposeOfContext(context);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    return err;
+    kst::disposeOfContext(context);
+    return kKSTErrorSuccess;
 }
 
 KSTStatus addCredential(const kst::CommandSender& sender, KSTContextRef context,
                         const KSTCredential* credential, KSTScope scope) {
     KSTStatus err = checkTransport(sender);
-    if (err == kKSTErrorSuccess) {
-        err = kst::checkCredential(sender.context, context, credential, scope);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = kst::sendCredential(sender, kst::kAddCredential, context, credential, scope);
+    err = kst::checkCredential(sender.context, context, credential, scope);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    return err;
+    return kst::sendCredential(sender, kst::kAddCredential, context, credential, scope);
 }
 
 KSTStatus removeCredentialsByType(const kst::CommandSender& sender, KSTContextRef context,
                                   std::uint32_t type, KSTScope scope) {
     KSTStatus err = checkTransport(sender);
-    if (err == kKSTErrorSuccess) {
-        err = kst::checkScope(sender.context, context, scope);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = kst::sendNumbers(sender, kKSTCommandRemoveCredentialsByType, context, type, scope,
-                               nullptr, nullptr);
+    err = kst::checkScope(sender.context, context, scope);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    return err;
+    return kst::sendNumbers(sender, kKSTCommandRemoveCredentialsByType, context, type, scope,
+                            nullptr, nullptr);
 }
 
 KSTStatus checkPolicyArguments(const kst::CommandSender& sender,
                                const kst::PolicyQuestion& question, const char* policyId,
                                const bool* policySatisfied) {
     KSTStatus err = checkTransport(sender);
-    if (err == kKSTErrorSuccess) {
-        err = sender.context.requireArguments({kst::Argument(question.context, "context")});
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess &&
-        (question.parametersCount > 0) != (question.parameters != nullptr)) {
-        err = kst::fail(sender.context,
-                        "( (parametersCount > 0 && parameters != ((void*)0)) || "
-                        "((parametersCount == 0) && parameters == ((void*)0)) )",
-                        0, kKSTErrorBadParameter);
+    err = sender.context.requireArguments({kst::Argument(question.context, "context")});
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = sender.context.requireArguments({
-            kst::Argument(policyId, "policyId"),
-            kst::Argument(policySatisfied, "policySatisfied"),
-        });
+    if ((question.parametersCount > 0) != (question.parameters != nullptr)) {
+        return kst::fail(sender.context,
+                         "( (parametersCount > 0 && parameters != ((void*)0)) || "
+                         "((parametersCount == 0) && parameters == ((void*)0)) )",
+                         0, kKSTErrorBadParameter);
     }
-    return err;
+    return sender.context.requireArguments({
+        kst::Argument(policyId, "policyId"),
+        kst::Argument(policySatisfied, "policySatisfied"),
+    });
 }
 
 KSTStatus verifyPolicy(const kst::CommandSender& sender, const kst::PolicyQuestion& question,
                        const char* policyId, bool* policySatisfied, KSTRequirement** requirement) {
     KSTStatus err = checkPolicyArguments(sender, question, policyId, policySatisfied);
     kst::PolicyAnswer answer;
-    if (err == kKSTErrorSuccess) {
-        err = kst::askAboutPolicy(sender, policyId, question, requirement != nullptr, answer);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
+    err = kst::askAboutPolicy(sender, policyId, question, requirement != nullptr, answer);
     if (err != kKSTErrorSuccess) {
         return err;
     }

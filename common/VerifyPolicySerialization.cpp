@@ -96,18 +96,20 @@ KSTStatus SerializeVerifyPolicy(const KSTHandle* handle, const char* policyId,
         kst::Argument(handle, "handle"),
         kst::Argument(policyId, "policyId"),
     });
-    if (err == kKSTErrorSuccess) {
-        err = kst::checkWriter(parameters, parametersCount, outBuffer, outSize);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
+    err = kst::checkWriter(parameters, parametersCount, outBuffer, outSize);
     if (err != kKSTErrorSuccess) {
         return err;
     }
     Measured measured;
     err = measure(policyId, parameters, parametersCount, measured);
     err = kst::checkRoom(err, measured.size, *outSize);
-    if (err == kKSTErrorSuccess) {
-        err = kst::checkParameters(parameters, parametersCount);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
+    err = kst::checkParameters(parameters, parametersCount);
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -135,18 +137,22 @@ KSTStatus DeserializeVerifyPolicy(const void* buffer, std::size_t size, KSTHandl
         kst::Argument(outPolicyId, "policyId"),
         kst::Argument(outPreflight, "preflight"),
     });
-    if (err == kKSTErrorSuccess) {
-        err = readPolicyId(payload.rest(), policyId);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = payload.readFlag(preflight);
+    err = readPolicyId(payload.rest(), policyId);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        err = payload.finish();
+    err = payload.readFlag(preflight);
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    if (err == kKSTErrorSuccess) {
-        *outPolicyId = reinterpret_cast<char*>(policyId.handOut());
-        *outPreflight = preflight;
+    err = payload.finish();
+    if (err != kKSTErrorSuccess) {
+        return err;
     }
-    return err;
+    *outPolicyId = reinterpret_cast<char*>(policyId.handOut());
+    *outPreflight = preflight;
+    return kKSTErrorSuccess;
 }
