@@ -1,12 +1,15 @@
 #include "kstctl/CommandLine.h"
 
 #include "base/Concat.h"
+#include "base/Digits.h"
 #include "kstctl/Output.h"
 #include "kstctl/commands/Inputs.h"
 #include "kstctl/decode/Kinds.h"
+#include "wire/GateMessages.h"
 
 #include <CLI/CLI.hpp>
 
+#include <algorithm>
 #include <charconv>
 #include <cstdio>
 #include <limits>
@@ -41,6 +44,55 @@ CLI::Validator numberBetween(Number least, Number greatest) {
             }
             return base::concat("Value ", word, " not in range ", std::to_string(least), " to ",
                                 std::to_string(greatest));
+        },
+        "");
+}
+
+bool isNumber(const std::string& word) {
+    return base::parseNumber<std::uint32_t>(word).has_value();
+}
+
+/// A word like "10min", which becomes the number of seconds.
+CLI::Validator timeSpan(std::uint32_t greatest) {
+    return CLI::Validator(
+        [greatest](std::string& word) {
+            const std::size_t unitStart =
+                std::min(word.find_first_not_of("0123456789"), word.size());
+            const std::string unit = word.substr(unitStart);
+            const auto count = base::parseNumber<std::uint32_t>(word.substr(0, unitStart));
+            std::uint32_t factor = 0;
+            if (unit == "s" || word == "0") {
+                factor = 1;
+            } else if (unit == "min") {
+                factor = 60;
+            } else if (unit == "h") {
+                factor = 3600;
+            }
+            if (unitStart == 0 || factor == 0) {
+                return base::concat("Value ", word, " is no time such as 30s, 10min or 2h");
+            }
+            if (!count || *count > greatest / factor) {
+                return base::concat("Value ", word, " is longer than ", greatest / 3600, "h");
+            }
+            word = std::to_string(*count * factor);
+            return std::string();
+        },
+        "");
+}
+
+/// A chain of ports behind a bus: "1-2.3".
+CLI::Validator port() {
+    return CLI::Validator(
+        [](std::string& word) {
+            const std::size_t hyphen = word.find('-');
+            bool isPort = hyphen != std::string::npos && isNumber(word.substr(0, hyphen));
+            for (std::size_t start = hyphen; isPort && start < word.size();) {
+                const std::size_t end = std::min(word.find('.', start + 1), word.size());
+                isPort = isNumber(word.substr(start + 1, end - start - 1));
+                start = end;
+            }
+            return isPort ? std::string()
+                          : base::concat("Value ", word, " is no port such as 1-2 or 1-2.3");
         },
         "");
 }
@@ -133,6 +185,31 @@ void addSim(CLI::App& app, CommandLine& options) {
     sim->add_option("words", chosenBy<SimCommand>(sim, options).words, "The command")->required();
 }
 
+void addGate(CLI::App& app, CommandLine& options) {
+    CLI::App* const devices =
+        addCommand(app, "devices", "The USB devices, and which of them are let in");
+    devices->require_subcommand(0, 1);
+    auto& command = chosenBy<DevicesCommand>(devices, options);
+    addCommand(*devices, "accept", "Let one in that was refused")
+        ->add_option("port", command.toAccept, "Where it is plugged in, as the list shows it")
+        ->required()
+        ->check(port());
+
+    CLI::App* const open = addCommand(app, "open", "Let all new USB devices in for a while");
+    open->add_option("--for", chosenBy<OpenCommand>(open, options).seconds,
+                     "How long, with s, min or h behind the number; 0 ends it")
+        ->required()
+        ->type_name("TIME")
+        ->transform(timeSpan(wire::kMostGateOpenSeconds));
+
+    for (const bool isLocked : {true, false}) {
+        CLI::App* const lock = addCommand(app, isLocked ? "lock" : "unlock",
+                                          isLocked ? "Tell logind that your screen is locked"
+                                                   : "Tell it that it is not any more");
+        chosenBy<LockCommand>(lock, options).isLocked = isLocked;
+    }
+}
+
 /// What the parser says, or the word that stands where a command must.
 std::string reasonOf(const CLI::App& app, const CLI::ParseError& problem) {
     const std::vector<std::string> words = app.remaining(true);
@@ -171,6 +248,7 @@ std::optional<CommandLine> parseCommandLine(int argc, const char* const* argv, E
     addSend(app, options);
     addDecode(app, options);
     addSim(app, options);
+    addGate(app, options);
     try {
         app.parse(argc, argv);
     } catch (const CLI::ParseError& problem) {

@@ -62,6 +62,21 @@ struct SimCommand {
     std::vector<std::string> words;
 };
 
+struct DevicesCommand {
+    /// The port of the device to let in; without it they are shown.
+    std::optional<std::string> toAccept;
+};
+
+struct OpenCommand {
+    /// 0 ends it.
+    std::uint32_t seconds = 0;
+};
+
+struct LockCommand {
+    /// The user's session is locked now, or is not any more.
+    bool isLocked = true;
+};
+
 /// What the command line asks for.
 struct CommandLine {
     std::string root = "/";
@@ -69,7 +84,8 @@ struct CommandLine {
     /// The longest wait for a database that is locked or a socket that is full.
     std::chrono::milliseconds patience{2000};
     std::variant<StatusCommand, EventsListCommand, EventsShowCommand, EventsExportCommand,
-                 UploadCommand, SendCommand, DecodeCommand, SimCommand>
+                 UploadCommand, SendCommand, DecodeCommand, SimCommand, DevicesCommand, OpenCommand,
+                 LockCommand>
         command;
 };
 
@@ -89,5 +105,8 @@ struct CommandLine {
 [[nodiscard]] ExitStatus run(const SendCommand& command, const Environment& environment);
 [[nodiscard]] ExitStatus run(const DecodeCommand& command, const Environment& environment);
 [[nodiscard]] ExitStatus run(const SimCommand& command, const Environment& environment);
+[[nodiscard]] ExitStatus run(const DevicesCommand& command, const Environment& environment);
+[[nodiscard]] ExitStatus run(const OpenCommand& command, const Environment& environment);
+[[nodiscard]] ExitStatus run(const LockCommand& command, const Environment& environment);
 
 } // namespace kstctl

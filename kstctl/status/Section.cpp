@@ -191,6 +191,7 @@ constexpr Part kParts[] = {
     {"managedSettings", settingsSection},
     {"database", databaseSection},
     {"upload", uploadSection},
+    {"gate", gateSection},
 };
 
 } // namespace
@@ -199,6 +200,9 @@ ExitStatus run(const StatusCommand& /*command*/, const Environment& environment)
     Section all;
     for (const Part& part : kParts) {
         Section section = part.find(environment);
+        if (section.report.isEmpty()) {
+            continue;
+        }
         all.report.add(part.name, std::move(section.report));
         if (section.worst) {
             all.note(*section.worst);

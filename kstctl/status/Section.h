@@ -43,6 +43,8 @@ struct Section {
 [[nodiscard]] Section analyticsFileSection(const Environment& environment);
 [[nodiscard]] Section alarmSection(const Environment& environment);
 [[nodiscard]] Section settingsSection(const Environment& environment);
+/// Empty on a machine without a gate in front of its USB ports.
+[[nodiscard]] Section gateSection(const Environment& environment);
 [[nodiscard]] Section databaseSection(const Environment& environment);
 [[nodiscard]] Section uploadSection(const Environment& environment);
 
