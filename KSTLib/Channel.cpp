@@ -71,6 +71,7 @@ KSTStatus sendFrame(const AllocatedMemory& frame, void* outData, std::size_t* ou
     if (err != kKSTErrorSuccess) {
         return failTransport(*platform, err);
     }
+    // The platform tells the size of a reply that did not fit, and nothing else of it.
     if (replySize > offeredSize) {
         call.connectionLost = !platform->channel.isConnected(gConnection);
         return fail(libraryContext(), "replySize <= offeredSize", 0, kKSTErrorUnexpected);
@@ -148,6 +149,7 @@ KSTStatus init() noexcept {
     }
     platform::ConnectionHandle connection = platform::kNoConnection;
     const KSTStatus err = platform->channel.open(service, kConnectionType, &connection);
+    // The service object is not given back: the next try finds the same one.
     if (err != kKSTErrorSuccess) {
         return failCall(libraryContext(), asLibraryStatus(err));
     }
@@ -170,6 +172,7 @@ KSTStatus performCommand(std::uint8_t code, std::uint8_t thirdByte, const void* 
     if (outSize != nullptr && *outSize != 0 && outData == nullptr) {
         return fail(libraryContext(), "outData", 0, kKSTErrorBadParameter);
     }
+    // As if there were no memory, which could not even be asked for so much.
     if (inSize > std::numeric_limits<std::size_t>::max() - kKSTCommandHeaderSize) {
         return fail(libraryContext(), "cmd", 0, kKSTErrorOutOfMemory);
     }

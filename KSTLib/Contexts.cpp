@@ -56,6 +56,7 @@ KSTStatus create(const char* function, KSTContextRef* context) {
     }
     kst::gLogLevel = ref.bytes()[kKSTHandleSize];
     kst::logLevelSet(function);
+    // The reply is the context: a handle, and one byte more that nobody looks at again.
     *context = reinterpret_cast<KSTContext*>(ref.handOut());
     return kKSTErrorSuccess;
 }

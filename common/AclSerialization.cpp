@@ -46,6 +46,7 @@ GetSerializedVerifyAclConstraintSize(const KSTHandle* /*handle*/, const void* ac
     if (err != kKSTErrorSuccess) {
         return err;
     }
+    // Cut to 32 bits where it does not fit. Who writes looks at the whole of it.
     *outSize = static_cast<std::uint32_t>(size);
     return kKSTErrorSuccess;
 }

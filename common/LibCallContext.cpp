@@ -102,6 +102,7 @@ KSTStatus checkPolicyArguments(const kst::CommandSender& sender,
     if (err != kKSTErrorSuccess) {
         return err;
     }
+    // The null pointer stands in the text as its macro expands.
     if ((question.parametersCount > 0) != (question.parameters != nullptr)) {
         return kst::fail(sender.context,
                          "( (parametersCount > 0 && parameters != ((void*)0)) || "
@@ -144,6 +145,7 @@ KSTStatus LibCall_KSTContextDelete(KSTTransport transport, KSTContextRef context
     return kst::printReturn(__func__, deleteContext(senderOver(transport), context, destroy));
 }
 
+// Without the t: this is what clients link.
 KSTStatus LibCall_KSTContexAddCredentialWithScope(KSTTransport transport, KSTContextRef context,
                                                   const KSTCredential* credential,
                                                   KSTScope scope) noexcept {

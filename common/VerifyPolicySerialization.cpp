@@ -41,6 +41,7 @@ KSTStatus measure(const char* policyId, const KSTParameter* parameters,
         return err;
     }
     measured.size = measured.policyLength + kFixedSize + parametersLength;
+    // Never so in 64 bits; it says that the sum cannot have wrapped.
     if (measured.size <= parametersLength) {
         return kst::fail(serializationContext(),
                          "sizeof(KSTHandle) + policyLength + 1 + sizeof(uint8_t) + "

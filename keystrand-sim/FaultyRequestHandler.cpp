@@ -40,6 +40,7 @@ CallDescription describe(KernelOperation operation, std::span<const std::uint8_t
     }
     call.withholding = withholdingFrom(frame->code, frame->payload);
     if (request->selector != kKSTSelectorCommand) {
+        // A secret is one whatever selector it came with.
         if (call.withholding) {
             call.withholding->kept += kKSTCommandHeaderSize;
         }

@@ -84,6 +84,7 @@ std::optional<Registry::Record> Registry::acknowledge(std::string_view name) {
         return std::nullopt;
     }
     const Property& property = found->second;
+    // A record that nobody has seen, or whose event is still to come, would be lost.
     if (property.announcements > 0 || property.handedOut != property.generation) {
         return std::nullopt;
     }
@@ -94,6 +95,7 @@ std::optional<Registry::Record> Registry::acknowledge(std::string_view name) {
 
 Registry::Properties::iterator Registry::acknowledgedProperty(std::string_view name) {
     const auto exact = properties_.find(name);
+    // A name that fills its payload may have been cut.
     if (exact != properties_.end() || name.size() < wire::rm::kNotificationAckPayloadSize) {
         return exact;
     }

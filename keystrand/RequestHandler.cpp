@@ -28,6 +28,7 @@ RequestOutcome RequestHandler::handle(std::span<const std::uint8_t> packet,
                                       ConnectionState& connection) {
     const auto header = headerOf(packet);
     if (!header) {
+        // Without a header there is no sequence number that an answer could bear.
         return {.kind = RequestOutcome::Kind::hangUp, .packet = {}};
     }
     Reply reply =
@@ -135,6 +136,7 @@ RequestHandler::Reply RequestHandler::structCall(Bytes body,
     if (result.status != kKernelSuccess) {
         return failed(result.status);
     }
+    // Of an output of a fixed size the command has made sure before it did anything.
     if (result.output.size() > request->offeredSize) {
         return failed(kKernelReplyDoesNotFit);
     }

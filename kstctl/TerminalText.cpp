@@ -89,6 +89,7 @@ std::string printableJSON(std::string_view json) {
             shown += JSONEscape(*character);
             continue;
         }
+        // JSON has no escape for a byte that is no character.
         if (!character) {
             json.remove_prefix(1);
         }

@@ -31,6 +31,7 @@ bool readHead(base::ByteReader& reader, std::string_view expectedMagic, KernelOp
         !reader.readU8(code) || !reader.readU16(reserved) || !reader.readU64(sequence)) {
         return false;
     }
+    // Any code fits into the type; which ones there are is looked at below.
     operation = static_cast<KernelOperation>(code);
     return magic == expectedMagic && version == kKernelSocketVersion &&
            operation >= KernelOperation::findByPath && operation <= KernelOperation::scalarCall;
@@ -195,6 +196,7 @@ std::optional<KernelScalarRequest> decodeKernelScalar(std::span<const std::uint8
         !reader.readU32(inputCount)) {
         return std::nullopt;
     }
+    // Before there is room made for as many as a stranger says.
     if (inputCount > kKernelMaxScalars || request.offeredCount > kKernelMaxScalars) {
         return std::nullopt;
     }

@@ -107,6 +107,7 @@ std::optional<std::string> valueInOsRelease(std::string_view text, std::string_v
         text.remove_prefix(std::min(end + 1, text.size()));
         if (line.starts_with(name) && line.substr(name.size()).starts_with('=')) {
             std::optional<std::string> found = ValueParser(line.substr(name.size() + 1)).parse();
+            // The last one counts, as in a shell.
             if (found) {
                 value = std::move(found);
             }
