@@ -49,9 +49,12 @@ class Lines:
 
 
 class Machine:
-    """One start of a machine, from power on to power off. What outlives it is its disk."""
+    """One start of a machine, from power on to power off. What outlives it is its disk.
 
-    def __init__(self, base, disk, console, *, root_on_usb=False, sleeps=False, words=""):
+    With a root_port, the disk is a USB disk in that port.
+    """
+
+    def __init__(self, base, disk, console, *, root_port=None, sleeps=False, words=""):
         self.console = console
         self.qmp_end, qmp_far = socket.socketpair()
         self.agent_end, agent_far = socket.socketpair()
@@ -59,7 +62,7 @@ class Machine:
         far = (qmp_far.fileno(), agent_far.fileno())
         with open(console + ".qemu", "ab") as errors:
             self.process = subprocess.Popen(
-                self.command(base, disk, far, root_on_usb, "vmlinuz" if sleeps else "vmlinux", words),
+                self.command(base, disk, far, root_port, "vmlinuz" if sleeps else "vmlinux", words),
                 pass_fds=far, preexec_fn=die_with_parent, stdin=subprocess.DEVNULL, stdout=errors, stderr=errors)
         qmp_far.close()
         agent_far.close()
@@ -68,8 +71,8 @@ class Machine:
         self.qmp_lines.get(PATIENCE, "QEMU's greeting")
         self.qmp("qmp_capabilities")
 
-    def command(self, base, disk, far, root_on_usb, kernel, words):
-        disk_device = "usb-storage,bus=usb.0,port=4,serial=root" if root_on_usb else "virtio-blk-pci"
+    def command(self, base, disk, far, root_port, kernel, words):
+        disk_device = f"usb-storage,bus=usb.0,port={root_port},serial=root" if root_port else "virtio-blk-pci"
         slots = [word for number in range(SLOTS)
                  for word in ("-device", f"pcie-root-port,id=slot{number},chassis={number + 1},slot={number + 1}")]
         return ["qemu-system-x86_64", "-nodefaults", "-no-user-config", "-no-reboot",
@@ -79,7 +82,7 @@ class Machine:
                 "-kernel", f"{base}/{kernel}", "-initrd", f"{base}/initrd",
                 "-append", f"console=ttyS0 panic=-1 loglevel=5 mitigations=off {words}",
                 *slots,
-                "-device", "qemu-xhci,id=usb",
+                "-device", "qemu-xhci,id=usb,p2=8,p3=8",
                 "-drive", f"file={disk},format=raw,if=none,id=disk,cache=unsafe", "-device", f"{disk_device},drive=disk",
                 "-device", "virtio-serial-pci",
                 "-chardev", f"socket,id=agent,fd={far[1]}", "-device", "virtserialport,chardev=agent,name=agent"]
@@ -105,6 +108,7 @@ class Machine:
         self.qmp("device_add", driver=driver, id=name, bus=bus, port=str(port), serial=name, **properties)
 
     def plug_disk(self, name, port, image, **properties):
+        """The same for a disk, which keeps what is written in this image."""
         self.qmp("blockdev-add", driver="raw", file={"driver": "file", "filename": image}, **{"node-name": "node-" + name})
         self.plug("usb-storage", name, port, drive="node-" + name, **properties)
 
@@ -170,8 +174,16 @@ class Machine:
     # Its end.
 
     def power_off(self):
-        self.agent.put(base64.b64encode(b"systemctl poweroff --force").decode())
+        self.agent.put(base64.b64encode(b"systemctl poweroff").decode())
         self.wait_end()
+
+    def sleep(self):
+        """Returns when the machine sleeps; wakes by wake()."""
+        self.run("systemctl suspend >/run/suspend 2>&1 &")
+        self.wait_event("SUSPEND")
+
+    def wake(self):
+        self.qmp("system_wakeup")
 
     def wait_end(self):
         try:
@@ -199,21 +211,39 @@ class Machine:
 class Story:
     """What is told while it goes on: a line for each thing that was seen, with the seconds since the start."""
 
-    def __init__(self, base, work):
+    def __init__(self, base, work, *words):
         self.began = time.monotonic()
         self.base = base
         self.work = work
+        self.words = words
         self.machine = None
 
     def tell(self, line):
         print(f"{time.monotonic() - self.began:6.1f}  {line}", flush=True)
 
-    def start(self, **how):
-        """Switches the machine on, for the first time or again."""
+    def switch_on(self, **how):
+        """For the first time or again. What is plugged in now is there before the kernel is."""
+        if self.machine:
+            self.machine.kill()
         self.machine = Machine(self.base, self.work + "/disk", self.work + "/console", **how)
+        return self.machine
+
+    def wait_started(self):
         self.machine.wait_ready()
         self.tell("the machine has started")
+
+    def start(self, **how):
+        self.switch_on(**how)
+        self.wait_started()
         return self.machine
+
+    def disk_image(self, name):
+        """An empty file system to be plugged in."""
+        path = f"{self.work}/{name}"
+        with open(path, "wb") as file:
+            file.truncate(8 << 20)
+        subprocess.run(["mke2fs", "-q", "-F", "-t", "ext4", "-O", "^has_journal", path], check=True)
+        return path
 
     def fail(self, failure):
         print(f"FAILED: {failure}", flush=True)
@@ -226,7 +256,7 @@ class Story:
     def show_journal(self):
         try:
             print("The journal's end:\n" + self.machine.ask("journalctl --no-pager --no-hostname -n 80")[1])
-        except Failure as failure:
+        except (Failure, OSError) as failure:
             print(failure)
 
 

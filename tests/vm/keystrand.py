@@ -1,0 +1,107 @@
+"""keystrand and kstd as they are installed on a machine: who sits there, what is plugged in, and what became of it."""
+import json
+
+from machine import Failure
+
+D = "/sys/bus/usb/devices"
+PARAMETER = "/sys/module/usbcore/parameters/authorized_default"
+OPEN, CLOSED = "1", "2"  # ports inside the machine stay open
+LOGIN1 = "org.freedesktop.login1"
+
+
+class Keystrand:
+    def __init__(self, vm, story):
+        self.vm = vm
+        self.story = story
+
+    def wait_running(self):
+        for unit in ("keystrand.service", "keystrand-sessions.service"):
+            self.vm.until_says(f"systemctl is-active {unit}", "active")
+
+    def set_period(self, seconds):
+        """For a service that is to start again."""
+        self.vm.run(f"mkdir -p /etc/keystrand; echo 'period = {seconds}' >/etc/keystrand/keystrand.conf")
+        self.vm.run("systemctl restart keystrand.service")
+        self.wait_running()
+
+    # Who sits there.
+
+    def log_in(self):
+        self.vm.run("systemctl start person.service")
+        self.vm.until("a session", self.session)
+        self.await_open()
+
+    def log_out(self):
+        self.vm.run("systemctl stop person.service")
+
+    def session(self):
+        listed = json.loads(self.vm.run("loginctl --output=json list-sessions") or "[]")
+        return next((each["session"] for each in listed if each["user"] == "person"), None)
+
+    def hint(self, locked):
+        answer = self.vm.run(f"busctl call {LOGIN1} /org/freedesktop/login1 {LOGIN1}.Manager GetSession s {self.session()}")
+        path = answer.split('"')[1]
+        self.vm.run(f"busctl call {LOGIN1} {path} {LOGIN1}.Session SetLockedHint b {'true' if locked else 'false'}")
+
+    def lock(self):
+        seen = self.count("keystrand: the machine is locked")
+        self.hint(True)
+        self.await_line("keystrand: the machine is locked", seen)
+
+    def unlock(self):
+        self.hint(False)
+        self.await_open()
+
+    # What the service says and does.
+
+    def lines(self):
+        return self.vm.run("journalctl -b -u keystrand.service -o cat --no-pager").splitlines()
+
+    def count(self, beginning):
+        return sum(line.startswith(beginning) for line in self.lines())
+
+    def await_line(self, beginning, seen=0):
+        """Waits for one line more than were seen, and returns it."""
+        def newest():
+            found = [line for line in self.lines() if line.startswith(beginning)]
+            return found[seen:] and found[-1]
+        return self.vm.until(f"a line that begins with {beginning!r}", newest)
+
+    def root_hubs(self):
+        return set(self.vm.run(f"cat {D}/usb*/authorized_default").split())
+
+    def await_open(self):
+        self.vm.until("each root hub is open", lambda: self.root_hubs() == {OPEN})
+
+    def await_closed(self):
+        self.vm.until("each root hub is closed", lambda: self.root_hubs() == {CLOSED})
+        self.vm.equals("so is the parameter", f"cat {PARAMETER}", CLOSED)
+
+    # What is plugged in.
+
+    def is_in(self, name, driver=None):
+        """Waits until the device is in, and bound to its driver when one is named."""
+        directory = self.vm.device(name)
+        self.vm.until_says(f"cat {directory}/authorized", "1")
+        if driver:
+            self.vm.until_says(f"basename $(readlink {directory}:1.0/driver)", driver)
+        return directory
+
+    def is_refused(self, name):
+        """Waits for the line, looks at the device, and returns its port."""
+        directory = self.vm.device(name)
+        port = directory.rsplit("/", 1)[1]
+        line = self.await_line(f"keystrand: refused {port} (")
+        if f'serial "{name}"' not in line:
+            raise Failure(f"the line on {name} does not name it: {line}")
+        self.vm.equals(f"{name} is refused", f"cat {directory}/authorized", "0")
+        return port
+
+    def disk_of(self, name):
+        """The disk that a device became."""
+        find = f"basename $(ls -d {self.vm.device(name)}:1.0/host*/target*/*/block/*)"
+        return "/dev/" + self.vm.until(f"{name} is a disk", lambda: self.vm.ask(find)[1].startswith("sd") and self.vm.run(find))
+
+    def survives(self, disk):
+        """What is written to an attached disk is read back from it, not from memory."""
+        self.vm.run(f"echo written >/mnt/file; sync; echo 3 >/proc/sys/vm/drop_caches; grep -qx written /mnt/file; grep -q '^{disk} /mnt ' /proc/mounts")
