@@ -13,6 +13,8 @@
 
 namespace {
 
+constexpr int kWrongUsage = 2;
+
 struct CommandLine {
     std::string root = "/";
     bool restore = false;
@@ -30,13 +32,15 @@ std::optional<CommandLine> parseOptions(int argc, const char* const* argv, int& 
     try {
         app.parse(argc, argv);
     } catch (const CLI::ParseError& problem) {
-        exitStatus = app.exit(problem);
+        exitStatus = app.exit(problem) == 0 ? 0 : kWrongUsage;
         return std::nullopt;
     }
     return options;
 }
 
-int serve(const std::string& root, keystrand::usb::GateLog& log) {
+using keystrand::usb::JournalGateLog;
+
+int serve(const std::string& root, JournalGateLog::Target target, JournalGateLog& log) {
     std::string error;
     auto activated = keystrand::takeActivatedServiceSocket(error);
     const auto service =
@@ -47,8 +51,12 @@ int serve(const std::string& root, keystrand::usb::GateLog& log) {
         std::fprintf(stderr, "keystrand: %s\n", error.c_str());
         return 1;
     }
-    std::puts("keystrand: ready");
-    std::fflush(stdout);
+    if (target == JournalGateLog::Target::journal) {
+        log.write(keystrand::usb::GateLine::started, "keystrand: ready");
+    } else {
+        std::puts("keystrand: ready");
+        std::fflush(stdout);
+    }
     sd_notify(0, "READY=1");
     return service->run() ? 0 : 1;
 }
@@ -62,9 +70,10 @@ int main(int argc, char** argv) {
     if (!options) {
         return exitStatus;
     }
-    keystrand::usb::JournalGateLog log(keystrand::usb::JournalGateLog::targetFor(options->root));
+    const auto target = JournalGateLog::targetFor(options->root);
+    JournalGateLog log(target);
     if (options->restore) {
         return keystrand::usb::KeystrandService::restore(options->root, log) ? 0 : 1;
     }
-    return serve(options->root, log);
+    return serve(options->root, target, log);
 }

@@ -42,6 +42,19 @@ TEST(GateConfigurationTest, NothingIsSet) {
     }
 }
 
+/// What whoever starts from the example gets until they change something.
+TEST(GateConfigurationTest, ExampleSaysWhatHoldsWithoutIt) {
+    std::ifstream file(SOURCE_ROOT "/examples/keystrand.conf");
+    const std::string text{std::istreambuf_iterator<char>(file), {}};
+    const GateConfiguration configuration = parse(text);
+    expectUnset(configuration.settings);
+    EXPECT_EQ(configuration.remarks, Remarks());
+    for (const char* key : {"\nperiod = ", "\ninternal = ", "\nkeyboards = ", "\n#not-keyboards = ",
+                            "\non-unlock = "}) {
+        EXPECT_NE(text.find(key), std::string::npos) << key;
+    }
+}
+
 TEST(GateConfigurationTest, EachKeyIsTaken) {
     const GateConfiguration configuration = parse("# all of them\n"
                                                   "period = 60\n"
