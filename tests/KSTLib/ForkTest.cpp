@@ -42,7 +42,7 @@ class Fork : public support::KernelServerFixture {
         for (const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) {
             std::error_code error;
             const auto target = std::filesystem::read_symlink(entry.path(), error);
-            count += target.string().starts_with("socket:") ? 1 : 0;
+            count += target.string().starts_with("socket:") ? 1U : 0U;
         }
         return count;
     }
