@@ -30,7 +30,7 @@ struct UsbFunctions {
 };
 
 /// Reads descriptors as the kernel hands them out: the device's, and each configuration's with all
-/// that belongs to it (Universal Serial Bus Specification 2.0, chapter 9.5 and 9.6; the classes of
+/// that belongs to it (Universal Serial Bus 2.0, chapters 9.5 and 9.6; the classes of
 /// HID: Device Class Definition for Human Interface Devices 1.11, chapter 4).
 ///
 /// Never reads beyond the bytes. Not understood is everything that contradicts itself: lengths that
