@@ -80,7 +80,7 @@ class Machine:
                 "-display", "none", "-vga", "none", "-serial", f"file:{self.console}",
                 "-chardev", f"socket,id=qmp,fd={far[0]}", "-mon", "chardev=qmp,mode=control",
                 "-kernel", f"{base}/{kernel}", "-initrd", f"{base}/initrd",
-                "-append", f"console=ttyS0 panic=-1 loglevel=5 mitigations=off {words}",
+                "-append", f"console=ttyS0 no_timer_check panic=-1 loglevel=5 mitigations=off {words}",
                 *slots,
                 "-device", "qemu-xhci,id=usb,p2=8,p3=8",
                 "-drive", f"file={disk},format=raw,if=none,id=disk,cache=unsafe", "-device", f"{disk_device},drive=disk",
