@@ -71,6 +71,10 @@ void GatePolicy::close(const BusView& view, BootTime now) {
         return;
     }
     state_.phase = Phase::closed;
+    // What was put back while the gate was opening has to be written once more.
+    if (state_.parameter && state_.parameter->written != view.parameter) {
+        state_.parameter.reset();
+    }
     for (const UsbDevice& device : view.devices) {
         if (entryOf(device.attachment) == state_.devices.end()) {
             state_.devices.push_back(

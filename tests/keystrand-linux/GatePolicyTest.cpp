@@ -612,7 +612,9 @@ TEST_F(GatePolicyTest, ClosedAgainWhileItOpens) {
     gate->settle();
     gate->policy.open();
     gate->step();
+    ASSERT_EQ(bus.parameter(), kAsTheControllerHasIt);
     gate->close();
+    EXPECT_EQ(bus.parameter(), kHardWiredOnly);
     EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
     EXPECT_FALSE(bus.isAuthorized("1-1"));
     gate->open();
