@@ -19,11 +19,25 @@ bool letsIn(AuthorizedDefault value, const UsbDevice& device) {
     return value == kEverybody || (value == kHardWiredOnly && device.hardWired);
 }
 
+template <typename Each>
+bool isAmong(const std::vector<Each>& all, const Each& one) {
+    return std::find(all.begin(), all.end(), one) != all.end();
+}
+
 const RootHub* rootHubOf(const BusView& view, const UsbDevice& device) {
     const std::uint32_t bus = busOf(device.port());
     const auto found = std::find_if(view.rootHubs.begin(), view.rootHubs.end(),
                                     [&](const RootHub& hub) { return hub.bus == bus; });
     return found == view.rootHubs.end() ? nullptr : &*found;
+}
+
+/// For a root hub that came closed because of the parameter: what it would have been otherwise.
+std::optional<AuthorizedDefault> valueWithout(const std::optional<WrittenDefault>& parameter,
+                                              const RootHub& hub) {
+    if (!parameter || !parameter->isStillThere(hub.authorizedDefault)) {
+        return std::nullopt;
+    }
+    return parameter->before == kAsTheControllerHasIt ? kEverybody : parameter->before;
 }
 
 GateAction forParameter(AuthorizedDefault value) {
@@ -70,7 +84,16 @@ void GatePolicy::close(const BusView& view, BootTime now) {
     if (closed()) {
         return;
     }
+    // One that is closed already was closed by somebody else, unless it came while the gate opened.
+    const std::optional<WrittenDefault> parameter = late_ ? late_->parameter : state_.parameter;
+    for (const RootHub& hub : view.rootHubs) {
+        if (hubAt(hub.inode) == nullptr) {
+            remember(hub, valueOfLate(hub, parameter).value_or(hub.authorizedDefault));
+        }
+    }
     state_.phase = Phase::closed;
+    putBack_.clear();
+    late_.reset();
     // What was put back while the gate was opening has to be written once more.
     if (state_.parameter && state_.parameter->written != view.parameter) {
         state_.parameter.reset();
@@ -120,11 +143,11 @@ std::vector<GateAction> GatePolicy::decide(const BusView& view, BootTime now) {
     forgetWhatWent(view);
     switch (state_.phase) {
     case Phase::open:
-        return {};
+        return decideOpen(view, now);
     case Phase::closed:
         return decideClosed(view, now);
     case Phase::opening:
-        return decideOpening(view);
+        return decideOpening(view, now);
     }
     return {};
 }
@@ -168,24 +191,24 @@ GatePolicy::Actions GatePolicy::closeDefaults(const BusView& view) {
         actions.push_back(forParameter(state_.parameter->written));
     }
     for (const RootHub& hub : view.rootHubs) {
-        WrittenHub* known = hubAt(hub.inode);
-        if (known == nullptr) {
-            state_.hubs.push_back(
-                {.bus = hub.bus,
-                 .inode = hub.inode,
-                 .value = {.before = hub.authorizedDefault, .written = closing_}});
-            known = &state_.hubs.back();
-            if (isAsStrict(hub.authorizedDefault, closing_)) {
-                known->value.written = hub.authorizedDefault;
-                known->value.confirmed = true;
-            }
-            known->value.before = valueWithoutTheParameter(hub).value_or(hub.authorizedDefault);
+        if (hubAt(hub.inode) == nullptr) {
+            remember(hub, valueWithout(state_.parameter, hub).value_or(hub.authorizedDefault));
         }
+        const WrittenHub* const known = hubAt(hub.inode);
         if (!known->value.confirmed) {
             actions.push_back(forHub(hub, known->value.written));
         }
     }
     return actions;
+}
+
+void GatePolicy::remember(const RootHub& hub, AuthorizedDefault before) {
+    const bool isClosed = isAsStrict(hub.authorizedDefault, closing_);
+    state_.hubs.push_back({.bus = hub.bus,
+                           .inode = hub.inode,
+                           .value = {.before = before,
+                                     .written = isClosed ? hub.authorizedDefault : closing_,
+                                     .confirmed = isClosed}});
 }
 
 std::optional<GateAction> GatePolicy::decideKnown(KnownDevice& known, const UsbDevice& device,
@@ -273,7 +296,7 @@ std::optional<GateAction> GatePolicy::refuse(KnownDevice& known, const UsbDevice
     return forDevice(Kind::refuse, device, Standing::refused);
 }
 
-GatePolicy::Actions GatePolicy::decideOpening(const BusView& view) {
+GatePolicy::Actions GatePolicy::decideOpening(const BusView& view, BootTime now) {
     takeInWhatCameLast(view);
     Actions actions = putDefaultsBack(view);
     if (!actions.empty()) {
@@ -287,9 +310,54 @@ GatePolicy::Actions GatePolicy::decideOpening(const BusView& view) {
         }
     }
     if (actions.empty()) {
+        late_ =
+            Late{.until = now + kLateTime, .parameter = state_.parameter, .hubs = {}, .seen = {}};
+        for (const RootHub& hub : view.rootHubs) {
+            late_->hubs.push_back(hub.inode);
+        }
+        for (const UsbDevice& device : view.devices) {
+            late_->seen.push_back(device.attachment);
+        }
         state_ = {};
     }
     return actions;
+}
+
+GatePolicy::Actions GatePolicy::decideOpen(const BusView& view, BootTime now) {
+    Actions actions;
+    if (late_ && now >= late_->until) {
+        late_.reset();
+        putBack_.clear();
+    }
+    if (!late_) {
+        return actions;
+    }
+    for (const RootHub& hub : view.rootHubs) {
+        if (const auto before = valueOfLate(hub, late_->parameter)) {
+            actions.push_back(forHub(hub, *before));
+        }
+    }
+    for (const UsbDevice& device : view.devices) {
+        const RootHub* const root = rootHubOf(view, device);
+        // One that is seen let in, and refused later, is somebody else's.
+        if (isAmong(late_->seen, device.attachment) || root == nullptr || !isPutBack(*root)) {
+            continue;
+        }
+        late_->seen.push_back(device.attachment);
+        if (!device.authorized && rules_.onUnlock == OnUnlock::accept &&
+            letsIn(root->authorizedDefault, device)) {
+            actions.push_back(forDevice(Kind::accept, device, Standing::attached));
+        }
+    }
+    return actions;
+}
+
+/// For a root hub that came while the gate opened, and had read the parameter before that.
+std::optional<AuthorizedDefault>
+GatePolicy::valueOfLate(const RootHub& hub, const std::optional<WrittenDefault>& parameter) const {
+    return isPutBack(hub) || (late_ && isAmong(late_->hubs, hub.inode))
+               ? std::nullopt
+               : valueWithout(parameter, hub);
 }
 
 /// What the kernel has refused on this service's behalf since the last look.
@@ -297,7 +365,7 @@ void GatePolicy::takeInWhatCameLast(const BusView& view) {
     for (const UsbDevice& device : view.devices) {
         const RootHub* const root = rootHubOf(view, device);
         if (!device.authorized && root != nullptr && find(device.attachment) == nullptr &&
-            valueBefore(*root)) {
+            (valueBefore(*root) || isPutBack(*root))) {
             state_.devices.push_back(
                 {.attachment = device.attachment, .standing = Standing::refused});
         }
@@ -327,16 +395,7 @@ std::optional<AuthorizedDefault> GatePolicy::valueBefore(const RootHub& hub) con
                        : std::nullopt;
         }
     }
-    return valueWithoutTheParameter(hub);
-}
-
-/// For a root hub that came closed because of the parameter: what it would have been otherwise.
-std::optional<AuthorizedDefault> GatePolicy::valueWithoutTheParameter(const RootHub& hub) const {
-    const auto& parameter = state_.parameter;
-    if (!parameter || !parameter->isStillThere(hub.authorizedDefault)) {
-        return std::nullopt;
-    }
-    return parameter->before == kAsTheControllerHasIt ? kEverybody : parameter->before;
+    return valueWithout(state_.parameter, hub);
 }
 
 GatePolicy::Actions GatePolicy::letIn(const BusView& view, bool hubs) {
@@ -368,7 +427,7 @@ void GatePolicy::carriedOut(const GateAction& action, const GateOutcome& outcome
         }
         return;
     case Kind::setRootHub:
-        if (state_.phase == Phase::opening) {
+        if (!closed()) {
             hubPutBack(action, outcome);
         } else if (WrittenHub* const known = hubAt(action.hub.inode)) {
             defaultWritten(known->value, outcome);
@@ -397,13 +456,18 @@ void GatePolicy::defaultWritten(WrittenDefault& value, const GateOutcome& outcom
 void GatePolicy::hubPutBack(const GateAction& action, const GateOutcome& outcome) {
     std::erase_if(state_.hubs,
                   [&](const WrittenHub& known) { return known.inode == action.hub.inode; });
-    if (outcome.kind == GateOutcome::Kind::failed) {
+    putBack_.push_back(action.hub.inode);
+    if (outcome.kind == GateOutcome::Kind::failed && state_.phase == Phase::opening) {
         // Not tried again: it would fail for ever.
         const WrittenDefault left{.before = action.hub.authorizedDefault,
                                   .written = action.hub.authorizedDefault,
                                   .confirmed = true};
         state_.hubs.push_back({.bus = action.hub.bus, .inode = action.hub.inode, .value = left});
     }
+}
+
+bool GatePolicy::isPutBack(const RootHub& hub) const {
+    return isAmong(putBack_, hub.inode);
 }
 
 void GatePolicy::deviceWritten(const GateAction& action, const GateOutcome& outcome, BootTime now) {
@@ -439,7 +503,7 @@ void GatePolicy::deviceWritten(const GateAction& action, const GateOutcome& outc
 std::optional<BootTime> GatePolicy::nextLook() const {
     std::optional<BootTime> next;
     if (!closed()) {
-        return next;
+        return late_ ? std::optional(late_->until) : next;
     }
     for (const KnownDevice& known : state_.devices) {
         std::optional<BootTime> at;

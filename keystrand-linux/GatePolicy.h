@@ -140,6 +140,8 @@ class GatePolicy {
     static constexpr BootTime kProbeTime = std::chrono::seconds(5);
     /// Until a device that could not be refused is refused again.
     static constexpr BootTime kRetryTime = std::chrono::seconds(10);
+    /// How long after opening there may still appear what the kernel has refused before.
+    static constexpr BootTime kLateTime = std::chrono::seconds(10);
 
     explicit GatePolicy(GateRules rules);
 
@@ -166,6 +168,8 @@ class GatePolicy {
 
     /// When to look again though nothing came.
     [[nodiscard]] std::optional<BootTime> nextLook() const;
+    /// The gate is open, and what comes has to be looked at for a while all the same.
+    [[nodiscard]] bool awaitsLate() const { return late_.has_value(); }
 
     [[nodiscard]] const GateState& state() const { return state_; }
     [[nodiscard]] bool closed() const { return state_.phase == GateState::Phase::closed; }
@@ -178,13 +182,15 @@ class GatePolicy {
 
     void forgetWhatWent(const BusView& view);
     [[nodiscard]] Actions decideClosed(const BusView& view, BootTime now);
-    [[nodiscard]] Actions decideOpening(const BusView& view);
+    [[nodiscard]] Actions decideOpening(const BusView& view, BootTime now);
+    [[nodiscard]] Actions decideOpen(const BusView& view, BootTime now);
     [[nodiscard]] Actions closeDefaults(const BusView& view);
+    void remember(const RootHub& hub, AuthorizedDefault before);
     [[nodiscard]] Actions putDefaultsBack(const BusView& view) const;
     void takeInWhatCameLast(const BusView& view);
     [[nodiscard]] std::optional<AuthorizedDefault> valueBefore(const RootHub& hub) const;
     [[nodiscard]] std::optional<AuthorizedDefault>
-    valueWithoutTheParameter(const RootHub& hub) const;
+    valueOfLate(const RootHub& hub, const std::optional<WrittenDefault>& parameter) const;
     [[nodiscard]] Actions letIn(const BusView& view, bool hubs);
 
     [[nodiscard]] std::optional<GateAction> decideKnown(KnownDevice& known, const UsbDevice& device,
@@ -206,12 +212,27 @@ class GatePolicy {
 
     void defaultWritten(WrittenDefault& value, const GateOutcome& outcome);
     void hubPutBack(const GateAction& action, const GateOutcome& outcome);
+    [[nodiscard]] bool isPutBack(const RootHub& hub) const;
     void deviceWritten(const GateAction& action, const GateOutcome& outcome, BootTime now);
     [[nodiscard]] Entry entryOf(const Attachment& attachment);
     [[nodiscard]] WrittenHub* hubAt(std::uint64_t inode);
 
+    /// The kernel decides some time before a device, or a root hub, is seen.
+    struct Late {
+        BootTime until{0};
+        /// What root hubs would read that came closed because of the parameter.
+        std::optional<WrittenDefault> parameter;
+        /// Inodes of the root hubs that were there when the gate opened.
+        std::vector<std::uint64_t> hubs;
+        /// What was there then, or was looked at since.
+        std::vector<Attachment> seen;
+    };
+
     GateRules rules_;
     GateState state_;
+    /// Inodes of the root hubs that were opened again since the gate was closed.
+    std::vector<std::uint64_t> putBack_;
+    std::optional<Late> late_;
     /// What closes: a kernel that does not know the value for hard-wired ports gets the other one.
     AuthorizedDefault closing_;
 };

@@ -190,8 +190,9 @@ std::optional<std::string> UsbGate::accept(const Attachment& attachment) {
 void UsbGate::look() {
     if (wantsClosed_ && !policy_.closed()) {
         setClosed(true);
-    } else if (policy_.state().phase != GateState::Phase::open) {
+    } else if (!isOpen() || policy_.awaitsLate()) {
         settle();
+        watchAsNeeded();
     } else if (locked_) {
         if (const auto view = lookAtBus()) {
             saveDevices(*view);
@@ -355,7 +356,7 @@ void UsbGate::saveDevices(const BusView& view) {
 
 void UsbGate::watchAsNeeded() {
     // Nothing wakes the service while the gate is open and nobody will ask what was attached.
-    const bool wanted = locked_ || wantsClosed_ || policy_.state().phase != GateState::Phase::open;
+    const bool wanted = locked_ || wantsClosed_ || !isOpen() || policy_.awaitsLate();
     if (wanted == watching_) {
         return;
     }

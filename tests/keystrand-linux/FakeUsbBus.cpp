@@ -78,6 +78,16 @@ void FakeUsbBus::plug(const std::string& port, const Plug& what) {
     tell();
 }
 
+void FakeUsbBus::plugUnseen(const std::string& port, const Plug& what) {
+    plugs_[port] = what;
+    unseen_[port] = letsIn(port);
+}
+
+void FakeUsbBus::show(const std::string& port) {
+    appear(port);
+    tell();
+}
+
 void FakeUsbBus::unplug(const std::string& port) {
     for (const auto& [at, what] : std::map(plugs_)) {
         if (at == port || isBehind(at, port)) {
@@ -191,8 +201,9 @@ void FakeUsbBus::happen() {
 }
 
 void FakeUsbBus::tell() {
-    if (changed_) {
-        changed_();
+    // Whoever is told may end it.
+    if (const Changed changed = changed_) {
+        changed();
     }
 }
 
@@ -204,9 +215,8 @@ void FakeUsbBus::appear(const std::string& port) {
     constexpr std::uint32_t kNumbers = 127;
     std::uint32_t& number = lastNumber_[bus];
     number = number % kNumbers + 1;
-    const AuthorizedDefault decides = rootHubs_.at(bus).authorizedDefault;
-    const bool authorized =
-        decides == kEverybody || (decides == kHardWiredOnly && plugs_.at(port).hardWired);
+    const auto decided = unseen_.extract(port);
+    const bool authorized = decided ? decided.mapped() : letsIn(port);
     seen_[port] = {.attachment = {.port = port, .number = number, .inode = ++lastInode_},
                    .authorized = authorized};
     if (authorized) {
@@ -225,6 +235,11 @@ void FakeUsbBus::becomeAuthorized(const std::string& port) {
 
 void FakeUsbBus::disappear(const std::string& port) {
     std::erase_if(seen_, [&](const auto& entry) { return isBehind(entry.first, port); });
+}
+
+bool FakeUsbBus::letsIn(const std::string& port) const {
+    const AuthorizedDefault decides = rootHubs_.at(busOf(port)).authorizedDefault;
+    return decides == kEverybody || (decides == kHardWiredOnly && plugs_.at(port).hardWired);
 }
 
 bool FakeUsbBus::hubAboveIsIn(const std::string& port) const {

@@ -41,6 +41,9 @@ class FakeUsbBus : public UsbBus {
 
     /// A device is plugged in. What is behind a refused hub is seen when the hub is let in.
     void plug(const std::string& port, const Plug& what);
+    /// The same in two: the kernel decides about it, and later it is seen.
+    void plugUnseen(const std::string& port, const Plug& what);
+    void show(const std::string& port);
     void unplug(const std::string& port);
     /// The same device once more, at the same port.
     void replug(const std::string& port);
@@ -95,6 +98,7 @@ class FakeUsbBus : public UsbBus {
     void appear(const std::string& port);
     void disappear(const std::string& port);
     void becomeAuthorized(const std::string& port);
+    [[nodiscard]] bool letsIn(const std::string& port) const;
     [[nodiscard]] bool hubAboveIsIn(const std::string& port) const;
     [[nodiscard]] bool isUsed(const std::string& port) const;
     [[nodiscard]] GateOutcome write(const UsbDevice& device, bool authorized);
@@ -104,6 +108,8 @@ class FakeUsbBus : public UsbBus {
     std::map<std::uint32_t, RootHub> rootHubs_;
     std::map<std::string, Plug> plugs_;
     std::map<std::string, Seen> seen_;
+    /// What was decided about devices that are not seen yet.
+    std::map<std::string, bool> unseen_;
     std::set<std::string> used_;
     std::map<std::uint32_t, std::uint32_t> lastNumber_;
     std::uint64_t lastInode_ = 0;

@@ -272,6 +272,22 @@ TEST_F(GatePolicyTest, HubsThatOthersClosedStayAsTheyAre) {
     EXPECT_TRUE(bus.isAuthorized("2-1"));
 }
 
+TEST_F(GatePolicyTest, HubsThatOthersClosedInTheSameWayStayAsTheyAre) {
+    for (const bool internal : {true, false}) {
+        with({.internal = internal});
+        const AuthorizedDefault closed = internal ? kHardWiredOnly : kNobody;
+        bus.setRootHubDefault(1, closed);
+        gate->close();
+        bus.plug("1-1", aDisk());
+        gate->settle();
+        gate->open();
+        EXPECT_EQ(bus.rootHubDefault(1), closed);
+        EXPECT_EQ(bus.rootHubDefault(2), kEverybody);
+        EXPECT_FALSE(bus.isAuthorized("1-1"));
+        bus.unplug("1-1");
+    }
+}
+
 TEST_F(GatePolicyTest, WhatSomebodyElseWroteMeanwhileStays) {
     gate->close();
     bus.setRootHubDefault(1, kNobody);
@@ -621,6 +637,115 @@ TEST_F(GatePolicyTest, ClosedAgainWhileItOpens) {
     EXPECT_TRUE(bus.isAuthorized("1-1"));
     EXPECT_EQ(bus.rootHubDefault(1), kEverybody);
     EXPECT_EQ(bus.parameter(), kAsTheControllerHasIt);
+}
+
+TEST_F(GatePolicyTest, RefusedBeforeItOpensAndSeenAfterwards) {
+    gate->close();
+    bus.plugUnseen("1-1", aDisk());
+    bus.plugUnseen("1-2", aHub());
+    gate->open();
+    EXPECT_EQ(gate->policy.state(), GateState());
+    bus.show("1-1");
+    ASSERT_FALSE(bus.isAuthorized("1-1"));
+    gate->pass(GatePolicy::kLateTime - 1us);
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+    bus.show("1-2");
+    gate->pass(1us);
+    EXPECT_FALSE(bus.isAuthorized("1-2"));
+    EXPECT_EQ(gate->policy.nextLook(), std::nullopt);
+}
+
+TEST_F(GatePolicyTest, SeenWhileItOpens) {
+    gate->close();
+    bus.plugUnseen("1-1", aDisk());
+    gate->policy.open();
+    ASSERT_TRUE(gate->step());
+    ASSERT_EQ(bus.rootHubDefault(1), kEverybody);
+    bus.show("1-1");
+    gate->settle();
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+}
+
+TEST_F(GatePolicyTest, WhatSomebodyElseRefusesAfterItOpenedStaysOut) {
+    bus.setRootHubDefault(2, kNobody);
+    gate->close();
+    bus.plugUnseen("1-3", aDisk());
+    gate->open();
+    EXPECT_EQ(gate->policy.nextLook(), gate->now() + GatePolicy::kLateTime);
+    bus.plug("1-1", aDisk());
+    gate->settle();
+    bus.setAuthorized("1-1", false);
+    bus.plug("2-1", aDisk());
+    // Closed by somebody else in between.
+    bus.setRootHubDefault(1, kHardWiredOnly);
+    bus.show("1-3");
+    gate->settle();
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+    EXPECT_FALSE(bus.isAuthorized("2-1"));
+    EXPECT_FALSE(bus.isAuthorized("1-3"));
+    EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
+}
+
+TEST_F(GatePolicyTest, RefusedLateStayOutWhenTheyAreToBePluggedAgain) {
+    with({.onUnlock = OnUnlock::replug});
+    gate->close();
+    bus.plugUnseen("1-1", aDisk());
+    gate->open();
+    bus.show("1-1");
+    gate->settle();
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+}
+
+TEST_F(GatePolicyTest, RootHubThatCameClosedIsOpenedWithWhatIsBehindIt) {
+    bus.setRootHubDefault(2, kHardWiredOnly);
+    gate->close();
+    gate->open();
+    // It has read the parameter before that was put back.
+    bus.setParameterDefault(kHardWiredOnly);
+    bus.addRootHub(3);
+    bus.plug("3-1", aDisk());
+    bus.setParameterDefault(kAsTheControllerHasIt);
+    gate->settle();
+    EXPECT_EQ(bus.rootHubDefault(3), kEverybody);
+    EXPECT_TRUE(bus.isAuthorized("3-1"));
+    // This one was closed before.
+    EXPECT_EQ(bus.rootHubDefault(2), kHardWiredOnly);
+}
+
+TEST_F(GatePolicyTest, RootHubThatCameClosedIsOpenedAlsoAfterTheGateWasClosedOnceMore) {
+    gate->close();
+    gate->open();
+    bus.setParameterDefault(kHardWiredOnly);
+    bus.addRootHub(3);
+    bus.setParameterDefault(kAsTheControllerHasIt);
+    bus.setRootHubDefault(1, kHardWiredOnly);
+    gate->close();
+    gate->open();
+    EXPECT_EQ(bus.rootHubDefault(3), kEverybody);
+    // Somebody else has closed this one in between.
+    EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
+}
+
+TEST_F(GatePolicyTest, RootHubThatCannotBeOpenedIsTriedOnce) {
+    gate->close();
+    gate->open();
+    bus.setParameterDefault(kHardWiredOnly);
+    bus.addRootHub(3);
+    bus.failDefaults();
+    bus.forgetWrites();
+    gate->settle();
+    EXPECT_EQ(bus.writes(), Writes{"usb3=1"});
+}
+
+TEST_F(GatePolicyTest, ClosedAgainWhatIsSeenLateStaysOut) {
+    gate->close();
+    bus.plugUnseen("1-1", aDisk());
+    gate->open();
+    gate->close();
+    bus.show("1-1");
+    gate->pass(1s);
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+    EXPECT_EQ(gate->standingAt("1-1"), Standing::refused);
 }
 
 } // namespace

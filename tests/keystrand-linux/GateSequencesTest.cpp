@@ -93,10 +93,14 @@ class Sequence {
         }
     }
 
-    void plug(const std::string& port) {
+    bool isFree(const std::string& port) {
         const std::size_t point = port.rfind('.');
-        if (bus_.isPlugged(port) || !hasRoot(port) ||
-            (point != std::string::npos && !hubs_.contains(port.substr(0, point)))) {
+        return !bus_.isPlugged(port) && hasRoot(port) &&
+               (point == std::string::npos || hubs_.contains(port.substr(0, point)));
+    }
+
+    void plug(const std::string& port) {
+        if (!isFree(port)) {
             return;
         }
         Plug what;
@@ -150,7 +154,17 @@ class Sequence {
         tell("open");
         closed_ = false;
         letIn_.clear();
+        // What the kernel refuses before and shows afterwards.
+        const std::string late = port();
+        const bool isLate = chance(3) && late.find('.') == std::string::npos && isFree(late);
+        if (isLate) {
+            tell("late " + late);
+            bus_.plugUnseen(late, aDisk());
+        }
         gate_->open();
+        if (isLate) {
+            bus_.show(late);
+        }
         checkOpen();
     }
 

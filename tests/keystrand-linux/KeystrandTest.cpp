@@ -482,6 +482,8 @@ TEST_F(KeystrandTest, ListenerIsAwayAndTheLastStateHolds) {
 TEST_F(KeystrandTest, UnlockedMachineIsLeftAlone) {
     begin();
     acknowledge();
+    clocks.pass(10s);
+    keystrand->wake();
     EXPECT_FALSE(bus.isWatched());
     // Nothing but the figures' period, a day later.
     EXPECT_GE(keystrand->nextWake() - clocks.boot, 86000s);

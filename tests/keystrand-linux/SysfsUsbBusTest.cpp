@@ -457,13 +457,14 @@ TEST_F(KernelEventsTest, LostEventsLeadToALook) {
 
 /// The gate before this bus, as it stands in a machine.
 TEST_F(SysfsUsbBusTest, GateRefusesWhatComesAndLetsItInAgain) {
+    BootTime now(1);
     const StateFile record(directory.file("gate"), StateFile::Durability::none);
     const StateFile devices(directory.file("devices"), StateFile::Durability::none);
     UsbGate gate({.bus = bus,
                   .record = record,
                   .devices = devices,
                   .log = log,
-                  .now = [] { return BootTime(1); },
+                  .now = [&] { return now; },
                   .rearm =
                       [] {
                       }},
@@ -483,6 +484,9 @@ TEST_F(SysfsUsbBusTest, GateRefusesWhatComesAndLetsItInAgain) {
     EXPECT_TRUE(machine.isAuthorized("1-2"));
     EXPECT_EQ(machine.rootHubDefault(1), kEverybody);
     EXPECT_EQ(machine.parameter(), kAsTheControllerHasIt);
+    now += GatePolicy::kLateTime;
+    machine.plug("1-3", aMouse());
+    turnAll(*loop);
     EXPECT_FALSE(sysfs.isHeard());
     EXPECT_EQ(log.lines,
               (Lines{"keystrand: the gate is closed",

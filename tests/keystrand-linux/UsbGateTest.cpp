@@ -253,7 +253,26 @@ TEST_F(UsbGateTest, NothingIsWatchedWhileTheMachineIsUnlocked) {
     gate->setLocked(false);
     EXPECT_TRUE(bus.isWatched());
     gate->setClosed(false);
+    EXPECT_TRUE(bus.isWatched());
+    now = gate->nextLook().value();
+    gate->look();
     EXPECT_FALSE(bus.isWatched());
+}
+
+TEST_F(UsbGateTest, WhatWasRefusedBeforeItOpensAndIsSeenAfterwardsComesIn) {
+    gate->setClosed(true);
+    bus.plugUnseen("1-1", aDisk());
+    gate->setClosed(false);
+    log.take();
+    bus.show("1-1");
+    EXPECT_EQ(log.take(),
+              Lines{"keystrand: accepted 1-1 (1111:2222 \"maker\" \"disk\", classes 08/06/50): "
+                    "the gate is open again"});
+    // The kernel lets in what comes from here on; an event that nobody wanted ends the watch, too.
+    now += GatePolicy::kLateTime;
+    bus.plug("1-2", aDisk());
+    EXPECT_FALSE(bus.isWatched());
+    EXPECT_EQ(log.take(), Lines());
 }
 
 TEST_F(UsbGateTest, DevicesThatAreInAreKeptWhileLocked) {
