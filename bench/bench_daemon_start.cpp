@@ -32,8 +32,8 @@ class Started {
         times_.push_back(time.count());
         const bench::ProcessMemory memory = bench::memoryOf(program.pid());
         resident_.push_back(static_cast<double>(memory.resident));
-        peak_.push_back(static_cast<double>(memory.peak));
         proportional_.push_back(static_cast<double>(memory.proportional));
+        own_.push_back(static_cast<double>(memory.own));
         sharedLibraries_ = bench::sharedLibrariesOf(program.pid());
     }
 
@@ -47,15 +47,15 @@ class Started {
             return bench::median(sizes) / (1024 * 1024);
         };
         std::printf("%-20s %8.2f MiB %8.2f MiB %8.2f MiB %10zu\n", name, mebibytes(resident_),
-                    mebibytes(peak_), mebibytes(proportional_), sharedLibraries_);
+                    mebibytes(proportional_), mebibytes(own_), sharedLibraries_);
     }
 
   private:
     std::vector<std::string> arguments_;
     bench::Samples times_;
     bench::Samples resident_;
-    bench::Samples peak_;
     bench::Samples proportional_;
+    bench::Samples own_;
     std::size_t sharedLibraries_ = 0;
 };
 
@@ -65,7 +65,7 @@ void measure(const bench::Options& options, const std::filesystem::path& directo
     bench::StartedProgram kernel({KEYSTRAND_SIM, "--root", root, "--quiet"});
     kernel.awaitText("keystrand-sim: ready");
     Started minimal({MINIMAL_EVENT_LOOP, (directory / "minimal.sock").string()});
-    Started daemon({KSTD_DEV, "--root", root});
+    Started daemon({DAEMON, root});
 
     bench::printHead(base::concat("Start to the run loop against a minimal program, ",
                                   options.rounds, " rounds, ",
@@ -80,7 +80,7 @@ void measure(const bench::Options& options, const std::filesystem::path& directo
     }
     bench::printRow("start of the daemon",
                     bench::compare({{minimal.times(), daemon.times()}, 0}, 0, 1));
-    std::printf("\n%-20s %12s %12s %12s %10s\n", "", "resident", "peak", "proportional",
+    std::printf("\n%-20s %12s %12s %12s %10s\n", "", "resident", "proportional", "its own",
                 "libraries");
     minimal.printMemory("minimal program");
     daemon.printMemory("daemon");

@@ -50,8 +50,11 @@ bool isSharedLibrary(std::string_view path) {
 
 ProcessMemory memoryOf(pid_t process) {
     const std::string status = pathOf(process, "status");
+    const std::string sums = pathOf(process, "smaps_rollup");
     return {requiredSizeIn(status, "VmRSS:"), requiredSizeIn(status, "VmHWM:"),
-            sizeIn(pathOf(process, "smaps_rollup"), "Pss:").value_or(0)};
+            sizeIn(sums, "Pss:").value_or(0),
+            sizeIn(sums, "Private_Clean:").value_or(0) +
+                sizeIn(sums, "Private_Dirty:").value_or(0)};
 }
 
 std::size_t sharedLibrariesOf(pid_t process) {

@@ -13,6 +13,8 @@ struct ProcessMemory {
     /// Resident, shared pages counted in part, by how many share them; 0 when the system does not
     /// say.
     std::size_t proportional = 0;
+    /// The pages that no other process has, written or not; 0 when the system does not say.
+    std::size_t own = 0;
 };
 
 /// Throws when the system does not say.

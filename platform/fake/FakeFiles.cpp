@@ -1,6 +1,7 @@
 #include "platform/fake/FakeFiles.h"
 
 #include "base/Concat.h"
+#include "base/FileNames.h"
 #include "platform/fake/FakeFormats.h"
 
 #include <algorithm>
@@ -8,15 +9,6 @@
 #include <utility>
 
 namespace platform {
-
-namespace {
-
-std::string_view directoryOf(std::string_view path) {
-    const std::size_t slash = path.rfind('/');
-    return slash == 0 || slash == std::string_view::npos ? "/" : path.substr(0, slash);
-}
-
-} // namespace
 
 void FakeFile::write(std::size_t offset, const std::uint8_t* data, std::size_t size) {
     bytes.resize(std::max(bytes.size(), offset + size));
@@ -33,7 +25,7 @@ std::shared_ptr<FakeFile> FakeDisk::find(std::string_view path) const {
 }
 
 std::shared_ptr<FakeFile> FakeDisk::make(std::string_view path, unsigned mode) {
-    if (!isDirectory(directoryOf(path)) || isDirectory(path)) {
+    if (!isDirectory(base::directoryOf(path)) || isDirectory(path)) {
         return nullptr;
     }
     auto file = std::make_shared<FakeFile>();

@@ -88,7 +88,8 @@ inline constexpr std::size_t kMaxXMLPropertyListContainers = 10'000;
 ///
 /// False for what libplist does not take for a property list, a text or key that is not UTF-8, and
 /// anything beyond the limits above or deeper than kMaxPropertyListDepth. The sink has then taken
-/// some part of it.
+/// some part of it. Also false for everything when libplist, which the first call loads, is not
+/// there.
 ///
 /// libplist 2.2 is no judge of single values: an integer, real or date that is malformed becomes
 /// some number or date (12abc is 12, abc is 0), an integer beyond 64 bits the nearest end or

@@ -3,11 +3,13 @@
 #include "platform/formats/UnicodeText.h"
 
 #include <algorithm>
+#include <dlfcn.h>
 #include <memory>
 #include <plist/plist.h>
 #include <stdlib.h>
 #include <string>
 #include <string_view>
+#include <type_traits>
 #include <utility>
 #include <vector>
 
@@ -15,18 +17,66 @@ namespace platform {
 
 namespace {
 
+/// The functions of libplist, which is loaded by the first file in XML: a machine without
+/// configuration files has none, and saves at each start of the daemon what mapping a library
+/// takes.
+class LibPlist {
+    /// Becomes a pointer to a function of any type.
+    struct Address {
+        void* address;
+
+        template <typename Function>
+        requires std::is_function_v<Function>
+        operator Function*() const { // NOLINT(google-explicit-constructor)
+            return reinterpret_cast<Function*>(address);
+        }
+    };
+
+    [[nodiscard]] Address function(const char* name) {
+        void* const address = library_ != nullptr ? ::dlsym(library_, name) : nullptr;
+        isComplete_ = isComplete_ && address != nullptr;
+        return {address};
+    }
+
+    void* const library_ = ::dlopen(KSTD_LIBPLIST, RTLD_NOW | RTLD_LOCAL);
+    bool isComplete_ = true;
+
+  public:
+    [[nodiscard]] bool isComplete() const { return isComplete_; }
+
+    decltype(::plist_from_xml)* from_xml = function("plist_from_xml");
+    decltype(::plist_to_bin)* to_bin = function("plist_to_bin");
+    decltype(::plist_free)* free = function("plist_free");
+    decltype(::plist_get_node_type)* get_node_type = function("plist_get_node_type");
+    decltype(::plist_compare_node_value)* compare_node_value = function("plist_compare_node_value");
+    decltype(::plist_get_bool_val)* get_bool_val = function("plist_get_bool_val");
+    decltype(::plist_get_uint_val)* get_uint_val = function("plist_get_uint_val");
+    decltype(::plist_get_real_val)* get_real_val = function("plist_get_real_val");
+    decltype(::plist_get_string_ptr)* get_string_ptr = function("plist_get_string_ptr");
+    decltype(::plist_get_data_ptr)* get_data_ptr = function("plist_get_data_ptr");
+    decltype(::plist_array_new_iter)* array_new_iter = function("plist_array_new_iter");
+    decltype(::plist_array_next_item)* array_next_item = function("plist_array_next_item");
+    decltype(::plist_dict_new_iter)* dict_new_iter = function("plist_dict_new_iter");
+    decltype(::plist_dict_next_item)* dict_next_item = function("plist_dict_next_item");
+};
+
+const LibPlist& libplist() {
+    static const LibPlist functions;
+    return functions;
+}
+
 struct Release {
     void operator()(void* memory) const { ::free(memory); }
 };
 
 struct ReleaseNode {
-    void operator()(void* node) const { plist_free(node); }
+    void operator()(void* node) const { libplist().free(node); }
 };
 using Node = std::unique_ptr<void, ReleaseNode>;
 
 Node parse(std::string_view xml) {
     plist_t node = nullptr;
-    plist_from_xml(xml.data(), static_cast<std::uint32_t>(xml.size()), &node);
+    libplist().from_xml(xml.data(), static_cast<std::uint32_t>(xml.size()), &node);
     return Node(node);
 }
 
@@ -52,7 +102,7 @@ class Walk {
     explicit Walk(ValueSink& sink) : sink_(sink) {}
 
     [[nodiscard]] bool read(plist_t node) {
-        switch (plist_get_node_type(node)) {
+        switch (libplist().get_node_type(node)) {
         case PLIST_BOOLEAN:
             return readBoolean(node);
         case PLIST_UINT:
@@ -76,14 +126,14 @@ class Walk {
   private:
     bool readBoolean(plist_t node) {
         std::uint8_t value = 0;
-        plist_get_bool_val(node, &value);
+        libplist().get_bool_val(node, &value);
         sink_.boolean(value != 0);
         return true;
     }
 
     bool readInteger(plist_t node) {
         std::uint64_t bits = 0;
-        plist_get_uint_val(node, &bits);
+        libplist().get_uint_val(node, &bits);
         if (std::in_range<std::int64_t>(bits) || isNegative(node, bits)) {
             sink_.integer(static_cast<std::int64_t>(bits));
         } else {
@@ -97,19 +147,19 @@ class Walk {
     static bool isNegative(plist_t node, std::uint64_t bits) {
         const Node unsignedNode =
             parse(base::concat("<plist><integer>", bits, "</integer></plist>"));
-        return plist_compare_node_value(node, unsignedNode.get()) == 0;
+        return libplist().compare_node_value(node, unsignedNode.get()) == 0;
     }
 
     bool readReal(plist_t node) {
         double value = 0;
-        plist_get_real_val(node, &value);
+        libplist().get_real_val(node, &value);
         sink_.real(value);
         return true;
     }
 
     bool readText(plist_t node) {
         std::uint64_t length = 0;
-        const char* const characters = plist_get_string_ptr(node, &length);
+        const char* const characters = libplist().get_string_ptr(node, &length);
         const std::string_view text(characters, length);
         if (!isUTF8WithoutNUL(text)) {
             return false;
@@ -120,7 +170,7 @@ class Walk {
 
     bool readBytes(plist_t node) {
         std::uint64_t length = 0;
-        const char* const bytes = plist_get_data_ptr(node, &length);
+        const char* const bytes = libplist().get_data_ptr(node, &length);
         sink_.bytes({reinterpret_cast<const std::uint8_t*>(bytes), length});
         return true;
     }
@@ -129,7 +179,7 @@ class Walk {
     bool readDate(plist_t node) {
         char* binary = nullptr;
         std::uint32_t size = 0;
-        plist_to_bin(node, &binary, &size);
+        libplist().to_bin(node, &binary, &size);
         const std::unique_ptr<char, Release> owner(binary);
         return binary != nullptr &&
                readBinaryPropertyList({reinterpret_cast<const std::uint8_t*>(binary), size}, sink_);
@@ -140,23 +190,24 @@ class Walk {
             return false;
         }
         ++depth_;
-        const bool read = plist_get_node_type(node) == PLIST_ARRAY ? readList(node) : readMap(node);
+        const bool read =
+            libplist().get_node_type(node) == PLIST_ARRAY ? readList(node) : readMap(node);
         --depth_;
         return read;
     }
 
     bool readList(plist_t list) {
         plist_array_iter iterator = nullptr;
-        plist_array_new_iter(list, &iterator);
+        libplist().array_new_iter(list, &iterator);
         const std::unique_ptr<void, Release> owner(iterator);
         sink_.beginList();
         plist_t item = nullptr;
-        plist_array_next_item(list, iterator, &item);
+        libplist().array_next_item(list, iterator, &item);
         while (item != nullptr) {
             if (!read(item)) {
                 return false;
             }
-            plist_array_next_item(list, iterator, &item);
+            libplist().array_next_item(list, iterator, &item);
         }
         sink_.endList();
         return true;
@@ -179,13 +230,13 @@ class Walk {
 
     static std::vector<std::pair<std::string, plist_t>> sortedEntries(plist_t map) {
         plist_dict_iter iterator = nullptr;
-        plist_dict_new_iter(map, &iterator);
+        libplist().dict_new_iter(map, &iterator);
         const std::unique_ptr<void, Release> owner(iterator);
         std::vector<std::pair<std::string, plist_t>> entries;
         while (true) {
             char* key = nullptr;
             plist_t value = nullptr;
-            plist_dict_next_item(map, iterator, &key, &value);
+            libplist().dict_next_item(map, iterator, &key, &value);
             const std::unique_ptr<char, Release> keyOwner(key);
             if (key == nullptr || value == nullptr) {
                 break;
@@ -204,7 +255,7 @@ class Walk {
 
 bool readXMLPropertyList(std::span<const std::uint8_t> data, ValueSink& sink) {
     const std::string_view xml(reinterpret_cast<const char*>(data.data()), data.size());
-    if (!isWithinLimits(xml)) {
+    if (!isWithinLimits(xml) || !libplist().isComplete()) {
         return false;
     }
     const Node root = parse(xml);

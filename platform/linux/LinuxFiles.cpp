@@ -2,6 +2,7 @@
 
 #include "base/Concat.h"
 #include "base/FileDescriptor.h"
+#include "base/FileNames.h"
 #include "platform/MessageClasses.h"
 #include "platform/linux/RegularFile.h"
 
@@ -80,11 +81,6 @@ int syncDescriptor(int descriptor) {
     return result == 0 ? 0 : errno;
 }
 
-std::string directoryOf(const std::string& path) {
-    const std::size_t slash = path.rfind('/');
-    return slash == 0 ? "/" : path.substr(0, slash);
-}
-
 } // namespace
 
 LinuxFiles::LinuxFiles(Paths paths, SystemLog& log) : paths_(std::move(paths)), log_(log) {}
@@ -154,7 +150,7 @@ int LinuxFiles::syncNameOnce(const std::string& path) {
     if (syncedNames_.contains(path)) {
         return 0;
     }
-    const std::string directory = directoryOf(paths_.under(path));
+    const std::string directory = base::directoryOf(paths_.under(path));
     const base::FileDescriptor descriptor(
         ::open(directory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC | O_NOCTTY));
     if (!descriptor.isOpen()) {

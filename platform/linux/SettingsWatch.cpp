@@ -1,6 +1,7 @@
 #include "platform/linux/SettingsWatch.h"
 
 #include "base/Concat.h"
+#include "base/FileNames.h"
 #include "platform/MessageClasses.h"
 
 #include <array>
@@ -8,7 +9,6 @@
 #include <climits>
 #include <cstddef>
 #include <cstring>
-#include <filesystem>
 #include <optional>
 #include <sys/inotify.h>
 #include <sys/stat.h>
@@ -55,11 +55,11 @@ bool isWhole(const std::string& path) {
 SettingsWatch::SettingsWatch(const std::string& path, LinuxRunLoop& loop, SystemLog& log,
                              Changed changed)
     : log_(log), changed_(std::move(changed)), inotify_(::inotify_init1(IN_CLOEXEC | IN_NONBLOCK)) {
-    const std::filesystem::path directory = std::filesystem::path(path).parent_path();
-    start_ = directory.parent_path().string();
-    way_ = std::filesystem::path(path).lexically_relative(start_).string();
+    const std::string directory = base::directoryOf(path);
+    start_ = base::directoryOf(directory);
+    way_ = path.substr(start_.size());
     if (!inotify_.isOpen()) {
-        sayThatItCannotWatch(directory.string(), errno);
+        sayThatItCannotWatch(directory, errno);
         return;
     }
     watchTheWay();

@@ -11,20 +11,18 @@
 
 #include <array>
 #include <cstdint>
-#include <openssl/evp.h>
+#include <sha2.h>
 #include <sqlite3.h>
-#include <stdexcept>
 #include <utility>
 
 namespace kstd {
 
 std::string schemaHash(std::string_view schema) {
-    constexpr std::size_t kSHA256Size = 32;
-    std::array<std::uint8_t, kSHA256Size> digest{};
-    if (EVP_Digest(schema.data(), schema.size(), digest.data(), nullptr, EVP_sha256(), nullptr) !=
-        1) {
-        throw std::runtime_error("libcrypto offers no SHA-256");
-    }
+    SHA2_CTX context;
+    SHA256Init(&context);
+    SHA256Update(&context, reinterpret_cast<const std::uint8_t*>(schema.data()), schema.size());
+    std::array<std::uint8_t, SHA256_DIGEST_LENGTH> digest{};
+    SHA256Final(digest.data(), &context);
     return RXUppercaseHexStringWithoutSpaces(digest);
 }
 

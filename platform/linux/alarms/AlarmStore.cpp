@@ -2,6 +2,7 @@
 
 #include "base/Concat.h"
 #include "base/FileDescriptor.h"
+#include "base/FileNames.h"
 #include "platform/MessageClasses.h"
 #include "platform/linux/Paths.h"
 
@@ -10,7 +11,6 @@
 #include <charconv>
 #include <dirent.h>
 #include <fcntl.h>
-#include <filesystem>
 #include <sys/stat.h>
 #include <system_error>
 #include <unistd.h>
@@ -120,14 +120,10 @@ int syncDirectory(const std::string& path) {
     return errorUnless(directory.isOpen() && ::fsync(directory.get()) == 0);
 }
 
-std::string parentOf(const std::string& path) {
-    return std::filesystem::path(path).parent_path().string();
-}
-
 /// Whether it was there before does not matter; it is synced all the same, because a process that
 /// made it may have ended before it did so.
 int makeDirectory(const std::string& path) {
-    const std::string parent = parentOf(path);
+    const std::string parent = base::directoryOf(path);
     int error = errorUnless(::mkdir(path.c_str(), kDirectoryMode) == 0);
     if (error == ENOENT && parent != path) {
         error = makeDirectory(parent);
@@ -143,7 +139,7 @@ int overwrite(const std::string& path, std::string_view line) {
 }
 
 int make(const std::string& path, std::string_view line) {
-    const std::string directory = parentOf(path);
+    const std::string directory = base::directoryOf(path);
     if (const int error = makeDirectory(directory); error != 0) {
         return error;
     }
