@@ -75,6 +75,19 @@ class HTTPSessionDelegate : private base::NotCopied {
                                      const ChallengeCompletion& completion) = 0;
 };
 
+/// A body that is given piece by piece. Called on a thread of the session.
+class HTTPBody : private base::NotCopied {
+  public:
+    virtual ~HTTPBody() = default;
+
+    /// Of the whole body. Stays as it is.
+    [[nodiscard]] virtual std::uint64_t size() const = 0;
+
+    /// The next 1 to `most` bytes, which last until the next call. None when they cannot be had:
+    /// the request then ends with kTransferFailed. Not called once all bytes are given.
+    [[nodiscard]] virtual std::string_view next(std::size_t most) = 0;
+};
+
 struct HTTPRequest {
     /// "GET" or "POST".
     std::string method;
@@ -84,6 +97,12 @@ struct HTTPRequest {
     std::string_view body = {};
     /// Of a "GET": an answer with a longer body is a transport error.
     std::size_t maximumAnswerSize = 1024UL * 1024;
+    /// Takes the place of `body`, and must last as long.
+    HTTPBody* pieces = nullptr;
+
+    [[nodiscard]] std::uint64_t bodySize() const {
+        return pieces != nullptr ? pieces->size() : body.size();
+    }
 };
 
 struct HTTPResponse {

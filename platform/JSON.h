@@ -36,8 +36,12 @@ class JSONText : public ValueSink {
     [[nodiscard]] virtual Mark mark() const = 0;
     virtual void rewind(const Mark& mark) = 0;
 
-    /// The text, once every map and list is ended; the object is of no use after it. Fails when
-    /// nothing that JSON can express came in or a map or list is still open.
+    /// Moves what is there of the text behind what is in `taken`, so that a long text need never be
+    /// held whole. Between two values; places that were taken before are none any more.
+    virtual void moveTo(base::TextBuffer& taken) = 0;
+
+    /// The text, or what is left of it, once every map and list is ended; the object is of no use
+    /// after it. Fails when nothing that JSON can express came in or a map or list is still open.
     [[nodiscard]] virtual Result<base::TextBuffer> finish() = 0;
 };
 

@@ -114,13 +114,13 @@ class KSTDAnalyticsLogger : public platform::HTTPSessionDelegate,
     /// says why the document could not be made; it stays unchanged when the server is the reason.
     bool forceUploadWithError(std::optional<platform::Error>* error = nullptr);
 
-    /// All events and the summary as one JSON text, as an upload sends it when no options are
-    /// given.
+    /// All events and the summary as one JSON text: the bytes that an upload sends, when no options
+    /// are given.
     [[nodiscard]] platform::Result<base::TextBuffer>
     getLoggingJSON(const platform::JSONWritingOptions& options = {});
 
     /// Sends the text to where uploads go and waits for the answer. Called on the queue.
-    [[nodiscard]] bool onQueuePostJSON(std::string_view JSON);
+    [[nodiscard]] bool onQueuePostJSON(platform::HTTPBody& JSON);
 
     /// Where uploads go: the configured link, or what the server's bag says, which is fetched anew
     /// every time; or none. The bag's other settings are taken over. Called on the queue.
@@ -200,10 +200,11 @@ class KSTDAnalyticsLogger : public platform::HTTPSessionDelegate,
     void upload();
     void setNextUploadDate();
 
+    [[nodiscard]] std::optional<platform::Error> whyNoDocument();
     [[nodiscard]] platform::Result<base::TextBuffer>
     makeDocument(const platform::ValueMap& extraValues,
                  const platform::JSONWritingOptions& options);
-    [[nodiscard]] bool uploadDocument(std::string_view document);
+    [[nodiscard]] platform::Result<bool> uploadEvents(const platform::ValueMap& extraValues);
     [[nodiscard]] bool isAccepted(const platform::HTTPReply& reply, const platform::Link& link);
 
     [[nodiscard]] std::optional<platform::Link> fetchUploadURL();

@@ -3,6 +3,7 @@
 #include "kstd/Analytics/KSTDAnalyticsLogger.h"
 #include "kstd/Analytics/ServerDocuments.h"
 #include "kstd/Analytics/TQAnalyticsLoggerSQLiteStore.h"
+#include "kstd/Analytics/UploadDocument.h"
 #include "kstd/LogLines.h"
 #include "platform/Clock.h"
 #include "platform/HTTPSession.h"
@@ -50,10 +51,6 @@ constexpr char kUserAgent[] = "kstd/1.0";
 constexpr char kErrorDomain[] = "TQAnalyticsLogger";
 constexpr std::int64_t kDatabaseNotOpenable = -1;
 
-/// How much of a document goes into the log. The log shows a part of so long a line only, and a
-/// document may have hundreds of megabytes.
-constexpr std::size_t kLoggedDocumentSize = 8192;
-
 constexpr std::uint64_t kMillisecondsPerSecond = 1000;
 
 bool isTrusted(platform::TrustResult result) {
@@ -69,27 +66,37 @@ std::string_view classOf(const platform::Error& error, std::string_view otherwis
 } // namespace
 
 bool KSTDAnalyticsLogger::forceUploadWithError(std::optional<platform::Error>* error) {
-    const auto document = getLoggingJSON();
-    if (!document) {
-        if (error != nullptr) {
-            *error = document.error();
-        }
-        return false;
+    // Asked for on this thread, as making a document asks for them.
+    const platform::ValueMap extraValues = extraValuesToUploadToServer();
+    // One piece of work on the queue: what is stored while the document is under way comes after
+    // it, and is not deleted with what was sent.
+    std::optional<platform::Result<bool>> isUploaded;
+    fields.queue->sync([&] { isUploaded = uploadEvents(extraValues); });
+    if (!*isUploaded && error != nullptr) {
+        *error = isUploaded->error();
     }
-    // A second piece of work on the queue: making the document asks the subclass for its values,
-    // which it does on this thread.
-    bool isUploaded = false;
-    fields.queue->sync([&] { isUploaded = uploadDocument(document.value().view()); });
-    return isUploaded;
+    return *isUploaded && isUploaded->value();
 }
 
-bool KSTDAnalyticsLogger::uploadDocument(std::string_view document) {
-    if (!onQueuePostJSON(document)) {
+/// Whether the server has taken them; an error when there is no document to send.
+platform::Result<bool> KSTDAnalyticsLogger::uploadEvents(const platform::ValueMap& extraValues) {
+    if (auto error = whyNoDocument()) {
+        return *std::move(error);
+    }
+    const double postTime = platform::millisecondsSince1970(host_.clock.now());
+    std::optional<UploadDocument> document(
+        std::in_place, host_.json, host_.propertyLists, *fields.database,
+        uploadSummary(extraValues, fields.splunkTopicName, host_.version, postTime), postTime);
+    if (auto error = document->measure()) {
+        return *std::move(error);
+    }
+    if (!onQueuePostJSON(*document)) {
         return false;
     }
-    host_.log.write(
-        LogLevel::debug,
-        base::concat("uploading oracle statistics: ", document.substr(0, kLoggedDocumentSize)), {});
+    host_.log.write(LogLevel::debug,
+                    base::concat("uploading oracle statistics: ", document->beginning()), {});
+    // As long as it is there nothing can be written.
+    document.reset();
     fields.database->clearAllData();
     setNextUploadDate();
     return true;
@@ -106,12 +113,8 @@ KSTDAnalyticsLogger::getLoggingJSON(const platform::JSONWritingOptions& options)
 platform::Result<base::TextBuffer>
 KSTDAnalyticsLogger::makeDocument(const platform::ValueMap& extraValues,
                                   const platform::JSONWritingOptions& options) {
-    if (!fields.database->tryToOpenDatabase()) {
-        host_.log.write(LogLevel::error, "can't get logging JSON because database is not openable",
-                        {.messageId = platform::message::kDatabaseNotOpened});
-        return platform::Error{kErrorDomain, kDatabaseNotOpenable,
-                               "could not open db to read and process metrics (device in class "
-                               "D?)"};
+    if (auto error = whyNoDocument()) {
+        return *std::move(error);
     }
     const double postTime = platform::millisecondsSince1970(host_.clock.now());
     return makeUploadDocument(
@@ -121,7 +124,17 @@ KSTDAnalyticsLogger::makeDocument(const platform::ValueMap& extraValues,
         options);
 }
 
-bool KSTDAnalyticsLogger::onQueuePostJSON(std::string_view JSON) {
+std::optional<platform::Error> KSTDAnalyticsLogger::whyNoDocument() {
+    if (fields.database->tryToOpenDatabase()) {
+        return std::nullopt;
+    }
+    host_.log.write(LogLevel::error, "can't get logging JSON because database is not openable",
+                    {.messageId = platform::message::kDatabaseNotOpened});
+    return platform::Error{kErrorDomain, kDatabaseNotOpenable,
+                           "could not open db to read and process metrics (device in class D?)"};
+}
+
+bool KSTDAnalyticsLogger::onQueuePostJSON(platform::HTTPBody& JSON) {
     auto link = splunkUploadURL();
     // Also after a bag that has switched uploads off. What it says of events counts from the next
     // one on; what is collected goes to the bag's own address.
@@ -136,7 +149,7 @@ bool KSTDAnalyticsLogger::onQueuePostJSON(std::string_view JSON) {
         return false;
     }
     host_.log.write(LogLevel::info, "Splunk upload start", {});
-    return isAccepted(replyTo({.method = "POST", .link = link, .body = JSON}), *link);
+    return isAccepted(replyTo({.method = "POST", .link = link, .pieces = &JSON}), *link);
 }
 
 bool KSTDAnalyticsLogger::isAccepted(const platform::HTTPReply& reply, const platform::Link& link) {

@@ -71,26 +71,38 @@ platform::ValueMap uploadSummary(platform::ValueMap extraValues,
     return summary;
 }
 
+UploadText::UploadText(platform::JSON& json, platform::PropertyLists& propertyLists,
+                       const platform::JSONWritingOptions& options)
+    : propertyLists_(propertyLists), text_(json.makeText(options)) {
+    text_->beginMap();
+    text_->key("events");
+    text_->beginList();
+}
+
+void UploadText::addEvent(std::span<const std::uint8_t> data) {
+    const auto before = text_->mark();
+    if (!propertyLists_.read(data, *text_)) {
+        text_->rewind(before);
+    }
+}
+
+platform::Result<base::TextBuffer> UploadText::finish(const platform::ValueMap& summary,
+                                                      double postTime) {
+    platform::describe(summary, *text_);
+    text_->endList();
+    text_->key("postTime");
+    text_->real(postTime);
+    text_->endMap();
+    return text_->finish();
+}
+
 platform::Result<base::TextBuffer>
 makeUploadDocument(platform::JSON& json, platform::PropertyLists& propertyLists,
                    const StoredEvents& events, const platform::ValueMap& summary, double postTime,
                    const platform::JSONWritingOptions& options) {
-    const auto text = json.makeText(options);
-    text->beginMap();
-    text->key("events");
-    text->beginList();
-    events([&propertyLists, &text](const platform::Bytes& event) {
-        const auto before = text->mark();
-        if (!propertyLists.read(event, *text)) {
-            text->rewind(before);
-        }
-    });
-    platform::describe(summary, *text);
-    text->endList();
-    text->key("postTime");
-    text->real(postTime);
-    text->endMap();
-    return text->finish();
+    UploadText text(json, propertyLists, options);
+    events([&text](std::span<const std::uint8_t> event) { text.addEvent(event); });
+    return text.finish(summary, postTime);
 }
 
 } // namespace kstd

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "base/NotCopied.h"
 #include "base/TextBuffer.h"
 #include "platform/JSON.h"
 #include "platform/Result.h"
@@ -7,7 +8,9 @@
 
 #include <cstdint>
 #include <functional>
+#include <memory>
 #include <optional>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -40,7 +43,7 @@ struct EndpointBag {
 
 /// Hands the stored form of each event to `visitor`, in the order in which they came.
 using StoredEvents =
-    std::function<void(const std::function<void(const platform::Bytes& data)>& visitor)>;
+    std::function<void(const std::function<void(std::span<const std::uint8_t> data)>& visitor)>;
 
 /// What ends each upload: `extraValues`, and over them what every summary says. `postTime` is in
 /// milliseconds since 1970.
@@ -48,12 +51,28 @@ using StoredEvents =
                                                const std::optional<std::string>& topic,
                                                platform::SystemVersion& version, double postTime);
 
-/// The JSON text of an upload: every event in its order, then `summary`, under "events"; and
-/// `postTime`, in milliseconds since 1970.
+/// The JSON text of an upload in the making: every event in its order, then the summary, under
+/// "events"; and when it was made.
 ///
-/// An event goes from its stored form straight into the text, so that nothing but the text grows
-/// with their number. What holds no event leaves no trace. Events of a store are visited on the
-/// queue of the store.
+/// An event goes from its stored form straight into the text. What holds no event leaves no trace.
+class UploadText : private base::NotCopied {
+  public:
+    UploadText(platform::JSON& json, platform::PropertyLists& propertyLists,
+               const platform::JSONWritingOptions& options = {});
+
+    void addEvent(std::span<const std::uint8_t> data);
+    /// Moves what is there of the text behind what is in `taken`.
+    void moveTo(base::TextBuffer& taken) { text_->moveTo(taken); }
+    /// The text, or what is left of it. `postTime` is in milliseconds since 1970. Once.
+    [[nodiscard]] platform::Result<base::TextBuffer> finish(const platform::ValueMap& summary,
+                                                            double postTime);
+
+  private:
+    platform::PropertyLists& propertyLists_;
+    const std::unique_ptr<platform::JSONText> text_;
+};
+
+/// The whole text. Events of a store are visited on the queue of the store.
 [[nodiscard]] platform::Result<base::TextBuffer>
 makeUploadDocument(platform::JSON& json, platform::PropertyLists& propertyLists,
                    const StoredEvents& events, const platform::ValueMap& summary, double postTime,

@@ -1,10 +1,9 @@
 #include "kstd/Analytics/TQAnalyticsLoggerSQLiteStore.h"
 
 #include "base/Concat.h"
-#include "kstd/Analytics/SQLite/StatementRows.h"
+#include "base/FileNames.h"
 #include "platform/MessageClasses.h"
 
-#include <filesystem>
 #include <map>
 #include <mutex>
 #include <span>
@@ -28,18 +27,13 @@ Registry& registry() {
     return registry;
 }
 
-/// Without ".", ".." and doubled separators, by the text alone.
-std::string standardisedPath(const std::string& path) {
-    return std::filesystem::path(path).lexically_normal().string();
-}
-
 } // namespace
 
 std::shared_ptr<TQAnalyticsLoggerSQLiteStore>
 TQAnalyticsLoggerSQLiteStore::storeWithPath(const std::string& path, const std::string& schema,
                                             const DatabaseEnvironment& environment) {
     const std::lock_guard lock(registry().mutex);
-    const std::string standardised = standardisedPath(path);
+    const std::string standardised = base::withoutDots(path);
     std::shared_ptr<TQAnalyticsLoggerSQLiteStore>& store = registry().stores[standardised];
     if (store == nullptr) {
         // The schema of the first one counts.
@@ -104,7 +98,7 @@ void TQAnalyticsLoggerSQLiteStore::addEventDict(platform::ValueMap event,
 
 platform::ValueList TQAnalyticsLoggerSQLiteStore::allEvents() {
     platform::ValueList events;
-    visitEvents([this, &events](const platform::Bytes& data) {
+    visitEvents([this, &events](std::span<const std::uint8_t> data) {
         if (auto event = environment().propertyLists.value(data)) {
             events.push_back(*std::move(event));
         }
@@ -113,21 +107,45 @@ platform::ValueList TQAnalyticsLoggerSQLiteStore::allEvents() {
 }
 
 void TQAnalyticsLoggerSQLiteStore::visitEvents(
-    const std::function<void(const platform::Bytes& data)>& visitor) {
+    const std::function<void(std::span<const std::uint8_t> data)>& visitor) {
     if (!tryToOpenDatabase()) {
         return;
     }
-    // One buffer for all events: a million of them is read in one go.
-    platform::Bytes data;
-    forEachRow(*this, base::concat("select data from ", kEventTable), {},
-               [&data, &visitor](const KSTDSQLiteStatement& row) {
-                   if (row.columnTypeAtIndex(0) == SQLITE_BLOB) {
-                       const std::span<const std::uint8_t> bytes = row.blobBytesAtIndex(0);
-                       data.assign(bytes.begin(), bytes.end());
-                       visitor(data);
-                   }
-                   return true;
-               });
+    StoredEventCursor events(*this);
+    while (const auto data = events.next()) {
+        visitor(*data);
+    }
+}
+
+StoredEventCursor::StoredEventCursor(TQAnalyticsLoggerSQLiteStore& store)
+    : statement_(store.statementForSQL(base::concat("select data from ", kEventTable))) {}
+
+StoredEventCursor::~StoredEventCursor() {
+    if (statement_ != nullptr) {
+        statement_->reset();
+    }
+}
+
+std::optional<std::span<const std::uint8_t>> StoredEventCursor::next() {
+    while (statement_ != nullptr && statement_->step()) {
+        if (statement_->columnTypeAtIndex(0) == SQLITE_BLOB) {
+            return statement_->blobBytesAtIndex(0);
+        }
+    }
+    return std::nullopt;
+}
+
+UnchangingEvents::UnchangingEvents(TQAnalyticsLoggerSQLiteStore& store)
+    : store_(store), hasBegun_(store.executeSQL("begin")) {}
+
+UnchangingEvents::~UnchangingEvents() {
+    if (hasBegun_) {
+        store_.end();
+    }
+}
+
+void UnchangingEvents::releasePages() {
+    static_cast<void>(sqlite3_db_release_memory(store_.db()));
 }
 
 std::optional<platform::Timestamp> TQAnalyticsLoggerSQLiteStore::uploadDate() {

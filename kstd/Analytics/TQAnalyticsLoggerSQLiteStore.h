@@ -5,9 +5,11 @@
 #include "platform/Value.h"
 #include "platform/ValueSink.h"
 
+#include <cstdint>
 #include <functional>
 #include <memory>
 #include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 
@@ -43,7 +45,7 @@ class TQAnalyticsLoggerSQLiteStore final : public KSTDSQLite {
 
     /// Hands the stored form of each event to `visitor`, in the order in which they came. The
     /// visitor uses the store for nothing.
-    void visitEvents(const std::function<void(const platform::Bytes& data)>& visitor);
+    void visitEvents(const std::function<void(std::span<const std::uint8_t> data)>& visitor);
 
     [[nodiscard]] std::optional<platform::Timestamp> uploadDate();
     /// None removes it.
@@ -61,6 +63,36 @@ class TQAnalyticsLoggerSQLiteStore final : public KSTDSQLite {
     void logError(std::string_view messageId, std::string_view text) const;
 
     const std::shared_ptr<const platform::ValueList> failureRecords_;
+};
+
+/// The stored form of one event after the other, in the order in which they came. Only one at a
+/// time goes over an open store; nothing else reads its events meanwhile, and nothing writes.
+class StoredEventCursor : private base::NotCopied {
+  public:
+    explicit StoredEventCursor(TQAnalyticsLoggerSQLiteStore& store);
+    ~StoredEventCursor();
+
+    /// None after the last one. What it points to lasts until the next call.
+    [[nodiscard]] std::optional<std::span<const std::uint8_t>> next();
+
+  private:
+    std::shared_ptr<KSTDSQLiteStatement> statement_;
+};
+
+/// While it is there, everybody who goes over an open store finds the same events, those of the
+/// first look, whatever other processes add. It also keeps SQLite from holding the pages that were
+/// read.
+class UnchangingEvents : private base::NotCopied {
+  public:
+    explicit UnchangingEvents(TQAnalyticsLoggerSQLiteStore& store);
+    ~UnchangingEvents();
+
+    /// Frees what SQLite keeps of the pages that were read: each is read once only.
+    void releasePages();
+
+  private:
+    TQAnalyticsLoggerSQLiteStore& store_;
+    bool hasBegun_;
 };
 
 /// The table of the events, and the text that makes it. A changed text rebuilds the database.

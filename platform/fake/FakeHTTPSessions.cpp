@@ -143,6 +143,19 @@ std::string hostOf(const Link& link) {
     return std::string(place.substr(0, place.find_first_of(":/?#")));
 }
 
+/// As much of it as can be had.
+std::string bodyOf(const HTTPRequest& request) {
+    std::string body(request.body);
+    while (request.pieces != nullptr && body.size() < request.pieces->size()) {
+        const std::string_view piece = request.pieces->next(1000);
+        if (piece.empty()) {
+            break;
+        }
+        body.append(piece);
+    }
+    return body;
+}
+
 } // namespace
 
 FakeHTTPSession::FakeHTTPSession(FakeHTTPSessions& script,
@@ -151,9 +164,14 @@ FakeHTTPSession::FakeHTTPSession(FakeHTTPSessions& script,
     : script_(script), headers_(std::move(headers)), delegate_(std::move(delegate)) {}
 
 void FakeHTTPSession::start(const HTTPRequest& request, HTTPCompletion completion) {
-    FakeHTTPSessions::Taken taken =
-        script_.take({request.method, request.link, std::string(request.body),
-                      request.maximumAnswerSize, headers_});
+    std::string body = bodyOf(request);
+    const bool isWhole = body.size() == request.bodySize();
+    FakeHTTPSessions::Taken taken = script_.take({request.method, request.link, std::move(body),
+                                                  request.maximumAnswerSize, isWhole, headers_});
+    if (!isWhole) {
+        completion(failedReply(kTransferFailed, "transfer failed: the body cannot be read"));
+        return;
+    }
     if (!threads_.start([this, request, taken = std::move(taken), completion] {
             run(request, taken, completion);
         })) {

@@ -23,6 +23,8 @@ struct FakeHTTPRequest {
     std::optional<Link> link;
     std::string body;
     std::size_t maximumAnswerSize = 0;
+    /// Whether the body could be had to its end; if not, the request fails.
+    bool isWhole = true;
     /// Those of its session.
     std::map<std::string, std::string> headers;
     /// Whether the server got it and answered.

@@ -38,6 +38,7 @@ class JSONWriter : public JSONText {
 
     [[nodiscard]] Mark mark() const override;
     void rewind(const Mark& mark) override;
+    void moveTo(base::TextBuffer& taken) override;
     [[nodiscard]] Result<base::TextBuffer> finish() override;
 
   private:

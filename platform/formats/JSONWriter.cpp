@@ -194,6 +194,12 @@ void JSONWriter::rewind(const Mark& mark) {
     isKeyLeftOut_ = false;
 }
 
+void JSONWriter::moveTo(base::TextBuffer& taken) {
+    taken.append(text_.view());
+    text_.truncate(0);
+    entryStart_ = 0;
+}
+
 Result<base::TextBuffer> JSONWriter::finish() {
     if (depth_ + depthLeftOut_ > 0) {
         return Error{kGenericErrorDomain, 0, "a map or list of the JSON text is still open"};

@@ -52,11 +52,11 @@ RemoteHTTPExchange::RemoteHTTPExchange(wire::HTTPConnection& connection, const H
     : connection_(connection),
       request_(request),
       settings_(settings),
-      limit_(settings.options.limits.whole(request.method, request.body.size()) +
+      limit_(settings.options.limits.whole(request.method, request.bodySize()) +
              settings.options.grace),
       end_(wire::HTTPConnection::Clock::now() + limit_),
       hasDelegate_(!settings.delegate.expired()),
-      body_(isPost() ? request.body : std::string_view()) {}
+      bodyLeft_(isPost() ? request.bodySize() : 0) {}
 
 HTTPReply RemoteHTTPExchange::perform() {
     const auto request = requestMessage();
@@ -79,7 +79,7 @@ HTTPReply RemoteHTTPExchange::perform() {
 std::optional<wire::HTTPMessageBytes> RemoteHTTPExchange::requestMessage() const {
     wire::HTTPRequestFields fields{.method = request_.method,
                                    .link = request_.link->text,
-                                   .bodySize = body_.size(),
+                                   .bodySize = bodyLeft_,
                                    .maximumAnswerSize = std::min<std::uint64_t>(
                                        request_.maximumAnswerSize, wire::kHTTPMaxBodySize),
                                    .hasDelegate = hasDelegate_};
@@ -131,12 +131,24 @@ RemoteHTTPExchange::State RemoteHTTPExchange::judge(std::span<const std::uint8_t
 
 RemoteHTTPExchange::State RemoteHTTPExchange::giveBody(std::span<const std::uint8_t> fields) {
     const auto most = wire::decodeHTTPBodyWanted(fields);
-    if (!most || body_.empty()) {
+    if (!most || bodyLeft_ == 0) {
         return State::malformed;
     }
-    const auto piece = body_.substr(0, std::min<std::size_t>(*most, wire::kHTTPMaxPieceSize));
-    body_.remove_prefix(piece.size());
+    const auto piece = nextPiece(static_cast<std::size_t>(
+        std::min<std::uint64_t>({*most, wire::kHTTPMaxPieceSize, bodyLeft_})));
+    if (piece.empty()) {
+        reply_ = failedReply(kTransferFailed, "transfer failed: the body cannot be read");
+        return State::open;
+    }
+    bodyLeft_ -= piece.size();
     return connection_.sendPiece(asBytes(piece));
+}
+
+std::string_view RemoteHTTPExchange::nextPiece(std::size_t most) {
+    if (request_.pieces != nullptr) {
+        return request_.pieces->next(most);
+    }
+    return request_.body.substr(request_.body.size() - static_cast<std::size_t>(bodyLeft_), most);
 }
 
 RemoteHTTPExchange::State RemoteHTTPExchange::takeFailure(std::span<const std::uint8_t> fields) {

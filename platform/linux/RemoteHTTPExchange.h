@@ -47,6 +47,7 @@ class RemoteHTTPExchange : private base::NotCopied {
     [[nodiscard]] State handle(const wire::HTTPMessage& message);
     [[nodiscard]] State judge(std::span<const std::uint8_t> fields);
     [[nodiscard]] State giveBody(std::span<const std::uint8_t> fields);
+    [[nodiscard]] std::string_view nextPiece(std::size_t most);
     [[nodiscard]] State takeFailure(std::span<const std::uint8_t> fields);
     [[nodiscard]] State takeResponse(std::span<const std::uint8_t> fields);
     [[nodiscard]] State receiveBody(std::size_t size, std::string& body);
@@ -59,8 +60,8 @@ class RemoteHTTPExchange : private base::NotCopied {
     wire::HTTPConnection::Clock::time_point end_;
     bool hasDelegate_;
     int challenges_ = 0;
-    /// What the client has not got yet.
-    std::string_view body_;
+    /// How much of the body the client has not got yet.
+    std::uint64_t bodyLeft_;
     std::optional<HTTPReply> reply_;
 };
 

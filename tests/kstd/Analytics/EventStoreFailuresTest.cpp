@@ -57,7 +57,7 @@ TEST_F(EventStoreFailuresTest, EveryOperationOfAClosedStoreTriesToOpenItFirst) {
     EXPECT_EQ(lines(), expected);
     EXPECT_EQ(store->allEvents(), ValueList());
     EXPECT_EQ(lines(), expected);
-    store->visitEvents([](const platform::Bytes& /*data*/) { ADD_FAILURE(); });
+    store->visitEvents([](auto /*data*/) { ADD_FAILURE(); });
     EXPECT_EQ(lines(), expected);
     EXPECT_EQ(store->uploadDate(), std::nullopt);
     EXPECT_EQ(lines(), expected);

@@ -14,7 +14,7 @@ class EventStoreTest : public EventStoreFixture {
   protected:
     [[nodiscard]] static Texts storedEvents(TQAnalyticsLoggerSQLiteStore& store) {
         Texts events;
-        store.visitEvents([&events](const platform::Bytes& data) {
+        store.visitEvents([&events](std::span<const std::uint8_t> data) {
             events.emplace_back(data.begin(), data.end());
         });
         return events;
@@ -154,7 +154,7 @@ TEST_F(EventStoreTest, RowsThatHoldNoEventAreLeftOut) {
 TEST_F(EventStoreTest, ThrowingVisitorLeavesTheStoreUsable) {
     const Store store = makeStore();
     store->addEventDict(event(1), kEventTable);
-    EXPECT_THROW(store->visitEvents([](const platform::Bytes& /*data*/) { throw 1; }), int);
+    EXPECT_THROW(store->visitEvents([](std::span<const std::uint8_t> /*data*/) { throw 1; }), int);
     EXPECT_EQ(store->allEvents(), ValueList{event(1)});
     store->clearAllData();
     EXPECT_EQ(store->allEvents(), ValueList());

@@ -225,6 +225,60 @@ TEST_P(HTTPSessionContract, BodyOfTheAnswerToAPostIsNotKept) {
     EXPECT_EQ(fixture().requests().back().body, "document");
 }
 
+/// A body whose pieces are short, and of which no more than `most` bytes can be had.
+class BodyInPieces final : public platform::HTTPBody {
+  public:
+    BodyInPieces(std::string text, std::size_t most) : text_(std::move(text)), left_(most) {}
+
+    [[nodiscard]] std::uint64_t size() const override { return text_.size(); }
+    [[nodiscard]] std::string_view next(std::size_t most) override {
+        const std::size_t given = std::min({most, left_, kLongest});
+        const std::string_view piece = std::string_view(text_).substr(given_, given);
+        given_ += piece.size();
+        left_ -= piece.size();
+        return piece;
+    }
+
+  private:
+    static constexpr std::size_t kLongest = 70'000;
+
+    std::string text_;
+    std::size_t given_ = 0;
+    std::size_t left_;
+};
+
+std::string longText() {
+    std::string text;
+    while (text.size() < 1'000'000) {
+        text += base::concat(text.size(), ' ');
+    }
+    return text;
+}
+
+TEST_P(HTTPSessionContract, BodyInPiecesArrivesWhole) {
+    fixture().answer(200, "");
+    for (const std::string& text : {std::string("short"), longText()}) {
+        BodyInPieces body(text, text.size());
+        HTTPRequest request = post(fixture().link(), "");
+        request.pieces = &body;
+        EXPECT_EQ(outcomeOf(fetch(fixture().sessions(), request)), "200");
+        EXPECT_TRUE(fixture().requests().back().body == text);
+    }
+}
+
+TEST_P(HTTPSessionContract, BodyThatCannotBeHadToItsEndIsAnError) {
+    fixture().answer(200, "");
+    const std::string text = longText();
+    for (const std::size_t most : {std::size_t{0}, text.size() - 1}) {
+        BodyInPieces body(text, most);
+        HTTPRequest request = post(fixture().link(), "");
+        request.pieces = &body;
+        EXPECT_EQ(fetch(fixture().sessions(), request).error,
+                  (platform::Error{platform::kTransportErrorDomain, platform::kTransferFailed,
+                                   "transfer failed: the body cannot be read"}));
+    }
+}
+
 TEST_P(HTTPSessionContract, DestructionWaitsForEveryRequest) {
     fixture().hold();
     auto session = fixture().sessions().makeEphemeral({}, {});

@@ -311,6 +311,38 @@ TEST_P(JSONContract, WhatStandsBehindATextIsNoPartOfIt) {
     EXPECT_EQ(write(kMemory), base::concat("\"", kMemory, "\""));
 }
 
+TEST_P(JSONContract, TextThatIsMovedAwayAsItGrowsIsTheSame) {
+    for (const bool isPretty : {false, true}) {
+        const auto whole = fixture().json().makeText({.isPretty = isPretty});
+        const auto moved = fixture().json().makeText({.isPretty = isPretty});
+        base::TextBuffer taken;
+        const auto addEach = [&](const auto& add) {
+            add(*whole);
+            add(*moved);
+            moved->moveTo(taken);
+        };
+        addEach([](JSONText& text) { text.beginMap(); });
+        addEach([](JSONText& text) {
+            text.key("a");
+            text.beginList();
+        });
+        addEach([](JSONText& text) { text.integer(1); });
+        addEach([](JSONText& text) { text.date({}); });
+        addEach([](JSONText& text) { text.integer(2); });
+        addEach([](JSONText& text) {
+            const auto before = text.mark();
+            text.beginMap();
+            addEntry(text, "lost", 3);
+            text.rewind(before);
+        });
+        addEach([](JSONText& text) { text.text("last"); });
+        addEach([](JSONText& text) { text.endList(); });
+        addEach([](JSONText& text) { addEntry(text, "b", 4); });
+        addEach([](JSONText& text) { text.endMap(); });
+        EXPECT_EQ(taken.view(), finish(*whole));
+    }
+}
+
 TEST_P(JSONContract, NothingToFinish) {
     const auto text = makeText();
     const auto finished = text->finish();
