@@ -131,6 +131,29 @@ TEST_F(CompareCredentials, DataAreasShorterThanTheType) {
     EXPECT_EQ(areEqual(bytes, other), 0);
 }
 
+TEST_F(CompareCredentials, DataAreasLongerThanTheType) {
+    for (const Comparison& comparison : kComparisons) {
+        SCOPED_TRACE(comparison.type);
+        const std::size_t size = sample(comparison.type).size();
+        Bytes longer = sample(comparison.type);
+        longer.resize(size + 8, 1);
+        support::putU32(longer, 28, static_cast<std::uint32_t>(size + 8 - 32));
+        Bytes other = longer;
+        other.at(size) = 2;
+        // What stands behind the type's own data counts where the whole record does.
+        const bool whole = comparison.type == 12 || comparison.compared.back().end == 32;
+        EXPECT_EQ(areEqual(longer, other), whole ? 0 : 1);
+    }
+}
+
+TEST_F(CompareCredentials, BytesBehindAPassphraseDoNotCount) {
+    for (const std::uint32_t length : {0U, 1U, 127U}) {
+        Bytes other = passphrase(length);
+        other.at(32 + 8 + length) ^= 0x40U;
+        EXPECT_EQ(areEqual(passphrase(length), other), 1);
+    }
+}
+
 TEST_F(CompareCredentials, DifferentTypesOrLengths) {
     EXPECT_EQ(areEqual(credentialBytes(4), credentialBytes(5)), 0);
     EXPECT_EQ(areEqual(credentialBytes(4, 0), credentialBytes(4, 1)), 0);
