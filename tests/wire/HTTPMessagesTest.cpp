@@ -272,4 +272,15 @@ TEST(HTTPMessages, RequestAsAWholeAtItsLimit) {
         }
     }
     EXPECT_FALSE(decodeHTTPRequest(Bytes(131073)));
+
+    // One more byte in the last header, and all lengths say so.
+    const std::string last(left, 'v');
+    fields.headers.back().second = last;
+    Bytes message = encodeHTTPRequest(fields).value_or(Bytes{});
+    ASSERT_EQ(fieldsOf(message).size(), 131072U);
+    message.push_back('v');
+    const std::size_t length = message.size() - (left + 1) - 1 - 2;
+    message.at(length) = static_cast<std::uint8_t>((left + 1) & 0xffU);
+    message.at(length + 1) = static_cast<std::uint8_t>((left + 1) >> 8U);
+    EXPECT_FALSE(decodeHTTPRequest(fieldsOf(message)));
 }
