@@ -16,7 +16,7 @@ import time
 from .building import LAST_NUMBER
 
 MEMORY = 8 << 30
-FILE_SIZE = 256 << 20
+FILE_SIZE = 2 << 40
 
 
 def limit():
