@@ -323,12 +323,16 @@ GatePolicy::Actions GatePolicy::decideOpening(const BusView& view, BootTime now)
     return actions;
 }
 
-GatePolicy::Actions GatePolicy::decideOpen(const BusView& view, BootTime now) {
-    Actions actions;
+void GatePolicy::endLate(BootTime now) {
     if (late_ && now >= late_->until) {
         late_.reset();
         putBack_.clear();
     }
+}
+
+GatePolicy::Actions GatePolicy::decideOpen(const BusView& view, BootTime now) {
+    Actions actions;
+    endLate(now);
     if (!late_) {
         return actions;
     }

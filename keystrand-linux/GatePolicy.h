@@ -170,6 +170,8 @@ class GatePolicy {
     [[nodiscard]] std::optional<BootTime> nextLook() const;
     /// The gate is open, and what comes has to be looked at for a while all the same.
     [[nodiscard]] bool awaitsLate() const { return late_.has_value(); }
+    /// Ends that when it is time, whether the bus can be seen or not.
+    void endLate(BootTime now);
 
     [[nodiscard]] const GateState& state() const { return state_; }
     [[nodiscard]] bool closed() const { return state_.phase == GateState::Phase::closed; }

@@ -220,7 +220,13 @@ std::optional<BusView> UsbGate::lookAtBus() {
                          base::concat("keystrand: no port is guarded: ", problem));
     }
     toldProblem_ = view ? std::string() : problem;
+    blindSince_ = view ? std::nullopt : std::optional(parts_.now());
     return view;
+}
+
+std::optional<BootTime> UsbGate::nextLook() const {
+    const auto next = policy_.nextLook();
+    return next && blindSince_ ? std::max(*next, *blindSince_ + GatePolicy::kRetryTime) : next;
 }
 
 void UsbGate::settle() {
@@ -238,6 +244,7 @@ void UsbGate::settle() {
 bool UsbGate::step() {
     const auto view = lookAtBus();
     if (!view) {
+        policy_.endLate(parts_.now());
         return false;
     }
     const BootTime now = parts_.now();

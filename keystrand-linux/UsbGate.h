@@ -60,7 +60,7 @@ class UsbGate : private base::NotCopied {
 
     /// Looks again, because something came or went, or because it is time.
     void look();
-    [[nodiscard]] std::optional<BootTime> nextLook() const { return policy_.nextLook(); }
+    [[nodiscard]] std::optional<BootTime> nextLook() const;
 
     struct Listed {
         UsbDevice device;
@@ -91,6 +91,8 @@ class UsbGate : private base::NotCopied {
     std::string savedRecord_;
     std::optional<std::string> savedDevices_;
     std::string toldProblem_;
+    /// When the bus was looked at last, if it could not be seen.
+    std::optional<BootTime> blindSince_;
     bool keepsDevices_ = false;
     bool locked_ = false;
     /// What was said last, whether it could be done or not.

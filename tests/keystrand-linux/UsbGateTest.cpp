@@ -275,6 +275,24 @@ TEST_F(UsbGateTest, WhatWasRefusedBeforeItOpensAndIsSeenAfterwardsComesIn) {
     EXPECT_EQ(log.take(), Lines());
 }
 
+TEST_F(UsbGateTest, UsbThatWentDoesNotKeepItBusy) {
+    gate->setClosed(true);
+    // Looked behind for a keyboard.
+    bus.plug("1-1", aHub());
+    now = gate->nextLook().value();
+    bus.setMissing(true);
+    gate->look();
+    EXPECT_EQ(gate->nextLook(), now + GatePolicy::kRetryTime);
+    bus.setMissing(false);
+    gate->look();
+    gate->setClosed(false);
+    bus.setMissing(true);
+    now = gate->nextLook().value();
+    gate->look();
+    EXPECT_EQ(gate->nextLook(), std::nullopt);
+    EXPECT_FALSE(bus.isWatched());
+}
+
 TEST_F(UsbGateTest, DevicesThatAreInAreKeptWhileLocked) {
     bus.plug("1-1", aMouse());
     gate->setLocked(true);
