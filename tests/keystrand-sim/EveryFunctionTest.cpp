@@ -109,7 +109,7 @@ const std::set<std::string> kPure = {
 std::set<std::string> exportedSymbols() {
     std::set<std::string> names;
     std::ifstream list(EXPORTED_SYMBOLS);
-    for (std::string name; std::getline(list, name);) {
+    for (std::string name, version; list >> name >> version;) {
         names.insert(name);
     }
     return names;

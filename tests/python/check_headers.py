@@ -86,7 +86,7 @@ def python_name(name, prefix):
 
 class HeadersTest(unittest.TestCase):
     def test_every_exported_name_is_wrapped_or_named(self):
-        exported = Path("exported-symbols").read_text().split()
+        exported = Path("exported-symbols").read_text().split()[::2]
         wrapped = {*_library._PROTOTYPES, "gAllocatedBytes"}
         for name in exported:
             places = [
