@@ -3,6 +3,7 @@
 #include "base/ByteReader.h"
 #include "base/ByteWriter.h"
 
+#include <algorithm>
 #include <cassert>
 
 namespace keystrand {
@@ -11,74 +12,63 @@ using namespace wire::rm;
 
 namespace {
 
-/// Writes at offsets of a record. Every offset is a constant of the format, so a write always fits.
-class RecordWriter {
-  public:
-    explicit RecordWriter(std::span<std::uint8_t> bytes) : bytes_(bytes) {}
-
-    void u8(std::size_t offset, std::uint8_t value) const { check(at(offset).writeU8(value)); }
-    void u32(std::size_t offset, std::uint32_t value) const { check(at(offset).writeU32(value)); }
-    void u64(std::size_t offset, std::uint64_t value) const { check(at(offset).writeU64(value)); }
-    void bytes(std::size_t offset, std::span<const std::uint8_t> value) const {
-        check(at(offset).writeBytes(value.data(), value.size()));
+void writeField(std::span<std::uint8_t> field, const FieldValue& value) {
+    if (const auto* const bytes = std::get_if<std::span<const std::uint8_t>>(&value)) {
+        assert(bytes->size() == field.size());
+        std::copy(bytes->begin(), bytes->end(), field.begin());
+        return;
     }
-
-  private:
-    [[nodiscard]] base::ByteWriter at(std::size_t offset) const {
-        return base::ByteWriter(bytes_.subspan(offset));
+    std::uint64_t left = std::get<std::uint64_t>(value);
+    for (std::uint8_t& byte : field) {
+        byte = static_cast<std::uint8_t>(left);
+        left >>= 8U;
     }
-    static void check([[maybe_unused]] bool fits) { assert(fits); }
-
-    std::span<std::uint8_t> bytes_;
-};
-
-Notification startRecord(NotificationType type) {
-    Notification notification{.type = type, .record = {}};
-    RecordWriter(notification.record).u32(kNotificationTypeOffset, type);
-    return notification;
+    assert(left == 0);
 }
 
 } // namespace
 
-Notification makeTimerRestarted(const TimerRestarted& values) {
-    Notification notification = startRecord(kKSTRMNotificationTimerRestarted);
-    const RecordWriter writer(notification.record);
-    writer.u64(kAlarmTimestampOffset, values.alarm);
-    writer.bytes(kStateBlobOffset, encodeState(values.state));
+Notification makeNotification(NotificationType type, std::initializer_list<FieldValue> values) {
+    const NotificationKind* const kind = findNotificationKind(type);
+    assert(kind != nullptr && kind->fields.size() == values.size());
+    Notification notification{.type = type, .record = {}};
+    const std::span record(notification.record);
+    writeField(record.subspan(kNotificationTypeOffset, sizeof type), std::uint64_t{type});
+    const FieldValue* value = values.begin();
+    for (const NotificationField& field : kind->fields) {
+        writeField(record.subspan(field.offset, field.size), *value++);
+    }
     return notification;
+}
+
+Notification makeTimerRestarted(const TimerRestarted& values) {
+    const StateBytes state = encodeState(values.state);
+    return makeNotification(kKSTRMNotificationTimerRestarted, {values.alarm, std::span(state)});
 }
 
 Notification makeAnalyticsCollected(const AnalyticsCollected& values) {
-    Notification notification = startRecord(kKSTRMNotificationAnalyticsCollected);
-    const RecordWriter writer(notification.record);
-    writer.u32(kEventPeriodDurationOffset, values.eventPeriodDuration);
-    writer.u32(kRestrictedModeDurationOffset, values.restrictedModeDuration);
-    writer.u8(kRestrictedModeOffset, values.restrictedMode);
-    writer.u8(kPolicyDisabledByPasscodeNotSetOffset, values.policyDisabledByPasscodeNotSet);
-    writer.u8(kPolicyDisabledByBootArgOffset, values.policyDisabledByBootArg);
-    writer.u8(kPolicyDisabledByQuorvaneOffset, values.policyDisabledByQuorvane);
-    return notification;
+    return makeNotification(kKSTRMNotificationAnalyticsCollected,
+                            {values.eventPeriodDuration, values.restrictedModeDuration,
+                             values.restrictedMode, values.policyDisabledByPasscodeNotSet,
+                             values.policyDisabledByBootArg, values.policyDisabledByQuorvane});
 }
 
 Notification makeSaveAnalytics(const AnalyticsBytes& blob) {
-    Notification notification = startRecord(kKSTRMNotificationSaveAnalytics);
-    RecordWriter(notification.record).bytes(kAnalyticsBlobOffset, blob);
-    return notification;
+    return makeNotification(kKSTRMNotificationSaveAnalytics, {std::span(blob)});
 }
 
 Notification makeTimerRestartedAnalytics(std::uint32_t totalRestrictedModeDuration) {
-    Notification notification = startRecord(kKSTRMNotificationTimerRestartedAnalyticsCollected);
-    RecordWriter(notification.record)
-        .u32(kTotalRestrictedModeDurationOffset, totalRestrictedModeDuration);
-    return notification;
+    return makeNotification(kKSTRMNotificationTimerRestartedAnalyticsCollected,
+                            {totalRestrictedModeDuration});
 }
 
 StateBytes encodeState(const TimerState& state) {
     StateBytes bytes{};
-    const RecordWriter writer(bytes);
-    writer.u32(kStateVersionOffset, state.version);
-    writer.u64(kStateStandardModeStartOffset, state.standardModeStart);
-    writer.u8(kStateLockedOffset, state.lockedInRestrictedMode);
+    base::ByteWriter writer(bytes);
+    [[maybe_unused]] const bool fits = writer.writeU32(state.version) &&
+                                       writer.writeU64(state.standardModeStart) &&
+                                       writer.writeU8(state.lockedInRestrictedMode);
+    assert(fits && writer.left() == 0);
     return bytes;
 }
 

@@ -6,8 +6,10 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <initializer_list>
 #include <optional>
 #include <span>
+#include <variant>
 
 namespace keystrand {
 
@@ -46,7 +48,14 @@ struct AnalyticsCollected {
     std::uint8_t policyDisabledByQuorvane = 0;
 };
 
-/// Bytes of a record that have no meaning are zero.
+/// What a field of a record holds: bytes, as many as the field has, or a number that fits it.
+using FieldValue = std::variant<std::uint64_t, std::span<const std::uint8_t>>;
+
+/// A record of any type, with a value for each field that the table of types has for it, in their
+/// order. Bytes of a record that have no meaning are zero.
+[[nodiscard]] Notification makeNotification(wire::rm::NotificationType type,
+                                            std::initializer_list<FieldValue> values);
+
 [[nodiscard]] Notification makeTimerRestarted(const TimerRestarted& values);
 [[nodiscard]] Notification makeAnalyticsCollected(const AnalyticsCollected& values);
 [[nodiscard]] Notification makeSaveAnalytics(const AnalyticsBytes& blob);
