@@ -41,7 +41,8 @@ KSTStatus removeByNumber(std::uint32_t code, KSTContextRef context, std::uint32_
 /// The kernel service's no is a status too. The size of the reply is not looked at.
 KSTStatus isContained(std::uint32_t code, KSTContextRef context, std::uint32_t number,
                       std::uint32_t argument) {
-    KSTStatus err = kst::libraryContext().requireArguments({kst::Argument(context, "context")});
+    KSTStatus err =
+        kst::requireArguments(kst::libraryContext(), {kst::Argument(context, "context")});
     if (err == kKSTErrorSuccess) {
         err = kst::openChannel();
     }
@@ -78,7 +79,7 @@ KSTStatus removeCredentials(KSTContextRef context, std::uint32_t type, KSTScope 
 
 KSTStatus addGlobally(const KSTCredential* credential) {
     KSTStatus err =
-        kst::libraryContext().requireArguments({kst::Argument(credential, "credential")});
+        kst::requireArguments(kst::libraryContext(), {kst::Argument(credential, "credential")});
     kst::TemporaryContext context;
     if (err != kKSTErrorSuccess) {
         return err;

@@ -38,7 +38,8 @@ KSTStatus requestContext(std::uint8_t* reply) {
 }
 
 KSTStatus create(const char* function, KSTContextRef* context) {
-    KSTStatus err = kst::libraryContext().requireArguments({kst::Argument(context, "context")});
+    KSTStatus err =
+        kst::requireArguments(kst::libraryContext(), {kst::Argument(context, "context")});
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -79,7 +80,7 @@ KSTStatus readOpenReply(const kst::AllocatedMemory& reply, const void* externalF
 
 KSTStatus open(const void* externalForm, std::size_t dataLength, KSTContextRef& context) {
     KSTStatus err =
-        kst::libraryContext().requireArguments({kst::Argument(externalForm, "externalForm")});
+        kst::requireArguments(kst::libraryContext(), {kst::Argument(externalForm, "externalForm")});
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -118,7 +119,8 @@ KSTStatus sendHandle(std::uint32_t code, KSTContextRef context) {
 }
 
 KSTStatus deleteContextInternal(KSTContextRef context, bool destroy) {
-    KSTStatus err = kst::libraryContext().requireArguments({kst::Argument(context, "context")});
+    KSTStatus err =
+        kst::requireArguments(kst::libraryContext(), {kst::Argument(context, "context")});
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -133,10 +135,11 @@ KSTStatus deleteContextInternal(KSTContextRef context, bool destroy) {
 }
 
 KSTStatus getExternalForm(KSTContextRef context, const KSTDataBlock& processExternalForm) {
-    KSTStatus err = kst::libraryContext().requireArguments({
-        kst::Argument(context, "context"),
-        kst::Argument(processExternalForm, "processExternalForm"),
-    });
+    KSTStatus err = kst::requireArguments(
+        kst::libraryContext(), {
+                                   kst::Argument(context, "context"),
+                                   kst::Argument(processExternalForm, "processExternalForm"),
+                               });
     if (err != kKSTErrorSuccess) {
         return err;
     }

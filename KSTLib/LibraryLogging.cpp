@@ -1,6 +1,6 @@
 #include "KSTLib/LibraryLogging.h"
 
-#include "common/LibraryLog.h"
+#include "common/Failure.h"
 
 #include <cinttypes>
 

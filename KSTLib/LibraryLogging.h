@@ -2,7 +2,6 @@
 
 #include "KSTLib/Status.h"
 #include "common/Failure.h"
-#include "common/LibraryLog.h"
 
 #include <cstdint>
 

@@ -4,7 +4,7 @@
 #include "KSTLib/LibraryLogging.h"
 #include "KSTLib/Requirement.h"
 #include "common/Failure.h"
-#include "common/RequirementLayout.h"
+#include "wire/RequirementLayout.h"
 
 namespace {
 
@@ -14,10 +14,11 @@ KSTStatus handOverProperty(const Object* object, const char* objectName, std::ui
                            KSTStatus (*getPropertyData)(const Object*, std::uint32_t, const void**,
                                                         std::size_t*),
                            const KSTDataBlock& processProperty) {
-    KSTStatus err = kst::libraryContext().requireArguments({
-        kst::Argument(object, objectName),
-        kst::Argument(processProperty, "processProperty"),
-    });
+    KSTStatus err = kst::requireArguments(kst::libraryContext(),
+                                          {
+                                              kst::Argument(object, objectName),
+                                              kst::Argument(processProperty, "processProperty"),
+                                          });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -33,14 +34,15 @@ KSTStatus handOverProperty(const Object* object, const char* objectName, std::ui
 
 KSTStatus getProperties(const KSTRequirement* requirement,
                         const KSTPropertyBlock& processProperty) {
-    const KSTStatus err = kst::libraryContext().requireArguments({
-        kst::Argument(requirement, "requirement"),
-        kst::Argument(processProperty, "processProperty"),
-    });
+    const KSTStatus err = kst::requireArguments(
+        kst::libraryContext(), {
+                                   kst::Argument(requirement, "requirement"),
+                                   kst::Argument(processProperty, "processProperty"),
+                               });
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    for (const kst::RequirementProperty& property : kst::requirementProperties()) {
+    for (const wire::RequirementProperty& property : wire::requirementProperties()) {
         if (property.isEnumeratedFor(requirement)) {
             processProperty.invoke(processProperty.captured, property.id, property.in(requirement),
                                    property.enumeratedLength);
@@ -51,17 +53,18 @@ KSTStatus getProperties(const KSTRequirement* requirement,
 
 void getSubrequirements(const KSTRequirement* requirement,
                         const KSTRequirementBlock& processSubrequirement) {
-    const KSTStatus err = kst::libraryContext().requireArguments({
-        kst::Argument(requirement, "requirement"),
-        kst::Argument(processSubrequirement, "processSubrequirement"),
-    });
+    const KSTStatus err = kst::requireArguments(
+        kst::libraryContext(), {
+                                   kst::Argument(requirement, "requirement"),
+                                   kst::Argument(processSubrequirement, "processSubrequirement"),
+                               });
     if (err != kKSTErrorSuccess) {
         return;
     }
     const std::uint32_t count =
-        kst::isWireType(requirement->type) ? kst::childCount(requirement) : 0;
+        wire::isWireType(requirement->type) ? wire::childCount(requirement) : 0;
     for (std::uint32_t i = 0; i < count; ++i) {
-        processSubrequirement.invoke(processSubrequirement.captured, kst::childAt(requirement, i));
+        processSubrequirement.invoke(processSubrequirement.captured, wire::childAt(requirement, i));
     }
 }
 

@@ -3,7 +3,7 @@
 #include "KSTLib/Channel.h"
 #include "KSTLib/LibraryLogging.h"
 #include "common/Allocation.h"
-#include "common/LibraryLog.h"
+#include "common/Failure.h"
 
 #include <optional>
 #include <pthread.h>
@@ -36,7 +36,7 @@ void beginChild() {
 
 void installPlatform(const LibraryPlatform& platform) noexcept {
     installed.emplace(platform);
-    setLibraryLog(&platform.log);
+    installLog(&platform.log);
     startAnew();
     // The first call tries again.
     static_cast<void>(watchForks());
@@ -44,8 +44,12 @@ void installPlatform(const LibraryPlatform& platform) noexcept {
 
 void removePlatform() noexcept {
     installed.reset();
-    setLibraryLog(nullptr);
+    installLog(nullptr);
     startAnew();
+}
+
+void installLog(platform::SystemLog* log) noexcept {
+    setLibraryLog(log);
 }
 
 const LibraryPlatform* installedPlatform() noexcept {

@@ -34,6 +34,10 @@ void installPlatform(const LibraryPlatform& platform) noexcept;
 /// no log lines.
 void removePlatform() noexcept;
 
+/// Makes `log` the one that the library writes to, or none when it is null: all of a platform that
+/// is of use to functions which work on their caller's memory alone. It must outlive its use.
+void installLog(platform::SystemLog* log) noexcept;
+
 /// What is installed, or null.
 [[nodiscard]] const LibraryPlatform* installedPlatform() noexcept;
 

@@ -42,11 +42,12 @@ KSTStatus verifyAclConstraintInternal(const kst::PolicyQuestion& question,
 template <typename Block>
 KSTStatus verifyPolicy(const kst::PolicyQuestion& question, const char* policyId,
                        const Block& block, kst::PolicyAnswer& answer) {
-    const KSTStatus err = kst::libraryContext().requireArguments({
-        kst::Argument(question.context, "context"),
-        kst::Argument(policyId, "policyId"),
-        kst::Argument(block, "processRequirement"),
-    });
+    const KSTStatus err =
+        kst::requireArguments(kst::libraryContext(), {
+                                                         kst::Argument(question.context, "context"),
+                                                         kst::Argument(policyId, "policyId"),
+                                                         kst::Argument(block, "processRequirement"),
+                                                     });
     return err == kKSTErrorSuccess ? verifyPolicyInternal(question, policyId, answer) : err;
 }
 
@@ -54,13 +55,14 @@ KSTStatus verifyAclConstraint(const kst::PolicyQuestion& question, const void* a
                               std::size_t length, const KSTPolicyStatusBlock& block,
                               kst::PolicyAnswer& answer) {
     KSTStatus err =
-        kst::libraryContext().requireArguments({kst::Argument(question.context, "context")});
+        kst::requireArguments(kst::libraryContext(), {kst::Argument(question.context, "context")});
     if (err == kKSTErrorSuccess && (aclConstraint == nullptr || length == 0)) {
         err = kst::fail(kst::libraryContext(), "aclConstraint && aclConstraintLength", 0,
                         kKSTErrorBadParameter);
     }
     if (err == kKSTErrorSuccess) {
-        err = kst::libraryContext().requireArguments({kst::Argument(block, "processRequirement")});
+        err = kst::requireArguments(kst::libraryContext(),
+                                    {kst::Argument(block, "processRequirement")});
     }
     if (err == kKSTErrorSuccess && length > std::numeric_limits<std::uint32_t>::max()) {
         err = kst::fail(kst::libraryContext(), "aclConstraintLength <= UINT32_MAX", 0,
@@ -188,7 +190,7 @@ KSTStatus checkArguments(const void* acl, std::size_t aclLength, const KSTStatus
         return kst::fail(context, "acl && aclLength", 0, kKSTErrorBadParameter);
     }
     const KSTStatus err =
-        context.requireArguments({kst::Argument(block, "processConstraintCharacteristics")});
+        kst::requireArguments(context, {kst::Argument(block, "processConstraintCharacteristics")});
     if (err == kKSTErrorSuccess && aclLength > std::numeric_limits<std::uint32_t>::max()) {
         return kst::fail(context, "aclLength <= UINT32_MAX", 0, kKSTErrorBadParameter);
     }

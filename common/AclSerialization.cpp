@@ -30,10 +30,11 @@ GetSerializedVerifyAclConstraintSize(const KSTHandle* /*handle*/, const void* ac
                                      std::uint32_t /*maxGlobalCredentialAge*/,
                                      const KSTParameter* parameters, std::uint32_t parametersCount,
                                      std::uint32_t* outSize) noexcept {
-    KSTStatus err = serializationContext().requireArguments({
-        kst::Argument(aclConstraint, "aclConstraint"),
-        kst::Argument(outSize, "outSize"),
-    });
+    KSTStatus err = kst::requireArguments(serializationContext(),
+                                          {
+                                              kst::Argument(aclConstraint, "aclConstraint"),
+                                              kst::Argument(outSize, "outSize"),
+                                          });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -58,7 +59,7 @@ KSTStatus SerializeVerifyAclConstraint(const KSTHandle* handle, const void* aclC
                                        std::uint32_t parametersCount, void* outBuffer,
                                        std::uint32_t* outSize) noexcept {
     const kst::AssertionContext context = serializationContext();
-    KSTStatus err = context.requireArguments({kst::Argument(aclConstraint, "aclConstraint")});
+    KSTStatus err = kst::requireArguments(context, {kst::Argument(aclConstraint, "aclConstraint")});
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -176,7 +177,7 @@ KSTStatus GetSerializedProcessAclSize(const KSTHandle* /*handle*/, const void* a
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    err = serializationContext().requireArguments({kst::Argument(outSize, "outSize")});
+    err = kst::requireArguments(serializationContext(), {kst::Argument(outSize, "outSize")});
     if (err != kKSTErrorSuccess) {
         return err;
     }

@@ -82,11 +82,12 @@ std::uint8_t CompareDataBlobs(const void* data1, std::size_t length1, const void
 KSTStatus CompareCredentials(const KSTCredential* credential1, const KSTCredential* credential2,
                              std::uint8_t* outEqual) noexcept {
     const kst::AssertionContext context = kst::serializationContext();
-    const KSTStatus err = context.requireArguments({
-        kst::Argument(credential1, "credential1"),
-        kst::Argument(credential2, "credential2"),
-        kst::Argument(outEqual, "equal"),
-    });
+    const KSTStatus err =
+        kst::requireArguments(context, {
+                                           kst::Argument(credential1, "credential1"),
+                                           kst::Argument(credential2, "credential2"),
+                                           kst::Argument(outEqual, "equal"),
+                                       });
     if (err != kKSTErrorSuccess) {
         return err;
     }

@@ -29,10 +29,10 @@ KSTStatus GetSerializedAddCredentialSize(const KSTHandle* handle, const KSTCrede
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    err = serializationContext().requireArguments({
-        kst::Argument(credential, "credential"),
-        kst::Argument(outSize, "outSize"),
-    });
+    err = kst::requireArguments(serializationContext(), {
+                                                            kst::Argument(credential, "credential"),
+                                                            kst::Argument(outSize, "outSize"),
+                                                        });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -52,11 +52,11 @@ KSTStatus SerializeAddCredential(const KSTHandle* handle, const KSTCredential* c
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    err = context.requireArguments({
-        kst::Argument(credential, "credential"),
-        kst::Argument(outBuffer, "outBuffer"),
-        kst::Argument(outSize, "outSize"),
-    });
+    err = kst::requireArguments(context, {
+                                             kst::Argument(credential, "credential"),
+                                             kst::Argument(outBuffer, "outBuffer"),
+                                             kst::Argument(outSize, "outSize"),
+                                         });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -87,7 +87,7 @@ KSTStatus SerializeAddCredential(const KSTHandle* handle, const KSTCredential* c
 KSTStatus DeserializeAddCredential(const void* buffer, std::size_t size, KSTHandle* outHandle,
                                    KSTCredential** outCredential, KSTScope* outScope) noexcept {
     const kst::AssertionContext context = serializationContext();
-    KSTStatus err = context.requireArguments({kst::Argument(buffer, "buffer")});
+    KSTStatus err = kst::requireArguments(context, {kst::Argument(buffer, "buffer")});
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -96,11 +96,11 @@ KSTStatus DeserializeAddCredential(const void* buffer, std::size_t size, KSTHand
                          "size >= sizeof(KSTHandle) + sizeof(KSTCredential) + sizeof(KSTScope)", 0,
                          kKSTErrorBadParameter);
     }
-    err = context.requireArguments({
-        kst::Argument(outHandle, "handle"),
-        kst::Argument(outCredential, "credential"),
-        kst::Argument(outScope, "scope"),
-    });
+    err = kst::requireArguments(context, {
+                                             kst::Argument(outHandle, "handle"),
+                                             kst::Argument(outCredential, "credential"),
+                                             kst::Argument(outScope, "scope"),
+                                         });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -169,7 +169,7 @@ KSTStatus GetSerializedGetContextPropertySize(const KSTHandle* /*handle*/,
                                               KSTContextProperty /*property*/,
                                               std::size_t* outSize) noexcept {
     const KSTStatus err =
-        serializationContext().requireArguments({kst::Argument(outSize, "outSize")});
+        kst::requireArguments(serializationContext(), {kst::Argument(outSize, "outSize")});
     if (err == kKSTErrorSuccess) {
         *outSize = kPropertyPayloadSize;
     }
@@ -178,11 +178,12 @@ KSTStatus GetSerializedGetContextPropertySize(const KSTHandle* /*handle*/,
 
 KSTStatus SerializeGetContextProperty(const KSTHandle* handle, KSTContextProperty property,
                                       void* outBuffer, std::size_t* outSize) noexcept {
-    const KSTStatus err = serializationContext().requireArguments({
-        kst::Argument(handle, "handle"),
-        kst::Argument(outBuffer, "outBuffer"),
-        kst::Argument(outSize, "outSize"),
-    });
+    const KSTStatus err =
+        kst::requireArguments(serializationContext(), {
+                                                          kst::Argument(handle, "handle"),
+                                                          kst::Argument(outBuffer, "outBuffer"),
+                                                          kst::Argument(outSize, "outSize"),
+                                                      });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -197,11 +198,12 @@ KSTStatus SerializeGetContextProperty(const KSTHandle* handle, KSTContextPropert
 
 KSTStatus DeserializeGetContextProperty(const void* buffer, std::size_t size, KSTHandle* outHandle,
                                         KSTContextProperty* outProperty) noexcept {
-    const KSTStatus err = serializationContext().requireArguments({
-        kst::Argument(buffer, "buffer"),
-        kst::Argument(outHandle, "handle"),
-        kst::Argument(outProperty, "property"),
-    });
+    const KSTStatus err =
+        kst::requireArguments(serializationContext(), {
+                                                          kst::Argument(buffer, "buffer"),
+                                                          kst::Argument(outHandle, "handle"),
+                                                          kst::Argument(outProperty, "property"),
+                                                      });
     if (err != kKSTErrorSuccess) {
         return err;
     }

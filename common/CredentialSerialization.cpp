@@ -54,21 +54,22 @@ KSTStatus checkHeader(const void* buffer, std::size_t size, std::uint32_t& dataL
 
 KSTStatus GetSerializedCredentialSize(const KSTCredential* credential,
                                       std::size_t* outSize) noexcept {
-    const KSTStatus err = kst::serializationContext().requireArguments({
-        kst::Argument(credential, "credential"),
-        kst::Argument(outSize, "outSize"),
-    });
+    const KSTStatus err = kst::requireArguments(kst::serializationContext(),
+                                                {
+                                                    kst::Argument(credential, "credential"),
+                                                    kst::Argument(outSize, "outSize"),
+                                                });
     return err == kKSTErrorSuccess ? measure(credential, *outSize) : err;
 }
 
 KSTStatus SerializeCredential(const KSTCredential* credential, void* outBuffer,
                               std::size_t* outSize) noexcept {
     const kst::AssertionContext context = kst::serializationContext();
-    KSTStatus err = context.requireArguments({
-        kst::Argument(credential, "credential"),
-        kst::Argument(outBuffer, "outBuffer"),
-        kst::Argument(outSize, "outSize"),
-    });
+    KSTStatus err = kst::requireArguments(context, {
+                                                       kst::Argument(credential, "credential"),
+                                                       kst::Argument(outBuffer, "outBuffer"),
+                                                       kst::Argument(outSize, "outSize"),
+                                                   });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -88,11 +89,12 @@ KSTStatus SerializeCredential(const KSTCredential* credential, void* outBuffer,
 KSTStatus DeserializeCredential(const void* buffer, std::size_t size, KSTCredential** outCredential,
                                 std::size_t* consumedBytes) noexcept {
     const kst::AssertionContext context = kst::serializationContext();
-    KSTStatus err = context.requireArguments({
-        kst::Argument(buffer, "buffer"),
-        kst::Argument(outCredential, "credential"),
-        kst::Argument(consumedBytes, "consumedBytes"),
-    });
+    KSTStatus err =
+        kst::requireArguments(context, {
+                                           kst::Argument(buffer, "buffer"),
+                                           kst::Argument(outCredential, "credential"),
+                                           kst::Argument(consumedBytes, "consumedBytes"),
+                                       });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -118,10 +120,11 @@ KSTStatus DeserializeCredential(const void* buffer, std::size_t size, KSTCredent
 
 KSTStatus CopyCredential(const KSTCredential* credential, KSTCredential** outCopy) noexcept {
     const kst::AssertionContext context = kst::serializationContext();
-    const KSTStatus err = context.requireArguments({
-        kst::Argument(credential, "credential"),
-        kst::Argument(outCopy, "copy"),
-    });
+    const KSTStatus err =
+        kst::requireArguments(context, {
+                                           kst::Argument(credential, "credential"),
+                                           kst::Argument(outCopy, "copy"),
+                                       });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -193,10 +196,10 @@ KSTStatus SerializeCredentialList(KSTCredential* const* credentialList, std::uin
     if (credentialList == nullptr && count != 0) {
         return kst::fail(context, "credentialList || (count == 0)", 0, kKSTErrorBadParameter);
     }
-    KSTStatus err = context.requireArguments({
-        kst::Argument(outBuffer, "outBuffer"),
-        kst::Argument(outSize, "outSize"),
-    });
+    KSTStatus err = kst::requireArguments(context, {
+                                                       kst::Argument(outBuffer, "outBuffer"),
+                                                       kst::Argument(outSize, "outSize"),
+                                                   });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -214,11 +217,12 @@ KSTStatus DeserializeCredentialList(const void* buffer, std::size_t size,
                                     KSTCredential*** outCredentialList,
                                     std::uint32_t* outCount) noexcept {
     const kst::AssertionContext context = kst::serializationContext();
-    KSTStatus err = context.requireArguments({
-        kst::Argument(buffer, "buffer"),
-        kst::Argument(outCredentialList, "credentialList"),
-        kst::Argument(outCount, "count"),
-    });
+    KSTStatus err =
+        kst::requireArguments(context, {
+                                           kst::Argument(buffer, "buffer"),
+                                           kst::Argument(outCredentialList, "credentialList"),
+                                           kst::Argument(outCount, "count"),
+                                       });
     if (err != kKSTErrorSuccess) {
         return err;
     }

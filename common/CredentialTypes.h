@@ -15,16 +15,13 @@ struct CredentialType {
     const char* sizeCheck;
 };
 
-[[nodiscard]] constexpr bool isCredentialType(std::uint32_t type) noexcept {
-    return type >= 1 && type <= kKSTCredentialTypeMax;
-}
-
 /// Null for a type that does not exist.
 [[nodiscard]] const CredentialType* findCredentialType(std::uint32_t type) noexcept;
 
 using wire::credentialBytes;
 using wire::credentialData;
 using wire::credentialSize;
+using wire::isCredentialType;
 using wire::passphraseLength;
 
 /// The passphrase, whose length may be less than its place has.

@@ -1,32 +1,35 @@
 #pragma once
 
 #include "KSTLib/Status.h"
-#include "common/LibraryLog.h"
-#include "platform/SystemLog.h"
+#include "platform/FailedCheck.h"
 
 #include <cstddef>
 #include <cstdint>
 #include <utility>
 
-/// How a function of the library or of a program tells what it refuses and what went wrong: one
-/// line for each failed check, and the status back, so that both are one statement:
+/// What the library's functions say of what they refuse and of what went wrong, beside the two
+/// verbs `fail` and `failCall`:
 ///
-///     KSTStatus err = context.requireArguments({Argument(a, "a"), Argument(b, "b")});
-///     if (size > room) return fail(context, "size <= room", 0, kKSTErrorBadParameter);
-///     if (err != kKSTErrorSuccess) return failCall(context, err);
+///     KSTStatus err = requireArguments(context, {Argument(a, "a"), Argument(b, "b")});
 namespace kst {
 
-/// The source and the line that hold a check. No other check of that source has the line.
-struct CheckPlace {
-    const char* file;
-    int line;
+using platform::AssertionContext;
+using platform::CheckPlace;
+using platform::fail;
+using platform::failCall;
 
-    /// As a default argument: where the function was called.
-    [[nodiscard]] static constexpr CheckPlace here(const char* file = __builtin_FILE(),
-                                                   int line = __builtin_LINE()) noexcept {
-        return {file, line};
-    }
-};
+/// What `libraryLog` reads and `setLibraryLog` writes; of no use to anyone else.
+inline platform::SystemLog* installedLibraryLog = nullptr;
+
+/// Which log the library writes to: one for the process. Null while none is set. Not synchronised.
+[[nodiscard]] inline platform::SystemLog* libraryLog() noexcept {
+    return installedLibraryLog;
+}
+
+/// Makes `log` the library's, or none when it is null. It must outlive its use.
+inline void setLibraryLog(platform::SystemLog* log) noexcept {
+    installedLibraryLog = log;
+}
 
 /// An argument that must not be null. Each stands on a line of its own, which is its check's.
 struct Argument {
@@ -52,44 +55,11 @@ struct Argument {
     CheckPlace place;
 };
 
-/// Who reports a failed check, and where to.
-struct AssertionContext {
-    /// Null: nothing is written.
-    platform::SystemLog* log;
-    /// Begins the line, for example "KSTLib".
-    const char* tag;
-    /// The path that the line names, for example "KSTLib/KSTLib": what the check belongs to.
-    const char* path;
-
-    /// kKSTErrorBadParameter, with the line of the first argument that is null; otherwise success.
-    /// The list is taken apart by the compiler and never stands in memory.
-    template <std::size_t count>
-    [[nodiscard]] KSTStatus requireArguments(const Argument (&arguments)[count]) const noexcept;
-};
-
-/// Writes the line of a failed check:
-///
-///     <tag>: AssertMacros: <condition> (value: 0x<value>),  file: <path>:<line>
-///
-/// `value` is shown as 64 bits in hexadecimal, so -5 is 0xfffffffffffffffb. The line is that of
-/// `place`, which the log gets whole as the line's place in the code: several sources may have one
-/// path.
-[[gnu::cold]] void writeAssertLine(platform::SystemLog* log, const char* tag, const char* path,
-                                   const CheckPlace& place, const char* condition,
-                                   std::int64_t value) noexcept;
-
-/// Writes that line for the caller's place, unless another is given, and hands `status` back. It
-/// takes the context apart in its caller, so that one whose checks all hold never makes a context.
-[[gnu::always_inline]] inline KSTStatus fail(const AssertionContext& context, const char* condition,
-                                             std::int64_t value, KSTStatus status,
-                                             CheckPlace place = CheckPlace::here()) noexcept {
-    writeAssertLine(context.log, context.tag, context.path, place, condition, value);
-    return status;
-}
-
+/// kKSTErrorBadParameter, with the line of the first argument that is null; otherwise success. The
+/// list is taken apart by the compiler and never stands in memory.
 template <std::size_t count>
-[[gnu::always_inline]] inline KSTStatus
-AssertionContext::requireArguments(const Argument (&arguments)[count]) const noexcept {
+[[nodiscard, gnu::always_inline]] inline KSTStatus
+requireArguments(const AssertionContext& context, const Argument (&arguments)[count]) noexcept {
     const char* missing = nullptr;
     CheckPlace place{};
     const auto isThere = [&missing, &place](const Argument& argument) {
@@ -101,18 +71,8 @@ AssertionContext::requireArguments(const Argument (&arguments)[count]) const noe
         return (isThere(arguments[index]) && ...);
     };
     const bool complete = areThere(std::make_index_sequence<count>{});
-    return complete ? kKSTErrorSuccess : fail(*this, missing, 0, kKSTErrorBadParameter, place);
+    return complete ? kKSTErrorSuccess : fail(context, missing, 0, kKSTErrorBadParameter, place);
 }
-
-/// `fail` for a call that returned `status`, which must be 0 and is not.
-[[gnu::always_inline]] inline KSTStatus failCall(const AssertionContext& context, KSTStatus status,
-                                                 CheckPlace place = CheckPlace::here()) noexcept {
-    return fail(context, "err == 0 ", status, status, place);
-}
-
-/// Writes the line of a failed check and stops the process: a program that has come here is broken.
-[[noreturn]] void stop(const AssertionContext& context, const char* condition,
-                       CheckPlace place = CheckPlace::here()) noexcept;
 
 /// The context of the library's failed checks: its log.
 [[nodiscard]] inline AssertionContext libraryContext() noexcept {

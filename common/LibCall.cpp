@@ -15,7 +15,8 @@ constexpr const char* kSourcePath = "common/LibCall";
 KSTStatus setEnvironmentVariable(KSTTransport transport, void* transportContext,
                                  std::uint32_t variable, const void* data, std::size_t dataLength) {
     const kst::AssertionContext context = kst::libCallContext(kSourcePath);
-    const KSTStatus missing = context.requireArguments({kst::Argument(transport, "transport")});
+    const KSTStatus missing =
+        kst::requireArguments(context, {kst::Argument(transport, "transport")});
     if (missing != kKSTErrorSuccess) {
         return missing;
     }
@@ -73,10 +74,11 @@ void handOver(const KSTDataBlock& block, const std::uint8_t* bytes, std::size_t 
 KSTStatus getEnvironmentVariable(KSTTransport transport, void* transportContext,
                                  std::uint32_t variable, const KSTDataBlock& processVariable) {
     const kst::AssertionContext context = kst::libCallContext(kBlockSourcePath);
-    KSTStatus err = context.requireArguments({
-        kst::Argument(transport, "transport"),
-        kst::Argument(processVariable, "processVariable"),
-    });
+    KSTStatus err =
+        kst::requireArguments(context, {
+                                           kst::Argument(transport, "transport"),
+                                           kst::Argument(processVariable, "processVariable"),
+                                       });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -98,7 +100,7 @@ KSTStatus getEnvironmentVariable(KSTTransport transport, void* transportContext,
 KSTStatus kernelControl(KSTTransport transport, void* transportContext, std::uint32_t code,
                         const void* data, std::size_t dataLength, const KSTDataBlock& resultBlock) {
     const kst::AssertionContext context = kst::libCallContext(kBlockSourcePath);
-    KSTStatus err = context.requireArguments({kst::Argument(transport, "transport")});
+    KSTStatus err = kst::requireArguments(context, {kst::Argument(transport, "transport")});
     if (err != kKSTErrorSuccess) {
         return err;
     }

@@ -12,7 +12,7 @@ kst::CommandSender senderOver(KSTTransport transport) {
 }
 
 KSTStatus checkTransport(const kst::CommandSender& sender) {
-    return sender.context.requireArguments({kst::Argument(sender.transport, "transport")});
+    return kst::requireArguments(sender.context, {kst::Argument(sender.transport, "transport")});
 }
 
 KSTStatus create(const kst::CommandSender& sender, KSTContextRef* context, std::uint8_t* logLevel) {
@@ -20,7 +20,7 @@ KSTStatus create(const kst::CommandSender& sender, KSTContextRef* context, std::
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    err = sender.context.requireArguments({kst::Argument(context, "context")});
+    err = kst::requireArguments(sender.context, {kst::Argument(context, "context")});
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -49,7 +49,7 @@ KSTStatus deleteContext(const kst::CommandSender& sender, KSTContextRef context,
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    err = sender.context.requireArguments({kst::Argument(context, "context")});
+    err = kst::requireArguments(sender.context, {kst::Argument(context, "context")});
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -98,7 +98,7 @@ KSTStatus checkPolicyArguments(const kst::CommandSender& sender,
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    err = sender.context.requireArguments({kst::Argument(question.context, "context")});
+    err = kst::requireArguments(sender.context, {kst::Argument(question.context, "context")});
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -109,10 +109,11 @@ KSTStatus checkPolicyArguments(const kst::CommandSender& sender,
                          "((parametersCount == 0) && parameters == ((void*)0)) )",
                          0, kKSTErrorBadParameter);
     }
-    return sender.context.requireArguments({
-        kst::Argument(policyId, "policyId"),
-        kst::Argument(policySatisfied, "policySatisfied"),
-    });
+    return kst::requireArguments(sender.context,
+                                 {
+                                     kst::Argument(policyId, "policyId"),
+                                     kst::Argument(policySatisfied, "policySatisfied"),
+                                 });
 }
 
 KSTStatus verifyPolicy(const kst::CommandSender& sender, const kst::PolicyQuestion& question,

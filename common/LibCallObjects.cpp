@@ -4,8 +4,8 @@
 #include "common/Allocation.h"
 #include "common/CredentialTypes.h"
 #include "common/Failure.h"
-#include "common/RequirementLayout.h"
 #include "wire/CredentialFields.h"
+#include "wire/RequirementLayout.h"
 
 #include <cstring>
 #include <string.h>
@@ -118,11 +118,12 @@ bool isZero(const std::uint8_t* bytes, std::size_t length) {
 
 KSTStatus getPropertyData(const KSTCredential* credential, std::uint32_t propertyId,
                           const void** data, std::size_t* dataLength) {
-    KSTStatus err = assertionContext().requireArguments({
-        kst::Argument(credential, "credential"),
-        kst::Argument(data, "data"),
-        kst::Argument(dataLength, "dataLength"),
-    });
+    KSTStatus err =
+        kst::requireArguments(assertionContext(), {
+                                                      kst::Argument(credential, "credential"),
+                                                      kst::Argument(data, "data"),
+                                                      kst::Argument(dataLength, "dataLength"),
+                                                  });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -183,15 +184,15 @@ namespace {
 std::uint32_t headerWord(const KSTRequirement* requirement,
                          const std::uint32_t KSTRequirement::*word) {
     const KSTStatus err =
-        assertionContext().requireArguments({kst::Argument(requirement, "requirement")});
+        kst::requireArguments(assertionContext(), {kst::Argument(requirement, "requirement")});
     return err == kKSTErrorSuccess ? requirement->*word : 0;
 }
 
 /// Finds the property of that number which the type of `requirement` has.
 KSTStatus findProperty(const KSTRequirement* requirement, std::uint32_t propertyId,
-                       const kst::RequirementProperty*& found) {
+                       const wire::RequirementProperty*& found) {
     const char* check = "0";
-    for (const kst::RequirementProperty& property : kst::requirementProperties()) {
+    for (const wire::RequirementProperty& property : wire::requirementProperties()) {
         if (property.id != propertyId) {
             continue;
         }
@@ -208,15 +209,15 @@ KSTStatus getPropertyData(const KSTRequirement* requirement, std::uint32_t prope
                           const void** data, std::size_t* dataLength) {
     const kst::AssertionContext context = assertionContext();
     // The pointer and the length are one output to the check.
-    KSTStatus err = context.requireArguments({
-        kst::Argument(requirement, "requirement"),
-        kst::Argument(data, "data"),
-        kst::Argument(dataLength, "data"),
-    });
+    KSTStatus err = kst::requireArguments(context, {
+                                                       kst::Argument(requirement, "requirement"),
+                                                       kst::Argument(data, "data"),
+                                                       kst::Argument(dataLength, "data"),
+                                                   });
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    const kst::RequirementProperty* property = nullptr;
+    const wire::RequirementProperty* property = nullptr;
     err = findProperty(requirement, propertyId, property);
     if (err != kKSTErrorSuccess) {
         return err;
@@ -232,10 +233,11 @@ KSTStatus getPropertyData(const KSTRequirement* requirement, std::uint32_t prope
 }
 
 KSTStatus deleteRequirement(KSTTransport transport, KSTRequirement* requirement) {
-    const KSTStatus err = assertionContext().requireArguments({
-        kst::Argument(transport, "transport"),
-        kst::Argument(requirement, "requirement"),
-    });
+    const KSTStatus err =
+        kst::requireArguments(assertionContext(), {
+                                                      kst::Argument(transport, "transport"),
+                                                      kst::Argument(requirement, "requirement"),
+                                                  });
     if (err == kKSTErrorSuccess) {
         DeallocRequirement(requirement);
     }

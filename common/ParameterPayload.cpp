@@ -131,11 +131,12 @@ KSTStatus measureParameters(const KSTParameter* parameters, std::uint32_t parame
 KSTStatus checkWriter(const KSTParameter* parameters, std::uint32_t parametersCount,
                       const void* outBuffer, const void* outSize) noexcept {
     const KSTStatus err = checkParameterList(parameters, parametersCount);
-    return err != kKSTErrorSuccess ? err
-                                   : serializationContext().requireArguments({
-                                         Argument(outBuffer, "outBuffer"),
-                                         Argument(outSize, "outSize"),
-                                     });
+    return err != kKSTErrorSuccess
+               ? err
+               : kst::requireArguments(serializationContext(), {
+                                                                   Argument(outBuffer, "outBuffer"),
+                                                                   Argument(outSize, "outSize"),
+                                                               });
 }
 
 KSTStatus checkParameters(const KSTParameter* parameters, std::uint32_t parametersCount) noexcept {

@@ -87,19 +87,20 @@ class PayloadReader {
     template <std::size_t Count>
     [[nodiscard]] KSTStatus begin(const Argument (&own)[Count]) noexcept {
         const AssertionContext context = serializationContext();
-        KSTStatus err = context.requireArguments({
-            Argument(buffer_, "buffer"),
-            Argument(outputs_.handle, "handle"),
-        });
+        KSTStatus err = requireArguments(context, {
+                                                      Argument(buffer_, "buffer"),
+                                                      Argument(outputs_.handle, "handle"),
+                                                  });
         if (err == kKSTErrorSuccess) {
-            err = context.requireArguments(own);
+            err = requireArguments(context, own);
         }
         if (err == kKSTErrorSuccess) {
-            err = context.requireArguments({
-                Argument(outputs_.maxGlobalCredentialAge, "maxGlobalCredentialAge"),
-                Argument(outputs_.parameters, "parameters"),
-                Argument(outputs_.parametersCount, "parametersCount"),
-            });
+            err = requireArguments(
+                context, {
+                             Argument(outputs_.maxGlobalCredentialAge, "maxGlobalCredentialAge"),
+                             Argument(outputs_.parameters, "parameters"),
+                             Argument(outputs_.parametersCount, "parametersCount"),
+                         });
         }
         return err == kKSTErrorSuccess ? readHandle() : err;
     }

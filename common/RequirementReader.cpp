@@ -4,7 +4,7 @@
 #include "common/Allocation.h"
 #include "common/Failure.h"
 #include "common/LevelStack.h"
-#include "common/RequirementLayout.h"
+#include "wire/RequirementLayout.h"
 
 #include <limits>
 #include <span>
@@ -25,16 +25,16 @@ struct Announcement {
     std::uint32_t childCount = 0;
 };
 
-KSTStatus readCompositeSizes(Bytes bytes, const kst::CompositeLayout& layout,
+KSTStatus readCompositeSizes(Bytes bytes, const wire::CompositeLayout& layout,
                              Announcement& announcement) {
     const kst::AssertionContext context = kst::serializationContext();
     base::ByteReader reader(bytes);
     std::uint32_t count = 0;
     if (bytes.size() < layout.childrenOffset || !reader.skip(layout.countOffset) ||
-        !reader.readU32(count) || kst::compositeSize(layout, count) > bytes.size()) {
+        !reader.readU32(count) || wire::compositeSize(layout, count) > bytes.size()) {
         return kst::fail(context, kFitsCheck, 0, kKSTErrorBadParameter);
     }
-    announcement = {kst::compositeSize(layout, count), layout.childrenOffset, count};
+    announcement = {wire::compositeSize(layout, count), layout.childrenOffset, count};
     if (announcement.nodeSize - sizeof(KSTRequirement) >
         std::numeric_limits<std::uint32_t>::max()) {
         return kst::fail(context, "reqSize - sizeof(KSTRequirement) <= UINT32_MAX", 0,
@@ -51,13 +51,13 @@ KSTStatus readAnnouncement(Bytes bytes, Announcement& announcement) {
     if (!reader.readBytes(&header, sizeof header)) {
         return kst::fail(context, "size >= sizeof(KSTRequirement)", 0, kKSTErrorBadParameter);
     }
-    if (!kst::isWireType(header.type)) {
+    if (!wire::isWireType(header.type)) {
         return kst::fail(context, "0", 0, kKSTErrorBadParameter);
     }
-    if (const kst::CompositeLayout* layout = kst::findCompositeLayout(header.type)) {
+    if (const wire::CompositeLayout* layout = wire::findCompositeLayout(header.type)) {
         return readCompositeSizes(bytes, *layout, announcement);
     }
-    const std::size_t size = kst::nodeSize(&header);
+    const std::size_t size = wire::nodeSize(&header);
     if (size > bytes.size()) {
         return kst::fail(context, kFitsCheck, 0, kKSTErrorBadParameter);
     }
@@ -143,7 +143,7 @@ class TreeBuilder : private base::NotCopied {
         if (levels_.empty()) {
             root_ = node;
         } else {
-            kst::setChildAt(levels_.top().node, levels_.top().next - 1, node);
+            wire::setChildAt(levels_.top().node, levels_.top().next - 1, node);
         }
         return node;
     }
@@ -183,10 +183,11 @@ KSTStatus DeserializeRequirement(const void* buffer, std::size_t size,
     if (size < sizeof(KSTRequirement)) {
         return kst::fail(context, "size >= sizeof(KSTRequirement)", 0, kKSTErrorBadParameter);
     }
-    KSTStatus err = context.requireArguments({
-        kst::Argument(outRequirement, "requirement"),
-        kst::Argument(consumedBytes, "consumedBytes"),
-    });
+    KSTStatus err =
+        kst::requireArguments(context, {
+                                           kst::Argument(outRequirement, "requirement"),
+                                           kst::Argument(consumedBytes, "consumedBytes"),
+                                       });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -204,9 +205,9 @@ namespace {
 /// A node that is being freed counts in `state` the children it has been left to. Null when there
 /// is no other child.
 KSTRequirement* nextChild(KSTRequirement* node) {
-    const std::uint32_t count = kst::childCount(node);
+    const std::uint32_t count = wire::childCount(node);
     while (node->state < count) {
-        if (KSTRequirement* child = kst::childAt(node, node->state++)) {
+        if (KSTRequirement* child = wire::childAt(node, node->state++)) {
             return child;
         }
     }
@@ -226,14 +227,14 @@ void DeallocRequirement(KSTRequirement* requirement) noexcept {
     }
     while (node != nullptr) {
         if (KSTRequirement* child = nextChild(node)) {
-            kst::setChildAt(node, node->state - 1, parent);
+            wire::setChildAt(node, node->state - 1, parent);
             parent = node;
             node = child;
             node->state = 0;
         } else {
-            kst::release(node, kst::nodeSize(node));
+            kst::release(node, wire::nodeSize(node));
             node = parent;
-            parent = node != nullptr ? kst::childAt(node, node->state - 1) : nullptr;
+            parent = node != nullptr ? wire::childAt(node, node->state - 1) : nullptr;
         }
     }
 }

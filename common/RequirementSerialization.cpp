@@ -3,7 +3,7 @@
 #include "base/ByteWriter.h"
 #include "common/Failure.h"
 #include "common/LevelStack.h"
-#include "common/RequirementLayout.h"
+#include "wire/RequirementLayout.h"
 
 namespace {
 
@@ -22,8 +22,8 @@ bool nextNode(Levels& levels, const KSTRequirement*& node) {
         Level& level = levels.top();
         if (level.left > 0) {
             --level.left;
-            node = kst::childIn(level.nextSlot);
-            level.nextSlot += kst::kChildSize;
+            node = wire::childIn(level.nextSlot);
+            level.nextSlot += wire::kChildSize;
             return true;
         }
         levels.pop();
@@ -40,8 +40,8 @@ KSTStatus walk(const KSTRequirement* root, Levels& levels, Visit visit) {
     const KSTRequirement* node = root;
     do {
         KSTStatus err = visit(node);
-        const std::uint32_t count = err == kKSTErrorSuccess ? kst::childCount(node) : 0;
-        if (count > 0 && !levels.push({kst::childSlots(node), count})) {
+        const std::uint32_t count = err == kKSTErrorSuccess ? wire::childCount(node) : 0;
+        if (count > 0 && !levels.push({wire::childSlots(node), count})) {
             err = kst::fail(context, "levels", 0, kKSTErrorOutOfMemory);
         }
         if (err != kKSTErrorSuccess) {
@@ -57,15 +57,16 @@ KSTStatus measureNode(const KSTRequirement* node, std::size_t& size) {
     if (node == nullptr) {
         return kst::fail(context, "requirement", 0, kKSTErrorBadParameter);
     }
-    if (!kst::isWireType(node->type)) {
+    if (!wire::isWireType(node->type)) {
         return kst::fail(context, "0", 0, kKSTErrorBadParameter);
     }
-    const kst::CompositeLayout* layout = kst::findCompositeLayout(node->type);
+    const wire::CompositeLayout* layout = wire::findCompositeLayout(node->type);
     if (layout == nullptr) {
-        size += kst::nodeSize(node);
+        size += wire::nodeSize(node);
         return kKSTErrorSuccess;
     }
-    if (kst::nodeSize(node) < kst::compositeSize(*layout, kst::storedChildCount(node, *layout))) {
+    if (wire::nodeSize(node) <
+        wire::compositeSize(*layout, wire::storedChildCount(node, *layout))) {
         return kst::fail(context, "requirement->dataLength + sizeof(KSTRequirement) >= reqSize", 0,
                          kKSTErrorBadParameter);
     }
@@ -81,8 +82,8 @@ KSTStatus measure(const KSTRequirement* requirement, Levels& levels, std::size_t
 /// Writes what stands on the wire for `node` itself. It is what stands in memory before the
 /// pointers to the children.
 KSTStatus writeNode(const KSTRequirement* node, base::ByteWriter& writer) {
-    const kst::CompositeLayout* layout = kst::findCompositeLayout(node->type);
-    const std::size_t size = layout != nullptr ? layout->childrenOffset : kst::nodeSize(node);
+    const wire::CompositeLayout* layout = wire::findCompositeLayout(node->type);
+    const std::size_t size = layout != nullptr ? layout->childrenOffset : wire::nodeSize(node);
     if (!writer.writeBytes(node, size)) {
         return kst::fail(kst::serializationContext(), "reqLen <= *bufferSize", 0,
                          kKSTErrorBadParameter);
@@ -94,10 +95,11 @@ KSTStatus writeNode(const KSTRequirement* node, base::ByteWriter& writer) {
 
 KSTStatus GetSerializedRequirementSize(const KSTRequirement* requirement,
                                        std::size_t* outSize) noexcept {
-    KSTStatus err = kst::serializationContext().requireArguments({
-        kst::Argument(requirement, "requirement"),
-        kst::Argument(outSize, "outSize"),
-    });
+    KSTStatus err = kst::requireArguments(kst::serializationContext(),
+                                          {
+                                              kst::Argument(requirement, "requirement"),
+                                              kst::Argument(outSize, "outSize"),
+                                          });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -113,11 +115,11 @@ KSTStatus GetSerializedRequirementSize(const KSTRequirement* requirement,
 KSTStatus SerializeRequirement(const KSTRequirement* requirement, void* buffer,
                                std::size_t* bufferSize) noexcept {
     const kst::AssertionContext context = kst::serializationContext();
-    KSTStatus err = context.requireArguments({
-        kst::Argument(requirement, "requirement"),
-        kst::Argument(buffer, "buffer"),
-        kst::Argument(bufferSize, "bufferSize"),
-    });
+    KSTStatus err = kst::requireArguments(context, {
+                                                       kst::Argument(requirement, "requirement"),
+                                                       kst::Argument(buffer, "buffer"),
+                                                       kst::Argument(bufferSize, "bufferSize"),
+                                                   });
     if (err != kKSTErrorSuccess) {
         return err;
     }

@@ -72,11 +72,12 @@ KSTStatus GetSerializedVerifyPolicySize(const KSTHandle* handle, const char* pol
                                         const KSTParameter* parameters,
                                         std::uint32_t parametersCount,
                                         std::size_t* outSize) noexcept {
-    KSTStatus err = serializationContext().requireArguments({
-        kst::Argument(handle, "handle"),
-        kst::Argument(policyId, "policyId"),
-        kst::Argument(outSize, "outSize"),
-    });
+    KSTStatus err =
+        kst::requireArguments(serializationContext(), {
+                                                          kst::Argument(handle, "handle"),
+                                                          kst::Argument(policyId, "policyId"),
+                                                          kst::Argument(outSize, "outSize"),
+                                                      });
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -93,10 +94,10 @@ KSTStatus SerializeVerifyPolicy(const KSTHandle* handle, const char* policyId,
                                 const KSTParameter* parameters, std::uint32_t parametersCount,
                                 void* outBuffer, std::size_t* outSize) noexcept {
     const kst::AssertionContext context = serializationContext();
-    KSTStatus err = context.requireArguments({
-        kst::Argument(handle, "handle"),
-        kst::Argument(policyId, "policyId"),
-    });
+    KSTStatus err = kst::requireArguments(context, {
+                                                       kst::Argument(handle, "handle"),
+                                                       kst::Argument(policyId, "policyId"),
+                                                   });
     if (err != kKSTErrorSuccess) {
         return err;
     }

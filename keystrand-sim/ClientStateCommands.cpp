@@ -1,7 +1,7 @@
 #include "base/Concat.h"
-#include "common/CredentialTypes.h"
 #include "keystrand-sim/ControlArguments.h"
 #include "keystrand-sim/ControlCommand.h"
+#include "wire/CredentialFields.h"
 
 #include <algorithm>
 #include <array>
@@ -27,7 +27,7 @@ ControlOutcome contexts(ControlContext& context, ControlArguments& arguments) {
 std::string describe(const CredentialSet::Member& member, Clock::Seconds now) {
     const KSTCredential& credential = *member.credential;
     std::string line = base::concat("credential type ", credential.type, " length ",
-                                    kst::credentialSize(credential.dataLength), " user ");
+                                    wire::credentialSize(credential.dataLength), " user ");
     if (credential.userId == kKSTCredentialNoUser) {
         line += "none";
     } else {

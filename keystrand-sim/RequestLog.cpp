@@ -3,7 +3,7 @@
 #include "KSTLib/Command.h"
 #include "KSTLib/Contexts.h"
 #include "base/ByteReader.h"
-#include "common/CredentialTypes.h"
+#include "wire/CredentialFields.h"
 
 #include <algorithm>
 #include <utility>
@@ -72,8 +72,7 @@ std::optional<Withholding> withholdingFrom(std::uint8_t command,
     base::ByteReader reader(payload);
     std::uint32_t type = 0;
     // Any other number may be a piece of a secret that is out of its place.
-    if (reader.skip(kKSTHandleSize) && reader.readU32(type) &&
-        kst::findCredentialType(type) != nullptr) {
+    if (reader.skip(kKSTHandleSize) && reader.readU32(type) && wire::isCredentialType(type)) {
         withholding.credentialType = static_cast<std::uint8_t>(type);
     }
     return withholding;

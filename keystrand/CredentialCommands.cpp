@@ -1,7 +1,7 @@
 #include "KSTLib/Command.h"
 #include "KSTLib/CredentialSerialization.h"
-#include "common/CredentialTypes.h"
 #include "keystrand/Commands.h"
+#include "wire/CredentialFields.h"
 
 #include <optional>
 #include <utility>
@@ -106,10 +106,6 @@ CommandResult replacePassphrases(KernelState& kernel, Payload payload, Credentia
                : endedWith(place.status);
 }
 
-bool isCredentialType(std::uint32_t type) {
-    return kst::findCredentialType(type) != nullptr;
-}
-
 /// Handle, a type or a purpose, scope.
 struct NumbersPayload {
     explicit NumbersPayload(Payload payload) {
@@ -126,7 +122,7 @@ struct NumbersPayload {
 
 CommandResult removeByType(KernelState& kernel, Payload payload) {
     const NumbersPayload request(payload);
-    if (!isCredentialType(request.number)) {
+    if (!wire::isCredentialType(request.number)) {
         return endedWith(kKernelBadPayload);
     }
     const Place place = findPlace(kernel, request.handle, request.scope);
@@ -152,7 +148,7 @@ Place findAskedPlace(KernelState& kernel, const NumbersPayload& request) {
 
 CommandResult containsType(KernelState& kernel, Payload payload) {
     const NumbersPayload request(payload);
-    if (!isCredentialType(request.number)) {
+    if (!wire::isCredentialType(request.number)) {
         return endedWith(kKernelBadPayload);
     }
     const Place place = findAskedPlace(kernel, request);

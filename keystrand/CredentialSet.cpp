@@ -1,7 +1,7 @@
 #include "keystrand/CredentialSet.h"
 
 #include "base/ByteReader.h"
-#include "common/CredentialTypes.h"
+#include "wire/CredentialFields.h"
 
 #include <algorithm>
 #include <utility>
@@ -38,7 +38,7 @@ auto isEqualTo(const KSTCredential& credential) {
 } // namespace
 
 std::optional<KSTPassphrasePurpose> purposeOf(const KSTCredential& credential) {
-    base::ByteReader reader(kst::credentialData(&credential));
+    base::ByteReader reader(wire::credentialData(&credential));
     KSTPassphrasePurpose purpose = 0;
     if (credential.type != kKSTCredentialTypePassphraseEntered || !reader.readU32(purpose)) {
         return std::nullopt;

@@ -2,8 +2,7 @@
 
 #include "KSTLib/RequirementSerialization.h"
 #include "base/ByteWriter.h"
-#include "common/Allocation.h"
-#include "common/RequirementLayout.h"
+#include "wire/RequirementLayout.h"
 
 #include <algorithm>
 #include <cassert>
@@ -123,11 +122,6 @@ std::vector<const KSTCredential*> whatIsUsedUp(const PolicyRequirement& requirem
 
 namespace {
 
-struct RequirementRelease {
-    void operator()(KSTRequirement* node) const { DeallocRequirement(node); }
-};
-using NodePointer = std::unique_ptr<KSTRequirement, RequirementRelease>;
-
 std::uint32_t typeOf(const PolicyRequirement& requirement) {
     switch (requirement.kind) {
     case PolicyRequirement::Kind::allOf:
@@ -145,22 +139,28 @@ std::uint32_t typeOf(const PolicyRequirement& requirement) {
     return 0;
 }
 
-/// A node whose data are zeros.
-NodePointer makeNode(const Missing& missing, std::size_t dataLength) {
-    void* memory = kst::allocate(sizeof(KSTRequirement) + dataLength);
-    if (memory == nullptr) {
-        throw std::bad_alloc();
+/// Requirements that go together.
+class Nodes {
+  public:
+    /// A node whose data are zeros.
+    KSTRequirement* make(const Missing& missing, std::size_t dataLength) {
+        constexpr std::size_t kWord = sizeof(std::uint64_t);
+        auto& memory = memory_.emplace_back(std::make_unique<std::uint64_t[]>(
+            (sizeof(KSTRequirement) + dataLength + kWord - 1) / kWord));
+        return new (memory.get()) KSTRequirement{
+            .type = typeOf(*missing.requirement),
+            .state = static_cast<std::uint32_t>(missing.state),
+            .priority = missing.requirement->priority,
+            .dataLength = static_cast<std::uint32_t>(dataLength),
+        };
     }
-    return NodePointer(new (memory) KSTRequirement{
-        .type = typeOf(*missing.requirement),
-        .state = static_cast<std::uint32_t>(missing.state),
-        .priority = missing.requirement->priority,
-        .dataLength = static_cast<std::uint32_t>(dataLength),
-    });
-}
 
-base::ByteWriter dataOf(const NodePointer& node) {
-    return {reinterpret_cast<std::uint8_t*>(node.get() + 1), node->dataLength};
+  private:
+    std::vector<std::unique_ptr<std::uint64_t[]>> memory_;
+};
+
+base::ByteWriter dataOf(KSTRequirement* node) {
+    return {reinterpret_cast<std::uint8_t*>(node + 1), node->dataLength};
 }
 
 /// The first number of a leaf's data.
@@ -174,9 +174,9 @@ bool beginsWithNumber(const PolicyRequirement& leaf) {
     return leaf.type->requirement <= kKSTRequirementTypeBiometryMatched;
 }
 
-NodePointer buildLeaf(const Missing& missing) {
+KSTRequirement* buildLeaf(const Missing& missing, Nodes& nodes) {
     const PolicyRequirement& leaf = *missing.requirement;
-    NodePointer node = makeNode(missing, leaf.type->dataSize);
+    KSTRequirement* const node = nodes.make(missing, leaf.type->dataSize);
     if (beginsWithNumber(leaf)) {
         [[maybe_unused]] const bool fits = dataOf(node).writeU32(leafNumber(leaf));
         assert(fits);
@@ -184,21 +184,21 @@ NodePointer buildLeaf(const Missing& missing) {
     return node;
 }
 
-NodePointer build(const Missing& missing) {
+KSTRequirement* build(const Missing& missing, Nodes& nodes) {
     if (missing.requirement->kind == PolicyRequirement::Kind::leaf) {
-        return buildLeaf(missing);
+        return buildLeaf(missing, nodes);
     }
     const auto count = static_cast<std::uint32_t>(missing.children.size());
-    const auto& layout = *kst::findCompositeLayout(typeOf(*missing.requirement));
-    NodePointer node =
-        makeNode(missing, kst::compositeSize(layout, count) - sizeof(KSTRequirement));
+    const auto& layout = *wire::findCompositeLayout(typeOf(*missing.requirement));
+    KSTRequirement* const node =
+        nodes.make(missing, wire::compositeSize(layout, count) - sizeof(KSTRequirement));
     base::ByteWriter writer = dataOf(node);
     [[maybe_unused]] const bool fits =
         (node->type != kKSTRequirementTypeKofN || writer.writeU32(missing.needed)) &&
         writer.writeU32(count);
     assert(fits);
     for (std::uint32_t i = 0; i < count; ++i) {
-        kst::setChildAt(node.get(), i, build(missing.children[i]).release());
+        wire::setChildAt(node, i, build(missing.children[i], nodes));
     }
     return node;
 }
@@ -206,12 +206,13 @@ NodePointer build(const Missing& missing) {
 } // namespace
 
 std::vector<std::uint8_t> encodeMissing(const Missing& missing) {
-    const NodePointer root = build(missing);
+    Nodes nodes;
+    const KSTRequirement* const root = build(missing, nodes);
     std::size_t size = 0;
-    [[maybe_unused]] KSTStatus status = GetSerializedRequirementSize(root.get(), &size);
+    [[maybe_unused]] KSTStatus status = GetSerializedRequirementSize(root, &size);
     assert(status == kKSTErrorSuccess);
     std::vector<std::uint8_t> bytes(size);
-    status = SerializeRequirement(root.get(), bytes.data(), &size);
+    status = SerializeRequirement(root, bytes.data(), &size);
     assert(status == kKSTErrorSuccess && size == bytes.size());
     return bytes;
 }

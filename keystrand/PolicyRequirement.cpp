@@ -4,7 +4,7 @@
 #include "KSTLib/Requirement.h"
 #include "base/Concat.h"
 #include "base/Digits.h"
-#include "common/RequirementLayout.h"
+#include "wire/RequirementLayout.h"
 
 #include <algorithm>
 #include <array>
@@ -101,8 +101,8 @@ std::size_t wireSize(const PolicyRequirement& requirement) {
         return sizeof(KSTRequirement) + requirement.type->dataSize;
     }
     std::size_t size = requirement.kind == PolicyRequirement::Kind::someOf
-                           ? kst::kKofNLayout.childrenOffset
-                           : kst::kListLayout.childrenOffset;
+                           ? wire::kKofNLayout.childrenOffset
+                           : wire::kListLayout.childrenOffset;
     for (const PolicyRequirement& child : requirement.children) {
         size += wireSize(child);
     }

@@ -14,12 +14,12 @@ KSTService::KSTPropertyWithName(std::string_view propertyName) {
     if (entry == platform::kNoService) {
         // The line of a failed check is written by code that knows no classes.
         ClassifyingLog log(host_.log, platform::message::kKernelServiceFailed);
-        kst::fail({&log, kTag, kSource}, "entry", 0, kKSTErrorUnexpected);
+        platform::fail({&log, kTag, kSource}, "entry", 0, kKSTErrorUnexpected);
         return std::nullopt;
     }
     auto result = host_.registry.copyProperty(entry, propertyName);
     if (!result) {
-        kst::fail({&host_.log, kTag, kSource}, "result", 0, kKSTErrorUnexpected);
+        platform::fail({&host_.log, kTag, kSource}, "result", 0, kKSTErrorUnexpected);
     }
     host_.registry.release(entry);
     return result;

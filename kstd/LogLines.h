@@ -1,7 +1,7 @@
 #pragma once
 
 #include "base/Concat.h"
-#include "common/Failure.h"
+#include "platform/FailedCheck.h"
 #include "platform/SystemLog.h"
 
 #include <cstddef>

@@ -105,6 +105,10 @@ inline constexpr std::span<const CredentialField> kCredentialFields = credential
     return nullptr;
 }
 
+[[nodiscard]] constexpr bool isCredentialType(std::uint32_t type) noexcept {
+    return type >= 1 && type <= kKSTCredentialTypeMax;
+}
+
 /// The bytes of a credential whose data area has `dataLength` bytes.
 [[nodiscard]] constexpr std::size_t credentialSize(std::uint32_t dataLength) noexcept {
     return sizeof(KSTCredential) + dataLength;

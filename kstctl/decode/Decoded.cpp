@@ -1,7 +1,7 @@
 #include "kstctl/decode/Decoded.h"
 
+#include "KSTLib/Platform.h"
 #include "base/Concat.h"
-#include "common/LibraryLog.h"
 #include "kstctl/RecordingLog.h"
 
 namespace kstctl::decode {
@@ -26,9 +26,9 @@ std::string_view conditionIn(std::string_view line) {
 std::optional<platform::Error> refusalOf(std::string_view what,
                                          const std::function<KSTStatus()>& deserialise) {
     RecordingLog log;
-    kst::setLibraryLog(&log);
+    kst::installLog(&log);
     const KSTStatus status = deserialise();
-    kst::setLibraryLog(nullptr);
+    kst::installLog(nullptr);
     if (status == kKSTErrorSuccess) {
         return std::nullopt;
     }

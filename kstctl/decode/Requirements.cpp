@@ -1,9 +1,9 @@
 #include "KSTLib/CredentialSerialization.h"
 #include "KSTLib/RequirementSerialization.h"
 #include "base/Concat.h"
-#include "common/RequirementLayout.h"
 #include "kstctl/decode/Decoded.h"
 #include "kstctl/decode/Decoders.h"
+#include "wire/RequirementLayout.h"
 
 #include <cstring>
 
@@ -36,8 +36,8 @@ const char* requirementTypeText(std::uint32_t type) {
 }
 
 void addProperties(Report& report, const KSTRequirement& node) {
-    for (const kst::RequirementProperty& property : kst::requirementProperties()) {
-        if (property.type == kst::RequirementProperty::kEveryType || !property.belongsTo(&node) ||
+    for (const wire::RequirementProperty& property : wire::requirementProperties()) {
+        if (property.type == wire::RequirementProperty::kEveryType || !property.belongsTo(&node) ||
             !property.fitsIn(&node)) {
             continue;
         }
@@ -59,7 +59,7 @@ Report fieldsAtDepth(const KSTRequirement& node, std::size_t depth) {
         .add("priority", node.priority)
         .add("dataLength", node.dataLength);
     addProperties(report, node);
-    if (kst::findCompositeLayout(node.type) == nullptr) {
+    if (wire::findCompositeLayout(node.type) == nullptr) {
         const auto* const data = reinterpret_cast<const std::uint8_t*>(&node) + sizeof node;
         report.add("data", hexText({data, node.dataLength}));
         return report;
@@ -69,8 +69,8 @@ Report fieldsAtDepth(const KSTRequirement& node, std::size_t depth) {
         return report;
     }
     Data children;
-    for (std::uint32_t i = 0; i < kst::childCount(&node); ++i) {
-        children.emplace_back(fieldsAtDepth(*kst::childAt(&node, i), depth + 1));
+    for (std::uint32_t i = 0; i < wire::childCount(&node); ++i) {
+        children.emplace_back(fieldsAtDepth(*wire::childAt(&node, i), depth + 1));
     }
     report.add("children", std::move(children));
     return report;

@@ -1,11 +1,11 @@
 #include "base/Concat.h"
-#include "common/Failure.h"
 #include "kstd/Analytics/KSTDAnalyticsLogger.h"
 #include "kstd/Analytics/ServerDocuments.h"
 #include "kstd/Analytics/TQAnalyticsLoggerSQLiteStore.h"
 #include "kstd/Analytics/UploadDocument.h"
 #include "kstd/LogLines.h"
 #include "platform/Clock.h"
+#include "platform/FailedCheck.h"
 #include "platform/HTTPSession.h"
 #include "platform/JSON.h"
 #include "platform/MessageClasses.h"
@@ -256,7 +256,7 @@ void KSTDAnalyticsLogger::didReceiveChallenge(const platform::AuthenticationChal
                                               const platform::ChallengeCompletion& completion) {
     using enum platform::ChallengeDisposition;
     if (!completion) {
-        kst::stop({&host_.log, kTag, "kstd/Analytics/KSTDAnalyticsLogger"}, "completion");
+        platform::stop({&host_.log, kTag, "kstd/Analytics/KSTDAnalyticsLogger"}, "completion");
     }
     host_.log.write(platform::LogLevel::info, "Splunk upload challenge",
                     {.messageId = platform::message::kServerChallenge});

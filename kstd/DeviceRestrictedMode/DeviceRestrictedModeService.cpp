@@ -2,7 +2,6 @@
 
 #include "KSTLib/KSTLib.h"
 #include "base/Saturate.h"
-#include "common/Allocation.h"
 #include "kstd/Analytics/Analytics.h"
 #include "kstd/LogLines.h"
 #include "platform/EventStream.h"
@@ -56,20 +55,20 @@ constexpr unsigned kOwnerReadWrite = 0600;
 /// Writes the blob through a stream of the file and syncs and closes it. A failure has written its
 /// assertion line.
 bool writeBlob(platform::Files& files, const platform::OpenFile& opened,
-               std::span<const std::uint8_t> data, const kst::AssertionContext& assertions) {
+               std::span<const std::uint8_t> data, const platform::AssertionContext& assertions) {
     const auto file = files.attachStream(opened);
     if (!file) {
         // The descriptor stays open: only streams are closed here.
-        kst::fail(assertions, "file", 0, kKSTErrorUnexpected);
+        platform::fail(assertions, "file", 0, kKSTErrorUnexpected);
         return false;
     }
     bool failed = true;
     if (file->write(data.data(), 1, data.size()) != data.size()) {
-        kst::fail(assertions, "written == data.length", 0, kKSTErrorUnexpected);
+        platform::fail(assertions, "written == data.length", 0, kKSTErrorUnexpected);
     } else if (const int syncError = file->fullSync(); syncError != 0) {
-        kst::fail(assertions, "ferr == 0 ", syncError, kKSTErrorUnexpected);
+        platform::fail(assertions, "ferr == 0 ", syncError, kKSTErrorUnexpected);
     } else if (const int closeError = file->close(); closeError != 0) {
-        kst::fail(assertions, "ferr == 0 ", closeError, kKSTErrorUnexpected);
+        platform::fail(assertions, "ferr == 0 ", closeError, kKSTErrorUnexpected);
     } else {
         failed = false;
     }
@@ -138,7 +137,7 @@ std::string DeviceRestrictedModeService::description() const {
     return "<DeviceRestrictedModeService>";
 }
 
-kst::AssertionContext DeviceRestrictedModeService::assertions() const {
+platform::AssertionContext DeviceRestrictedModeService::assertions() const {
     return {&host().log, kTag, "kstd/DeviceRestrictedMode/DeviceRestrictedModeService"};
 }
 
@@ -164,7 +163,7 @@ KSTStatus DeviceRestrictedModeService::notifyDaemonStarted() {
     if (status == kKSTErrorSuccess) {
         return kKSTErrorSuccess;
     }
-    kst::failCall(assertions(), status);
+    platform::failCall(assertions(), status);
     logLineOfClass(host().log, platform::message::kKernelSideNotTold, kNotifyDaemonStarted,
                    "returning, err = ", KSTStatus{kKSTErrorUnexpected}, ".");
     return kKSTErrorUnexpected;
@@ -226,7 +225,7 @@ KSTStatus DeviceRestrictedModeService::onQuorvaneChanged() {
     if (status == kKSTErrorSuccess) {
         return kKSTErrorSuccess;
     }
-    kst::failCall(assertions(), status);
+    platform::failCall(assertions(), status);
     logLineOfClass(host().log, platform::message::kKernelSideNotTold, kOnQuorvaneChanged,
                    "returning, err = ", KSTStatus{kKSTErrorUnexpected}, ".");
     return kKSTErrorUnexpected;
@@ -243,8 +242,8 @@ void DeviceRestrictedModeService::onKextNotificationArrivedWithPropertyName(
     const auto notification = KSTDRMDeamonNotification::fromBytes(*propertyData);
     KSTStatus status = kKSTErrorUnexpected;
     if (!notification) {
-        kst::fail(assertions(), "propertyData.length == sizeof(KSTDRMDeamonNotification)", 0,
-                  status);
+        platform::fail(assertions(), "propertyData.length == sizeof(KSTDRMDeamonNotification)", 0,
+                       status);
     } else {
         logLine(host().log, kOnKextNotificationArrived, "XXX Daemon: PROCESSING ", propertyName,
                 ".");
@@ -275,9 +274,9 @@ KSTStatus DeviceRestrictedModeService::dispatch(const KSTDRMDeamonNotification& 
         status = onKextTimerRestartedAnalyticsCollected(notification);
         break;
     default:
-        return kst::fail(assertions(), "0", 0, kKSTErrorBadParameter);
+        return platform::fail(assertions(), "0", 0, kKSTErrorBadParameter);
     }
-    return status == kKSTErrorSuccess ? status : kst::failCall(assertions(), status);
+    return status == kKSTErrorSuccess ? status : platform::failCall(assertions(), status);
 }
 
 KSTStatus
@@ -291,7 +290,7 @@ DeviceRestrictedModeService::sendNotificationACKWithPropertyName(std::string_vie
     if (status == kKSTErrorSuccess) {
         return kKSTErrorSuccess;
     }
-    kst::failCall(assertions(), status);
+    platform::failCall(assertions(), status);
     logLine(host().log, kSendNotificationACK, "returning, err = ", KSTStatus{kKSTErrorUnexpected},
             ".");
     return kKSTErrorUnexpected;
@@ -305,7 +304,7 @@ KSTStatus DeviceRestrictedModeService::saveDataBlob(const std::string& path,
     const platform::OpenFile opened = host().files.openForWriting(
         path, platform::ProtectionClass::none, platform::kNoClassOptions, kOwnerReadWrite);
     if (opened.descriptor < 0) {
-        kst::fail(assertions(), "fd >= 0", 0, kKSTErrorUnexpected);
+        platform::fail(assertions(), "fd >= 0", 0, kKSTErrorUnexpected);
     } else if (writeBlob(host().files, opened, data, assertions())) {
         return kKSTErrorSuccess;
     }
@@ -341,16 +340,16 @@ DeviceRestrictedModeService::onKextTimerRestarted(const KSTDRMDeamonNotification
 }
 
 KSTStatus DeviceRestrictedModeService::saveStateBlob(const KSTDRMDeamonNotification& notification) {
-    // Through the library's allocator, which wipes it; and so its end of memory is a failure with a
-    // line, not an exception.
-    const kst::AllocatedMemory stateBlob(kStateBlobSize);
-    if (stateBlob.bytes() == nullptr) {
-        return kst::fail(assertions(), "stateBlob", 0, kKSTErrorUnexpected);
+    // So that the end of memory is a failure with a line, not an exception.
+    const std::unique_ptr<std::uint8_t[]> stateBlob(new (std::nothrow)
+                                                        std::uint8_t[kStateBlobSize]);
+    if (stateBlob == nullptr) {
+        return platform::fail(assertions(), "stateBlob", 0, kKSTErrorUnexpected);
     }
     const auto record = notification.stateBlob();
-    std::copy(record.begin(), record.end(), stateBlob.bytes());
-    const KSTStatus status = saveDataBlob(kStateFilePath, {stateBlob.bytes(), stateBlob.size()});
-    return status == kKSTErrorSuccess ? status : kst::failCall(assertions(), status);
+    std::copy(record.begin(), record.end(), stateBlob.get());
+    const KSTStatus status = saveDataBlob(kStateFilePath, {stateBlob.get(), kStateBlobSize});
+    return status == kKSTErrorSuccess ? status : platform::failCall(assertions(), status);
 }
 
 KSTStatus DeviceRestrictedModeService::onKextAnalyticsCollected(
@@ -367,7 +366,7 @@ DeviceRestrictedModeService::onKextSaveAnalytics(const KSTDRMDeamonNotification&
     logLine(host().log, kOnKextSaveAnalytics, "called, .");
     const KSTStatus status = saveDataBlob(kAnalyticsFilePath, notification.analyticsBlob());
     if (status != kKSTErrorSuccess) {
-        kst::failCall(assertions(), status);
+        platform::failCall(assertions(), status);
         logLine(host().log, kOnKextSaveAnalytics, "returning, err = ", status, ".");
     }
     return status;

@@ -1,9 +1,9 @@
 #pragma once
 
 #include "KSTLib/Status.h"
-#include "common/Failure.h"
 #include "kstd/DeviceRestrictedMode/KSTDRMDeamonNotification.h"
 #include "kstd/KSTService.h"
+#include "platform/FailedCheck.h"
 
 #include <cstdint>
 #include <memory>
@@ -97,7 +97,7 @@ class DeviceRestrictedModeService final
     KSTStatus dispatch(const KSTDRMDeamonNotification& notification);
     KSTStatus saveStateBlob(const KSTDRMDeamonNotification& notification);
 
-    [[nodiscard]] kst::AssertionContext assertions() const;
+    [[nodiscard]] platform::AssertionContext assertions() const;
 };
 
 } // namespace kstd

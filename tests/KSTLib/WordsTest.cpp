@@ -2,8 +2,8 @@
 
 #include "KSTLib/RequestSerialization.h"
 #include "common/CredentialTypes.h"
-#include "common/RequirementLayout.h"
 #include "tests/KSTLib/InterfaceInC.h"
+#include "wire/RequirementLayout.h"
 
 #include <gtest/gtest.h>
 
@@ -130,7 +130,7 @@ TEST(Words, ThePropertiesOfCredentialsAreTheLibrarys) {
 
 TEST(Words, ThePropertiesOfRequirementsAreTheLibrarys) {
     std::set<std::uint32_t> known;
-    for (const kst::RequirementProperty& property : kst::requirementProperties()) {
+    for (const wire::RequirementProperty& property : wire::requirementProperties()) {
         known.insert(property.id);
     }
     ASSERT_EQ(known.size(), 10U);
@@ -147,7 +147,7 @@ TEST(Words, TwoHundredIsTwoThings) {
 TEST(Words, TheTypesOfRequirementsAreThoseOnTheWire) {
     std::set<std::uint32_t> known = {kKSTRequirementTypeInMemory};
     for (std::uint32_t type = 0; type <= kHighestNumber; ++type) {
-        if (kst::isWireType(type)) {
+        if (wire::isWireType(type)) {
             known.insert(type);
         }
     }

@@ -172,13 +172,17 @@ std::vector<std::size_t> sharedLines(std::vector<std::size_t> lines) {
 const std::map<std::string, std::string>& sources() {
     static const std::map<std::string, std::string> read = [] {
         std::map<std::string, std::string> sources;
+        const auto add = [&sources](const fs::path& path) {
+            std::stringstream text;
+            text << std::ifstream(path).rdbuf();
+            sources.emplace(fs::relative(path, SOURCE_ROOT), codeOf(text.str()));
+        };
+        const fs::path root(SOURCE_ROOT);
+        add(root / "platform/FailedCheck.h");
         for (const char* const room : {"common", "KSTLib", "kstd"}) {
-            for (const auto& entry :
-                 fs::recursive_directory_iterator(fs::path(SOURCE_ROOT) / room)) {
+            for (const auto& entry : fs::recursive_directory_iterator(root / room)) {
                 if (entry.path().extension() == ".cpp" || entry.path().extension() == ".h") {
-                    std::stringstream text;
-                    text << std::ifstream(entry.path()).rdbuf();
-                    sources.emplace(fs::relative(entry.path(), SOURCE_ROOT), codeOf(text.str()));
+                    add(entry.path());
                 }
             }
         }

@@ -207,6 +207,10 @@ TEST(IncludeRulesTest, RulesRefuseWhatTheyShould) {
     EXPECT_FALSE(isAllowed({"KSTLib/KSTLib.h", "KSTLib/Channel.h"}));
     EXPECT_FALSE(isAllowed({"KSTLib/KSTLib.h", "common/Allocation.h"}));
     EXPECT_TRUE(isAllowed({"common/LibCall.cpp", "KSTLib/Status.h"}));
+    for (const char* const outside : {"kstd/KSTService.cpp", "kstctl/Report.cpp", "tools/dev.cpp",
+                                      "keystrand/Evaluation.cpp", "keystrand-sim/RequestLog.cpp"}) {
+        EXPECT_FALSE(isAllowed({outside, "common/Failure.h"})) << outside;
+    }
     EXPECT_FALSE(isAllowed({"kstd/Analytics/KSTDAnalyticsLoggerUpload.cpp", "KSTLib/Channel.h"}));
     EXPECT_FALSE(isAllowed({"kstd/Analytics/SQLite/KSTDSQLite.cpp", "kstd/Analytics/Analytics.h"}));
     EXPECT_FALSE(isAllowed({"fuzz/fuzz_json.cpp", "platform/linux/Paths.h"}));

@@ -1,13 +1,14 @@
 // What the daemon does on the real host when memory ends while it handles a record. The program's
 // operator new is told to fail, so this is a program of its own.
 
-#include "common/Allocation.h"
 #include "kstd/DeviceRestrictedMode/DeviceRestrictedModeService.h"
 #include "platform/linux/LinuxHost.h"
+#include "tests/kstd/DaemonFixture.h"
 #include "tests/platform/linux/RootDirectory.h"
 #include "tests/platform/linux/StandardErrorCapture.h"
 #include "wire/RestrictedMode.h"
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <cstdlib>
@@ -19,23 +20,24 @@ namespace {
 
 bool thereIsMemory = true;
 
-/// Refuses the library's allocations, and with the first of them there is no memory any more.
-class EndOfMemory final : public kst::AllocationGate {
+/// Whether the next allocation that may fail without an exception fails.
+bool refusesNext = false;
+/// Whether there is no memory from that one on.
+bool lasts = false;
+
+/// Memory ends with the next allocation that may fail without an exception.
+class EndOfMemory {
   public:
-    EndOfMemory() : former_(kst::setAllocationGate(this)) {}
-    ~EndOfMemory() override {
+    explicit EndOfMemory(bool forGood) {
+        refusesNext = true;
+        lasts = forGood;
+    }
+    ~EndOfMemory() {
         thereIsMemory = true;
-        kst::setAllocationGate(former_);
+        refusesNext = false;
     }
-
-    [[nodiscard]] bool admits(std::size_t /*size*/) override {
-        thereIsMemory = false;
-        return false;
-    }
-    void aboutToFree(std::span<const std::uint8_t> /*wiped*/) override {}
-
-  private:
-    kst::AllocationGate* former_;
+    EndOfMemory(const EndOfMemory&) = delete;
+    EndOfMemory& operator=(const EndOfMemory&) = delete;
 };
 
 } // namespace
@@ -45,6 +47,27 @@ void* operator new(std::size_t size) {
         return memory;
     }
     throw std::bad_alloc();
+}
+
+void* operator new[](std::size_t size, const std::nothrow_t& /*unused*/) noexcept {
+    if (refusesNext) {
+        refusesNext = false;
+        thereIsMemory = !lasts;
+        return nullptr;
+    }
+    return thereIsMemory ? std::malloc(size == 0 ? 1 : size) : nullptr;
+}
+
+void operator delete[](void* memory) noexcept {
+    std::free(memory);
+}
+
+void operator delete[](void* memory, std::size_t /*size*/) noexcept {
+    std::free(memory);
+}
+
+void* operator new[](std::size_t size) {
+    return operator new(size);
 }
 
 void operator delete(void* memory) noexcept {
@@ -69,7 +92,7 @@ TEST(NoMemory, RecordThatCannotBeCopiedIsAFailureWithItsLines) {
     support::StandardErrorCapture shown;
     KSTStatus status = 0;
     {
-        const EndOfMemory end;
+        const EndOfMemory end(true);
         status = service->onKextTimerRestarted(*notification);
         EXPECT_FALSE(thereIsMemory);
     }
@@ -83,3 +106,30 @@ TEST(NoMemory, RecordThatCannotBeCopiedIsAFailureWithItsLines) {
         << lines;
     EXPECT_FALSE(std::filesystem::exists(root.paths().under("/var/root/.usbrestrictedmode_v2")));
 }
+
+namespace kstd {
+
+using NoMemoryOnFakes = DaemonFixture;
+
+TEST_F(NoMemoryOnFakes, NoMemoryForTheStateBlobIsAFailureOfItsOwn) {
+    const auto service = makeService();
+    putRecord("P", timerRecord(0));
+    {
+        const EndOfMemory end(false);
+        service->onKextNotificationArrivedWithPropertyName("P");
+        EXPECT_FALSE(refusesNext);
+    }
+    EXPECT_EQ(machine.disk.read(kStatePath), std::nullopt);
+    EXPECT_THAT(requests(), testing::IsEmpty());
+    const auto all = lines();
+    EXPECT_THAT(
+        std::vector<std::string>(all.end() - 4, all.end()),
+        testing::ElementsAre(assertion("stateBlob", "0"),
+                             "kstd: -[DeviceRestrictedModeService onKextTimerRestarted:]: "
+                             "returning, err = -5.",
+                             assertion("err == 0 ", "fffffffffffffffb"),
+                             "kstd: -[DeviceRestrictedModeService "
+                             "onKextNotificationArrivedWithPropertyName:]: returning, err = -5."));
+}
+
+} // namespace kstd

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "KSTLib/AllocatedBytes.h"
-#include "common/LibraryLog.h"
+#include "common/Failure.h"
 #include "tests/support/AssertionLines.h"
 #include "tests/support/RecordingLog.h"
 #include "tests/support/StandardOutputCapture.h"

@@ -2,11 +2,11 @@
 
 #include "base/Concat.h"
 #include "base/Saturate.h"
-#include "common/Failure.h"
 #include "kstd/Analytics/SQLite/DatabaseFile.h"
 #include "kstd/Analytics/SQLite/DatabaseTexts.h"
 #include "kstd/Analytics/SQLite/StatementRows.h"
 #include "kstd/LogLines.h"
+#include "platform/FailedCheck.h"
 #include "platform/MessageClasses.h"
 
 #include <array>
@@ -44,7 +44,8 @@ std::string_view synchronousModeName(std::int64_t mode, platform::SystemLog& log
     case 2:
         return "full";
     default:
-        kst::stop({&log, kTag, "kstd/Analytics/SQLite/KSTDSQLite"}, "Unknown synchronous mode");
+        platform::stop({&log, kTag, "kstd/Analytics/SQLite/KSTDSQLite"},
+                       "Unknown synchronous mode");
     }
 }
 

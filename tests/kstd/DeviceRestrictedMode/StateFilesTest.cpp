@@ -1,4 +1,3 @@
-#include "common/Allocation.h"
 #include "tests/kstd/DaemonFixture.h"
 
 #include <gmock/gmock.h>
@@ -191,31 +190,6 @@ INSTANTIATE_TEST_SUITE_P(Failures, FailedStateSaveTest,
                                                      failures.close = EIO;
                                                  }}),
                          [](const auto& test) { return std::string(test.param.name); });
-
-/// Refuses every allocation.
-class ClosedGate final : public kst::AllocationGate {
-  public:
-    [[nodiscard]] bool admits(std::size_t /*size*/) override { return false; }
-    void aboutToFree(std::span<const std::uint8_t> /*wiped*/) override {}
-};
-
-TEST_F(StateFilesTest, NoMemoryForTheStateBlobIsAFailureOfItsOwn) {
-    ClosedGate gate;
-    auto* const before = kst::setAllocationGate(&gate);
-    putRecord("P", timerRecord(0));
-    service->onKextNotificationArrivedWithPropertyName("P");
-    kst::setAllocationGate(before);
-    EXPECT_EQ(machine.disk.read(kStatePath), std::nullopt);
-    EXPECT_THAT(requests(), IsEmpty());
-    const auto all = lines();
-    EXPECT_THAT(std::vector<std::string>(all.end() - 4, all.end()),
-                ElementsAre(assertion("stateBlob", "0"),
-                            "kstd: -[DeviceRestrictedModeService onKextTimerRestarted:]: "
-                            "returning, err = -5.",
-                            assertion("err == 0 ", "fffffffffffffffb"),
-                            "kstd: -[DeviceRestrictedModeService "
-                            "onKextNotificationArrivedWithPropertyName:]: returning, err = -5."));
-}
 
 } // namespace
 } // namespace kstd

@@ -1,8 +1,8 @@
-#include "common/RequirementLayout.h"
+#include "wire/RequirementLayout.h"
 
 #include <array>
 
-namespace kst {
+namespace wire {
 
 namespace {
 
@@ -35,4 +35,4 @@ std::span<const RequirementProperty> requirementProperties() noexcept {
     return kProperties;
 }
 
-} // namespace kst
+} // namespace wire

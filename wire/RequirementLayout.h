@@ -9,7 +9,7 @@
 #include <span>
 
 /// Where the parts of a requirement are in memory. All offsets are from the start of its header.
-namespace kst {
+namespace wire {
 
 /// What a slot for a child takes, aligned or not.
 inline constexpr std::size_t kChildSize = sizeof(KSTRequirement*);
@@ -141,4 +141,4 @@ struct RequirementProperty {
 /// several times.
 [[nodiscard]] std::span<const RequirementProperty> requirementProperties() noexcept;
 
-} // namespace kst
+} // namespace wire
