@@ -2,7 +2,7 @@
 
 #include "base/NotCopied.h"
 #include "keystrand-linux/GatePolicy.h"
-#include "keystrand/Clock.h"
+#include "keystrand/ModelClock.h"
 
 #include <algorithm>
 #include <cstdint>
@@ -22,7 +22,7 @@ class MachineClock : private base::NotCopied {
 
 /// The model's clock: the date at which it began, counted on by the time since the machine's start,
 /// so that nobody shortens the period by setting the date.
-class CountedClock : public Clock {
+class CountedClock : public ModelClock {
   public:
     /// The machine's clock outlives it.
     explicit CountedClock(const MachineClock& machine) : machine_(machine), offset_(offsetNow()) {}

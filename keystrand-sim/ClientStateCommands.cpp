@@ -24,7 +24,7 @@ ControlOutcome contexts(ControlContext& context, ControlArguments& arguments) {
     return outcome;
 }
 
-std::string describe(const CredentialSet::Member& member, Clock::Seconds now) {
+std::string describe(const CredentialSet::Member& member, ModelClock::Seconds now) {
     const KSTCredential& credential = *member.credential;
     std::string line = base::concat("credential type ", credential.type, " length ",
                                     wire::credentialSize(credential.dataLength), " user ");
@@ -36,7 +36,7 @@ std::string describe(const CredentialSet::Member& member, Clock::Seconds now) {
     return base::concat(line, " age ", now - std::min(member.addedAt, now));
 }
 
-ControlOutcome list(const CredentialSet& credentials, Clock::Seconds now) {
+ControlOutcome list(const CredentialSet& credentials, ModelClock::Seconds now) {
     ControlOutcome outcome;
     for (const auto& member : credentials.members()) {
         outcome.lines.push_back(describe(member, now));
@@ -46,7 +46,7 @@ ControlOutcome list(const CredentialSet& credentials, Clock::Seconds now) {
 
 /// Of a context, or the global ones.
 ControlOutcome credentials(ControlContext& context, ControlArguments& arguments) {
-    const Clock::Seconds now = context.clock.now();
+    const ModelClock::Seconds now = context.clock.now();
     if (!arguments.hasWord()) {
         const auto problem = arguments.problem();
         return problem ? ControlOutcome::failed(*problem)

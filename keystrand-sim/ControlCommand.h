@@ -3,10 +3,10 @@
 #include "keystrand-sim/ControlArguments.h"
 #include "keystrand-sim/FaultScript.h"
 #include "keystrand-sim/RequestLog.h"
-#include "keystrand/Clock.h"
 #include "keystrand/Commands.h"
 #include "keystrand/EventSender.h"
 #include "keystrand/KernelSocketServer.h"
+#include "keystrand/ModelClock.h"
 #include "keystrand/NotificationPublisher.h"
 #include "keystrand/RestrictedModeController.h"
 
@@ -21,12 +21,12 @@
 namespace keystrand::sim {
 
 /// The system's clock, until it is set by hand: then it stands still where it was set.
-class ManualClock final : public SystemClock {
+class ManualClock final : public DateClock {
   public:
     explicit ManualClock(std::optional<Seconds> manual) : manual_(manual) {}
 
     [[nodiscard]] bool isManual() const { return manual_.has_value(); }
-    [[nodiscard]] Seconds now() const override { return manual_ ? *manual_ : SystemClock::now(); }
+    [[nodiscard]] Seconds now() const override { return manual_ ? *manual_ : DateClock::now(); }
     void set(Seconds time) { manual_ = time; }
     void setReal() { manual_.reset(); }
 

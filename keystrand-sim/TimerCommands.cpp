@@ -49,14 +49,14 @@ ControlOutcome clockReal(ControlContext& context, ControlArguments& arguments) {
     });
 }
 
-void moveClock(ControlContext& context, Clock::Seconds time) {
+void moveClock(ControlContext& context, ModelClock::Seconds time) {
     context.clock.set(time);
     context.restrictedMode.catchUp();
 }
 
 ControlOutcome clockSet(ControlContext& context, ControlArguments& arguments) {
     const auto time =
-        arguments.numberWord<Clock::Seconds>("time", 1, RestrictedModeTimer::kLatestTime);
+        arguments.numberWord<ModelClock::Seconds>("time", 1, RestrictedModeTimer::kLatestTime);
     return actUnlessProblem(arguments, [&] { moveClock(context, time); });
 }
 
@@ -65,7 +65,7 @@ ControlOutcome clockAdvance(ControlContext& context, ControlArguments& arguments
     if (!clock.isManual()) {
         return ControlOutcome::failed("the clock is the real one");
     }
-    const auto seconds = arguments.numberWord<Clock::Seconds>(
+    const auto seconds = arguments.numberWord<ModelClock::Seconds>(
         "seconds", 0, RestrictedModeTimer::kLatestTime - clock.now());
     return actUnlessProblem(arguments, [&] { moveClock(context, clock.now() + seconds); });
 }
@@ -77,7 +77,7 @@ const char* onOff(bool value) {
 std::vector<std::string> timerStatus(const RestrictedModeController& controller,
                                      const ManualClock& clock) {
     const RestrictedModeTimer& timer = controller.timer();
-    const Clock::Seconds now = clock.now();
+    const ModelClock::Seconds now = clock.now();
     const TimerRestarted record = timer.timerRestarted();
     const AnalyticsCollected analytics = timer.analyticsCollected(now);
     return {concat("clock ", clock.isManual() ? "manual" : "real"),

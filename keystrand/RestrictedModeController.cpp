@@ -24,7 +24,7 @@ void call(const Hook& hook, const Arguments&... arguments) {
 } // namespace
 
 RestrictedModeController::RestrictedModeController(RestrictedModeTimer::Periods periods,
-                                                   const Clock& clock, Registry& registry,
+                                                   const ModelClock& clock, Registry& registry,
                                                    NotificationPublisher& publisher)
     : clock_(clock), timer_(periods, clock.now()), registry_(registry), publisher_(publisher) {}
 

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "keystrand/Clock.h"
+#include "keystrand/ModelClock.h"
 #include "keystrand/NotificationPublisher.h"
 #include "keystrand/Registry.h"
 #include "keystrand/RestrictedModeTimer.h"
@@ -47,7 +47,7 @@ class RestrictedModeController {
         std::function<bool(const Notification& notification)> publishes = nullptr;
     };
 
-    RestrictedModeController(RestrictedModeTimer::Periods periods, const Clock& clock,
+    RestrictedModeController(RestrictedModeTimer::Periods periods, const ModelClock& clock,
                              Registry& registry, NotificationPublisher& publisher);
 
     /// Calls the new `rearm`, and no other of them.
@@ -104,7 +104,7 @@ class RestrictedModeController {
         Seconds until = 0;
     };
 
-    const Clock& clock_;
+    const ModelClock& clock_;
     RestrictedModeTimer timer_;
     Registry& registry_;
     NotificationPublisher& publisher_;

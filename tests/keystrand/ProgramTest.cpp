@@ -25,7 +25,7 @@ constexpr std::uint64_t kStart = 1'700'000'000;
 constexpr char kEntry[] = "IOService:/IOResources/Keystrand";
 
 /// Counts on from a start, in sleep too, and never leaps.
-class BootTimeClock final : public Clock {
+class BootTimeClock final : public ModelClock {
   public:
     [[nodiscard]] Seconds now() const override { return kStart + sinceBoot() - start_; }
 

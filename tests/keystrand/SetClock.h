@@ -1,11 +1,11 @@
 #pragma once
 
-#include "keystrand/Clock.h"
+#include "keystrand/ModelClock.h"
 
 namespace keystrand::test {
 
 /// Stands still where a test has set it.
-class SetClock final : public Clock {
+class SetClock final : public ModelClock {
   public:
     explicit SetClock(Seconds start) : time(start) {}
     [[nodiscard]] Seconds now() const override { return time; }

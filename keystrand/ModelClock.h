@@ -9,18 +9,19 @@
 
 namespace keystrand {
 
-/// The time in seconds since 1970-01-01 UTC, always between 1 and RestrictedModeTimer::kLatestTime.
-class Clock : private base::NotCopied {
+/// The time that the model of the timer knows: seconds since 1970-01-01 UTC, always between 1 and
+/// RestrictedModeTimer::kLatestTime.
+class ModelClock : private base::NotCopied {
   public:
     using Seconds = RestrictedModeTimer::Seconds;
 
-    virtual ~Clock() = default;
+    virtual ~ModelClock() = default;
 
     [[nodiscard]] virtual Seconds now() const = 0;
 };
 
-/// The system's clock.
-class SystemClock : public Clock {
+/// The machine's date.
+class DateClock : public ModelClock {
   public:
     [[nodiscard]] Seconds now() const override {
         using std::chrono::system_clock;
