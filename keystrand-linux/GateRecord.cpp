@@ -1,12 +1,11 @@
 #include "keystrand-linux/GateRecord.h"
 
 #include "base/Concat.h"
-#include "base/Digits.h"
+#include "base/LineWords.h"
 
 #include <algorithm>
 #include <array>
 #include <utility>
-#include <vector>
 
 namespace keystrand::usb {
 
@@ -15,8 +14,6 @@ namespace {
 constexpr std::string_view kGateHead = "keystrand-gate 1";
 constexpr std::string_view kDevicesHead = "keystrand-devices 1";
 constexpr std::string_view kEnd = "end";
-/// Stands for an empty word.
-constexpr std::string_view kNothing = "-";
 
 constexpr std::array<std::pair<Standing, std::string_view>, 10> kStandings = {{
     {Standing::attached, "attached"},
@@ -57,81 +54,23 @@ std::optional<Value> valueIn(const std::array<std::pair<Value, std::string_view>
     return found == table.end() ? std::nullopt : std::optional(found->first);
 }
 
-/// The words of one line, which are all taken or the line is none of ours.
-class Line {
-  public:
-    explicit Line(std::string_view line) : rest_(line) {}
+using base::LineWords;
 
-    std::string_view word() {
-        const std::size_t end = std::min(rest_.find(' '), rest_.size());
-        const std::string_view word = rest_.substr(0, end);
-        rest_.remove_prefix(std::min(end + 1, rest_.size()));
-        isGood_ = isGood_ && !word.empty();
-        return word;
-    }
-
-    template <typename Integer>
-    Integer number() {
-        const auto value = base::parseNumber<Integer>(word());
-        isGood_ = isGood_ && value;
-        return value.value_or(0);
-    }
-
-    template <typename Table>
-    auto named(const Table& table) {
-        const auto value = valueIn(table, word());
-        isGood_ = isGood_ && value;
-        return value.value_or(table.front().first);
-    }
-
-    std::string bytes() {
-        const std::string_view digits = word();
-        if (digits == kNothing) {
-            return {};
-        }
-        std::string bytes;
-        for (std::size_t at = 0; at + 1 < digits.size(); at += 2) {
-            const auto high = base::hexDigitValue(digits[at]);
-            const auto low = base::hexDigitValue(digits[at + 1]);
-            isGood_ = isGood_ && high && low;
-            bytes.push_back(static_cast<char>((high.value_or(0) << 4U) | low.value_or(0)));
-        }
-        isGood_ = isGood_ && digits.size() % 2 == 0;
-        return bytes;
-    }
-
-    [[nodiscard]] bool isDone() const { return isGood_ && rest_.empty(); }
-
-  private:
-    std::string_view rest_;
-    bool isGood_ = true;
-};
-
-/// The lines between head and end, each of which `take` understands; false otherwise.
-template <typename Take>
-bool takeLines(std::string_view text, std::string_view head, Take take) {
-    bool first = true;
-    while (!text.empty()) {
-        const std::size_t end = text.find('\n');
-        if (end == std::string_view::npos) {
-            return false;
-        }
-        const std::string_view line = text.substr(0, end);
-        text.remove_prefix(end + 1);
-        if (line == kEnd && !first) {
-            return text.empty();
-        }
-        if (first ? line != head : !take(Line(line))) {
-            return false;
-        }
-        first = false;
-    }
-    return false;
+/// The next word, which the table has.
+template <typename Table>
+auto named(LineWords& line, const Table& table) {
+    const auto value = valueIn(table, line.word());
+    line.require(value.has_value());
+    return value.value_or(table.front().first);
 }
 
-std::string hex(std::string_view bytes) {
-    const auto* const data = reinterpret_cast<const std::uint8_t*>(bytes.data());
-    return bytes.empty() ? std::string(kNothing) : base::hexDigits({data, bytes.size()});
+/// Whether the text is the head, lines each of which `take` understands, and the end.
+template <typename Take>
+bool takeLines(std::string_view text, std::string_view head, Take take) {
+    const auto lines = base::linesOf(text);
+    return lines && lines->size() >= 2 && lines->front() == head && lines->back() == kEnd &&
+           std::all_of(lines->begin() + 1, lines->end() - 1,
+                       [&take](std::string_view line) { return take(LineWords(line)); });
 }
 
 std::string words(const WrittenDefault& value) {
@@ -139,18 +78,18 @@ std::string words(const WrittenDefault& value) {
                         nameIn(kConfirmations, value.confirmed));
 }
 
-WrittenDefault takeDefault(Line& line) {
+WrittenDefault takeDefault(LineWords& line) {
     WrittenDefault value;
     value.before = line.number<AuthorizedDefault>();
     value.written = line.number<AuthorizedDefault>();
-    value.confirmed = line.named(kConfirmations);
+    value.confirmed = named(line, kConfirmations);
     return value;
 }
 
-bool takeGateLine(GateRecord& record, Line line) {
+bool takeGateLine(GateRecord& record, LineWords line) {
     const std::string_view what = line.word();
     if (what == "phase") {
-        record.gate.phase = line.named(kPhases);
+        record.gate.phase = named(line, kPhases);
     } else if (what == "restricted") {
         record.service.restricted = true;
     } else if (what == "starting") {
@@ -170,9 +109,9 @@ bool takeGateLine(GateRecord& record, Line line) {
         device.attachment.port = line.word();
         device.attachment.number = line.number<std::uint32_t>();
         device.attachment.inode = line.number<std::uint64_t>();
-        device.standing = line.named(kStandings);
+        device.standing = named(line, kStandings);
         device.since = BootTime(line.number<BootTime::rep>());
-        device.confirmed = line.named(kConfirmations);
+        device.confirmed = named(line, kConfirmations);
         record.gate.devices.push_back(std::move(device));
     } else {
         return false;
@@ -223,7 +162,7 @@ std::string encodeGateRecord(const GateRecord& record) {
 std::optional<GateRecord> decodeGateRecord(std::string_view text) {
     GateRecord record;
     const bool taken =
-        takeLines(text, kGateHead, [&](Line line) { return takeGateLine(record, line); });
+        takeLines(text, kGateHead, [&](LineWords line) { return takeGateLine(record, line); });
     // One text for one record: nothing said twice, nothing in another order.
     return taken && encodeGateRecord(record) == text ? std::optional(std::move(record))
                                                      : std::nullopt;
@@ -242,17 +181,17 @@ KnownAcrossStarts acrossStarts(const UsbDevice& device) {
 std::string encodeKnownDevices(const KnownDevices& devices) {
     std::string text = base::concat(kDevicesHead, '\n');
     for (const KnownAcrossStarts& device : devices) {
-        text +=
-            base::concat("device ", hex(device.controller), ' ', device.path, ' ',
-                         std::to_string(device.vendor), ' ', std::to_string(device.product), ' ',
-                         std::to_string(device.descriptorsHash), ' ', hex(device.serial), '\n');
+        text += base::concat("device ", base::hexWord(device.controller), ' ', device.path, ' ',
+                             std::to_string(device.vendor), ' ', std::to_string(device.product),
+                             ' ', std::to_string(device.descriptorsHash), ' ',
+                             base::hexWord(device.serial), '\n');
     }
     return text += base::concat(kEnd, '\n');
 }
 
 std::optional<KnownDevices> decodeKnownDevices(std::string_view text) {
     KnownDevices devices;
-    const bool taken = takeLines(text, kDevicesHead, [&](Line line) {
+    const bool taken = takeLines(text, kDevicesHead, [&](LineWords line) {
         KnownAcrossStarts device;
         const bool isDevice = line.word() == "device";
         device.controller = line.bytes();

@@ -1,7 +1,7 @@
 #include "wire/GateMessages.h"
 
 #include "base/Concat.h"
-#include "base/Digits.h"
+#include "base/LineWords.h"
 
 #include <algorithm>
 #include <array>
@@ -11,7 +11,6 @@ namespace wire {
 
 namespace {
 
-constexpr std::string_view kEmpty = "-";
 constexpr std::string_view kDone = "ok\n";
 constexpr std::string_view kDevices = "devices\n";
 constexpr std::string_view kStatus = "status\n";
@@ -33,74 +32,19 @@ constexpr std::array<Flag, 8> kFlags = {{
     {"boot-argument", &GateStatus::bootArgument},
 }};
 
-/// Takes words of one line; what is missing or not as it should be spoils it.
-class GateWords {
-  public:
-    explicit GateWords(std::string_view line) : rest_(line) {}
-
-    std::string_view word() {
-        const std::size_t end = std::min(rest_.find(' '), rest_.size());
-        const std::string_view word = rest_.substr(0, end);
-        rest_.remove_prefix(std::min(end + 1, rest_.size()));
-        isGood_ = isGood_ && !word.empty();
-        return word;
-    }
-    std::string text() {
-        const std::string_view digits = word();
-        std::string bytes;
-        for (std::size_t at = 0; digits != kEmpty && at < digits.size(); at += 2) {
-            const auto high = base::hexDigitValue(digits[at]);
-            const auto low =
-                at + 1 < digits.size() ? base::hexDigitValue(digits[at + 1]) : std::nullopt;
-            isGood_ = isGood_ && high && low;
-            bytes.push_back(static_cast<char>((high.value_or(0) << 4U) | low.value_or(0)));
-        }
-        return bytes;
-    }
-    std::string plain() {
-        const std::string_view plain = word();
-        return plain == kEmpty ? std::string() : std::string(plain);
-    }
-    template <typename Number>
-    Number number() {
-        const auto value = base::parseNumber<Number>(word());
-        isGood_ = isGood_ && value;
-        return value.value_or(0);
-    }
-    bool isYes(std::string_view yes, std::string_view no) {
-        const std::string_view said = word();
-        isGood_ = isGood_ && (said == yes || said == no);
-        return said == yes;
-    }
-    [[nodiscard]] bool isDone() const { return isGood_ && rest_.empty(); }
-
-  private:
-    std::string_view rest_;
-    bool isGood_ = true;
-};
-
-/// The lines of a text that ends with one.
-std::optional<std::vector<std::string_view>> linesOf(std::string_view text) {
-    std::vector<std::string_view> lines;
-    while (!text.empty()) {
-        const std::size_t end = text.find('\n');
-        if (end == std::string_view::npos) {
-            return std::nullopt;
-        }
-        lines.push_back(text.substr(0, end));
-        text.remove_prefix(end + 1);
-    }
-    return lines;
+/// The next word, one of these two.
+bool isYes(base::LineWords& words, std::string_view yes, std::string_view no) {
+    const std::string_view said = words.word();
+    words.require(said == yes || said == no);
+    return said == yes;
 }
 
 std::string hexText(std::string_view text) {
-    const auto* const bytes = reinterpret_cast<const std::uint8_t*>(text.data());
-    return text.empty() ? std::string(kEmpty)
-                        : base::hexDigits({bytes, std::min(text.size(), kMostGateText)});
+    return base::hexWord(text.substr(0, kMostGateText));
 }
 
-std::string plainWord(const std::string& text) {
-    return text.empty() ? std::string(kEmpty) : text;
+std::string_view plainWord(const std::string& text) {
+    return text.empty() ? base::kEmptyWord : text;
 }
 
 std::string lineOf(const GateDevice& device) {
@@ -113,19 +57,19 @@ std::string lineOf(const GateDevice& device) {
 }
 
 std::optional<GateDevice> deviceIn(std::string_view line) {
-    GateWords words(line);
+    base::LineWords words(line);
     GateDevice device;
     device.port = words.word();
     device.number = words.number<std::uint32_t>();
     device.inode = words.number<std::uint64_t>();
     device.vendor = words.number<std::uint16_t>();
     device.product = words.number<std::uint16_t>();
-    device.manufacturer = words.text();
-    device.name = words.text();
-    device.serial = words.text();
-    device.classes = words.plain();
-    device.accepted = words.isYes("in", "out");
-    device.rule = words.plain();
+    device.manufacturer = words.bytes();
+    device.name = words.bytes();
+    device.serial = words.bytes();
+    device.classes = words.wordOrNothing();
+    device.accepted = isYes(words, "in", "out");
+    device.rule = words.wordOrNothing();
     device.forSeconds = words.number<std::uint64_t>();
     return words.isDone() ? std::optional(std::move(device)) : std::nullopt;
 }
@@ -165,12 +109,12 @@ std::optional<GateDevices> decodedDevices(const std::vector<std::string_view>& l
 }
 
 bool takeStatusLine(GateStatus& status, std::string_view line) {
-    GateWords words(line);
+    base::LineWords words(line);
     const std::string_view word = words.word();
     const auto* const flag = std::find_if(kFlags.begin(), kFlags.end(),
                                           [&](const Flag& each) { return each.word == word; });
     if (flag != kFlags.end()) {
-        status.*flag->value = words.isYes("yes", "no");
+        status.*flag->value = isYes(words, "yes", "no");
     } else if (word == "until-restricted") {
         status.untilRestricted = words.number<std::uint64_t>();
     } else if (word == "until-closed") {
@@ -192,12 +136,12 @@ std::optional<GateAnswer> readAnswer(std::string_view text) {
             std::string(text.substr(kError.size(), text.size() - kError.size() - 1))};
     }
     if (text.starts_with(kDevices)) {
-        const auto lines = linesOf(text.substr(kDevices.size()));
+        const auto lines = base::linesOf(text.substr(kDevices.size()));
         auto devices = lines ? decodedDevices(*lines) : std::nullopt;
         return devices ? std::optional<GateAnswer>(std::move(*devices)) : std::nullopt;
     }
     const auto lines =
-        text.starts_with(kStatus) ? linesOf(text.substr(kStatus.size())) : std::nullopt;
+        text.starts_with(kStatus) ? base::linesOf(text.substr(kStatus.size())) : std::nullopt;
     GateStatus status;
     const bool taken = lines && std::all_of(lines->begin(), lines->end(), [&](auto line) {
                            return takeStatusLine(status, line);
@@ -215,7 +159,7 @@ std::optional<GateRequest> readRequest(std::string_view text) {
     if (!text.ends_with('\n')) {
         return std::nullopt;
     }
-    GateWords words(text.substr(0, text.size() - 1));
+    base::LineWords words(text.substr(0, text.size() - 1));
     const std::string_view what = words.word();
     std::optional<GateRequest> request;
     if (what == "accept") {
