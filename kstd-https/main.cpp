@@ -1,8 +1,6 @@
-#include "base/Concat.h"
 #include "base/FileDescriptor.h"
 #include "kstd-https/RequestService.h"
 #include "platform/https/HTTPTransfer.h"
-#include "wire/HTTPMessages.h"
 
 #include <CLI/CLI.hpp>
 
@@ -11,11 +9,8 @@
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
-#include <fcntl.h>
 #include <optional>
 #include <string>
-#include <sys/socket.h>
-#include <unistd.h>
 #include <utility>
 
 namespace {
@@ -66,41 +61,6 @@ std::optional<platform::HTTPOptions> parseOptions(int argc, const char* const* a
     return options;
 }
 
-bool hasOption(int socket, int option, int wanted) {
-    int value = -1;
-    socklen_t size = sizeof value;
-    return ::getsockopt(socket, SOL_SOCKET, option, &value, &size) == 0 && value == wanted;
-}
-
-bool isLocalConnection(int socket) {
-    sockaddr_storage peer{};
-    socklen_t size = sizeof peer;
-    return hasOption(socket, SO_DOMAIN, AF_UNIX) && hasOption(socket, SO_TYPE, SOCK_STREAM) &&
-           ::getpeername(socket, reinterpret_cast<sockaddr*>(&peer), &size) == 0;
-}
-
-/// The connection that this process was started with. None, and why, when there is none, or when
-/// the other end is neither root nor this process's own user.
-base::FileDescriptor takeConnection(std::string& reason) {
-    constexpr int kSocket = wire::kHTTPConnectionDescriptor;
-    // Looked at before it is owned: in a program that is started by hand the descriptor may be
-    // anybody's.
-    if (!isLocalConnection(kSocket)) {
-        reason = base::concat("descriptor ", kSocket, " is no connection of a local stream socket");
-        return base::FileDescriptor();
-    }
-    base::FileDescriptor connection(kSocket);
-    ::fcntl(kSocket, F_SETFD, FD_CLOEXEC);
-    ucred peer{};
-    socklen_t size = sizeof peer;
-    if (::getsockopt(kSocket, SOL_SOCKET, SO_PEERCRED, &peer, &size) != 0 ||
-        (peer.uid != 0 && peer.uid != ::geteuid())) {
-        reason = base::concat("refused a connection of user ", peer.uid);
-        return base::FileDescriptor();
-    }
-    return connection;
-}
-
 } // namespace
 
 int main(int argc, char** argv) {
@@ -116,7 +76,7 @@ int main(int argc, char** argv) {
         return exitStatus;
     }
     std::string reason;
-    base::FileDescriptor socket = takeConnection(reason);
+    base::FileDescriptor socket = https::takeConnection(reason);
     if (!socket.isOpen()) {
         std::fprintf(stderr, "kstd-https: %s\n", reason.c_str());
         return EXIT_FAILURE;
