@@ -1,5 +1,7 @@
 #include "keystrand-linux/GatePolicy.h"
 
+#include "base/Concat.h"
+
 #include <algorithm>
 #include <charconv>
 
@@ -19,25 +21,11 @@ bool letsIn(AuthorizedDefault value, const UsbDevice& device) {
     return value == kEverybody || (value == kHardWiredOnly && device.hardWired);
 }
 
-template <typename Each>
-bool isAmong(const std::vector<Each>& all, const Each& one) {
-    return std::find(all.begin(), all.end(), one) != all.end();
-}
-
 const RootHub* rootHubOf(const BusView& view, const UsbDevice& device) {
     const std::uint32_t bus = busOf(device.port());
     const auto found = std::find_if(view.rootHubs.begin(), view.rootHubs.end(),
                                     [&](const RootHub& hub) { return hub.bus == bus; });
     return found == view.rootHubs.end() ? nullptr : &*found;
-}
-
-/// For a root hub that came closed because of the parameter: what it would have been otherwise.
-std::optional<AuthorizedDefault> valueWithout(const std::optional<WrittenDefault>& parameter,
-                                              const RootHub& hub) {
-    if (!parameter || !parameter->isStillThere(hub.authorizedDefault)) {
-        return std::nullopt;
-    }
-    return parameter->before == kAsTheControllerHasIt ? kEverybody : parameter->before;
 }
 
 GateAction forParameter(AuthorizedDefault value) {
@@ -53,6 +41,10 @@ GateAction forDevice(Kind kind, const UsbDevice& device, Standing standing) {
 }
 
 } // namespace
+
+bool WrittenDefault::isDue(BootTime now) const {
+    return !failedAt || now - GatePolicy::kRetryTime >= *failedAt;
+}
 
 std::uint32_t busOf(std::string_view port) {
     std::uint32_t bus = 0;
@@ -84,20 +76,24 @@ void GatePolicy::close(const BusView& view, BootTime now) {
     if (closed()) {
         return;
     }
-    // One that is closed already was closed by somebody else, unless it came while the gate opened.
-    const std::optional<WrittenDefault> parameter = late_ ? late_->parameter : state_.parameter;
+    // What was put back while the gate was opening has to be written once more, and so has what
+    // somebody else has opened.
     for (const RootHub& hub : view.rootHubs) {
-        if (hubAt(hub.inode) == nullptr) {
-            remember(hub, valueOfLate(hub, parameter).value_or(hub.authorizedDefault));
+        WrittenHub* const known = hubAt(hub.inode);
+        if (known == nullptr) {
+            // One that is closed already was closed by somebody else, unless it came meanwhile.
+            state_.hubs.push_back(
+                closedHub(hub, valueWithoutTheParameter(hub).value_or(hub.authorizedDefault)));
+        } else if (known->value.putBack || known->value.written != hub.authorizedDefault) {
+            *known = closedHub(hub, hub.authorizedDefault);
         }
     }
-    state_.phase = Phase::closed;
-    putBack_.clear();
-    late_.reset();
-    // What was put back while the gate was opening has to be written once more.
-    if (state_.parameter && state_.parameter->written != view.parameter) {
+    if (state_.parameter &&
+        (state_.parameter->putBack || state_.parameter->written != view.parameter)) {
         state_.parameter.reset();
     }
+    state_.phase = Phase::closed;
+    tryAgain();
     for (const UsbDevice& device : view.devices) {
         if (entryOf(device.attachment) == state_.devices.end()) {
             state_.devices.push_back(
@@ -111,6 +107,21 @@ void GatePolicy::close(const BusView& view, BootTime now) {
 void GatePolicy::open() {
     if (closed()) {
         state_.phase = Phase::opening;
+        putBackAt_.reset();
+        tryAgain();
+    }
+}
+
+/// What failed the other way may work this way.
+void GatePolicy::tryAgain() {
+    if (state_.parameter) {
+        state_.parameter->failedAt.reset();
+    }
+    for (WrittenHub& hub : state_.hubs) {
+        hub.value.failedAt.reset();
+    }
+    for (KnownDevice& device : state_.devices) {
+        device.givenUp = false;
     }
 }
 
@@ -139,11 +150,23 @@ bool GatePolicy::accept(const Attachment& attachment, BootTime now) {
     return true;
 }
 
+std::vector<GateAction> GatePolicy::decideDefaults(const BusView& glance, BootTime now) {
+    return closed() && glance.hasUsb ? closeDefaults(glance, now) : Actions();
+}
+
 std::vector<GateAction> GatePolicy::decide(const BusView& view, BootTime now) {
     forgetWhatWent(view);
+    if (!view.hasUsb) {
+        // When it comes, it is as the kernel makes it.
+        state_.parameter.reset();
+        if (!closed()) {
+            state_ = {};
+        }
+        return {};
+    }
     switch (state_.phase) {
     case Phase::open:
-        return decideOpen(view, now);
+        return {};
     case Phase::closed:
         return decideClosed(view, now);
     case Phase::opening:
@@ -163,7 +186,7 @@ void GatePolicy::forgetWhatWent(const BusView& view) {
 
 GatePolicy::Actions GatePolicy::decideClosed(const BusView& view, BootTime now) {
     // First the defaults: what comes after them is refused by the kernel.
-    Actions actions = closeDefaults(view);
+    Actions actions = closeDefaults(view, now);
     if (!actions.empty()) {
         return actions;
     }
@@ -178,7 +201,7 @@ GatePolicy::Actions GatePolicy::decideClosed(const BusView& view, BootTime now) 
     return actions;
 }
 
-GatePolicy::Actions GatePolicy::closeDefaults(const BusView& view) {
+GatePolicy::Actions GatePolicy::closeDefaults(const BusView& view, BootTime now) {
     Actions actions;
     if (!state_.parameter) {
         state_.parameter = WrittenDefault{.before = view.parameter, .written = closing_};
@@ -187,28 +210,29 @@ GatePolicy::Actions GatePolicy::closeDefaults(const BusView& view) {
                 .before = view.parameter, .written = view.parameter, .confirmed = true};
         }
     }
-    if (!state_.parameter->confirmed) {
+    if (!state_.parameter->confirmed && state_.parameter->isDue(now)) {
         actions.push_back(forParameter(state_.parameter->written));
     }
     for (const RootHub& hub : view.rootHubs) {
         if (hubAt(hub.inode) == nullptr) {
-            remember(hub, valueWithout(state_.parameter, hub).value_or(hub.authorizedDefault));
+            state_.hubs.push_back(
+                closedHub(hub, valueWithoutTheParameter(hub).value_or(hub.authorizedDefault)));
         }
         const WrittenHub* const known = hubAt(hub.inode);
-        if (!known->value.confirmed) {
+        if (!known->value.confirmed && known->value.isDue(now)) {
             actions.push_back(forHub(hub, known->value.written));
         }
     }
     return actions;
 }
 
-void GatePolicy::remember(const RootHub& hub, AuthorizedDefault before) {
+WrittenHub GatePolicy::closedHub(const RootHub& hub, AuthorizedDefault before) const {
     const bool isClosed = isAsStrict(hub.authorizedDefault, closing_);
-    state_.hubs.push_back({.bus = hub.bus,
-                           .inode = hub.inode,
-                           .value = {.before = before,
-                                     .written = isClosed ? hub.authorizedDefault : closing_,
-                                     .confirmed = isClosed}});
+    return {.bus = hub.bus,
+            .inode = hub.inode,
+            .value = {.before = before,
+                      .written = isClosed ? hub.authorizedDefault : closing_,
+                      .confirmed = isClosed}};
 }
 
 std::optional<GateAction> GatePolicy::decideKnown(KnownDevice& known, const UsbDevice& device,
@@ -229,7 +253,7 @@ std::optional<GateAction> GatePolicy::decideKnown(KnownDevice& known, const UsbD
             // Only root can have done that.
             known.standing = Standing::letInByOthers;
             known.since = now;
-        } else if (mayBeTheKeyboard(device) && wantsKeyboard(view)) {
+        } else if (!known.givenUp && mayBeTheKeyboard(device) && wantsKeyboard(view)) {
             known = {.attachment = device.attachment,
                      .standing = Standing::keyboard,
                      .since = now,
@@ -297,8 +321,13 @@ std::optional<GateAction> GatePolicy::refuse(KnownDevice& known, const UsbDevice
 }
 
 GatePolicy::Actions GatePolicy::decideOpening(const BusView& view, BootTime now) {
-    takeInWhatCameLast(view);
-    Actions actions = putDefaultsBack(view);
+    if (!putBackAt_ || now < *putBackAt_ + kLateTime) {
+        takeInWhatCameLast(view);
+    }
+    Actions actions = putDefaultsBack(view, now);
+    if (!actions.empty() || !putBackAt_) {
+        putBackAt_ = now;
+    }
     if (!actions.empty()) {
         return actions;
     }
@@ -309,80 +338,50 @@ GatePolicy::Actions GatePolicy::decideOpening(const BusView& view, BootTime now)
             actions = letIn(view, false);
         }
     }
-    if (actions.empty()) {
-        late_ =
-            Late{.until = now + kLateTime, .parameter = state_.parameter, .hubs = {}, .seen = {}};
-        for (const RootHub& hub : view.rootHubs) {
-            late_->hubs.push_back(hub.inode);
-        }
-        for (const UsbDevice& device : view.devices) {
-            late_->seen.push_back(device.attachment);
-        }
-        state_ = {};
+    // What could not be put back is tried again.
+    if (actions.empty() && putDefaultsBack(view, BootTime::max()).empty()) {
+        endLate(now);
     }
     return actions;
-}
-
-void GatePolicy::endLate(BootTime now) {
-    if (late_ && now >= late_->until) {
-        late_.reset();
-        putBack_.clear();
-    }
-}
-
-GatePolicy::Actions GatePolicy::decideOpen(const BusView& view, BootTime now) {
-    Actions actions;
-    endLate(now);
-    if (!late_) {
-        return actions;
-    }
-    for (const RootHub& hub : view.rootHubs) {
-        if (const auto before = valueOfLate(hub, late_->parameter)) {
-            actions.push_back(forHub(hub, *before));
-        }
-    }
-    for (const UsbDevice& device : view.devices) {
-        const RootHub* const root = rootHubOf(view, device);
-        // One that is seen let in, and refused later, is somebody else's.
-        if (isAmong(late_->seen, device.attachment) || root == nullptr || !isPutBack(*root)) {
-            continue;
-        }
-        late_->seen.push_back(device.attachment);
-        if (!device.authorized && rules_.onUnlock == OnUnlock::accept &&
-            letsIn(root->authorizedDefault, device)) {
-            actions.push_back(forDevice(Kind::accept, device, Standing::attached));
-        }
-    }
-    return actions;
-}
-
-/// For a root hub that came while the gate opened, and had read the parameter before that.
-std::optional<AuthorizedDefault>
-GatePolicy::valueOfLate(const RootHub& hub, const std::optional<WrittenDefault>& parameter) const {
-    return isPutBack(hub) || (late_ && isAmong(late_->hubs, hub.inode))
-               ? std::nullopt
-               : valueWithout(parameter, hub);
 }
 
 /// What the kernel has refused on this service's behalf since the last look.
 void GatePolicy::takeInWhatCameLast(const BusView& view) {
     for (const UsbDevice& device : view.devices) {
         const RootHub* const root = rootHubOf(view, device);
-        if (!device.authorized && root != nullptr && find(device.attachment) == nullptr &&
-            (valueBefore(*root) || isPutBack(*root))) {
-            state_.devices.push_back(
-                {.attachment = device.attachment, .standing = Standing::refused});
+        if (root == nullptr || find(device.attachment) != nullptr) {
+            continue;
         }
+        const Standing out = refusesForThis(*root) ? Standing::refused : Standing::refusedByOthers;
+        state_.devices.push_back({.attachment = device.attachment,
+                                  .standing = device.authorized ? Standing::attached : out});
     }
 }
 
-GatePolicy::Actions GatePolicy::putDefaultsBack(const BusView& view) const {
+/// Whether it has refused devices on this service's behalf until now, or until it was put back.
+bool GatePolicy::refusesForThis(const RootHub& hub) const {
+    for (const WrittenHub& known : state_.hubs) {
+        if (known.inode == hub.inode) {
+            return known.value.putBack ? hub.authorizedDefault == known.value.before
+                                       : known.value.isStillThere(hub.authorizedDefault);
+        }
+    }
+    return valueWithoutTheParameter(hub).has_value();
+}
+
+GatePolicy::Actions GatePolicy::putDefaultsBack(const BusView& view, BootTime now) const {
     Actions actions;
-    if (state_.parameter && state_.parameter->isStillThere(view.parameter)) {
+    const auto& parameter = state_.parameter;
+    if (parameter && !parameter->putBack && parameter->isStillThere(view.parameter) &&
+        parameter->isDue(now)) {
         actions.push_back(forParameter(state_.parameter->before));
     }
     for (const RootHub& hub : view.rootHubs) {
-        if (const auto before = valueBefore(hub)) {
+        const auto before = valueBefore(hub);
+        const auto known =
+            std::find_if(state_.hubs.begin(), state_.hubs.end(),
+                         [&](const WrittenHub& each) { return each.inode == hub.inode; });
+        if (before && (known == state_.hubs.end() || known->value.isDue(now))) {
             actions.push_back(forHub(hub, *before));
         }
     }
@@ -394,12 +393,21 @@ GatePolicy::Actions GatePolicy::putDefaultsBack(const BusView& view) const {
 std::optional<AuthorizedDefault> GatePolicy::valueBefore(const RootHub& hub) const {
     for (const WrittenHub& known : state_.hubs) {
         if (known.inode == hub.inode) {
-            return known.value.isStillThere(hub.authorizedDefault)
+            return !known.value.putBack && known.value.isStillThere(hub.authorizedDefault)
                        ? std::optional(known.value.before)
                        : std::nullopt;
         }
     }
-    return valueWithout(state_.parameter, hub);
+    return valueWithoutTheParameter(hub);
+}
+
+/// For a root hub that came closed because of the parameter: what it would have been otherwise.
+std::optional<AuthorizedDefault> GatePolicy::valueWithoutTheParameter(const RootHub& hub) const {
+    const auto& parameter = state_.parameter;
+    if (!parameter || !parameter->isStillThere(hub.authorizedDefault)) {
+        return std::nullopt;
+    }
+    return parameter->before == kAsTheControllerHasIt ? kEverybody : parameter->before;
 }
 
 GatePolicy::Actions GatePolicy::letIn(const BusView& view, bool hubs) {
@@ -408,7 +416,7 @@ GatePolicy::Actions GatePolicy::letIn(const BusView& view, bool hubs) {
         const auto entry = entryOf(device.attachment);
         const RootHub* const root = rootHubOf(view, device);
         const bool isOurs =
-            entry != state_.devices.end() &&
+            entry != state_.devices.end() && !entry->givenUp &&
             (entry->standing == Standing::refused || (isIn(entry->standing) && !entry->confirmed));
         if (isOurs && !device.authorized && device.functions.isHub == hubs && root != nullptr &&
             letsIn(root->authorizedDefault, device)) {
@@ -422,19 +430,16 @@ void GatePolicy::carriedOut(const GateAction& action, const GateOutcome& outcome
     switch (action.kind) {
     case Kind::setParameter:
         if (state_.phase == Phase::opening) {
-            // A root hub that came before this write is closed because of the parameter, still.
-            if (outcome.kind == GateOutcome::Kind::failed) {
-                state_.parameter.reset();
-            }
+            parameterPutBack(action, outcome, now);
         } else if (state_.parameter) {
-            defaultWritten(*state_.parameter, outcome);
+            defaultWritten(*state_.parameter, outcome, now);
         }
         return;
     case Kind::setRootHub:
-        if (!closed()) {
-            hubPutBack(action, outcome);
+        if (state_.phase == Phase::opening) {
+            hubPutBack(action, outcome, now);
         } else if (WrittenHub* const known = hubAt(action.hub.inode)) {
-            defaultWritten(known->value, outcome);
+            defaultWritten(known->value, outcome, now);
         }
         return;
     case Kind::accept:
@@ -446,32 +451,47 @@ void GatePolicy::carriedOut(const GateAction& action, const GateOutcome& outcome
     }
 }
 
-void GatePolicy::defaultWritten(WrittenDefault& value, const GateOutcome& outcome) {
-    value.confirmed = true;
+void GatePolicy::defaultWritten(WrittenDefault& value, const GateOutcome& outcome, BootTime now) {
+    value.failedAt.reset();
+    value.confirmed =
+        outcome.kind == GateOutcome::Kind::vanished || isAsStrict(outcome.readBack, value.written);
+    if (value.confirmed) {
+        return;
+    }
     // A kernel that knows only two values reads back the other one, without an error.
-    if (outcome.kind == GateOutcome::Kind::done && outcome.readBack != value.written &&
-        value.written == kHardWiredOnly) {
+    if (outcome.kind == GateOutcome::Kind::done && value.written == kHardWiredOnly) {
         closing_ = kNobody;
         value.written = kNobody;
-        value.confirmed = false;
+        return;
+    }
+    value.failedAt = now;
+}
+
+/// It is remembered to the end: a root hub that came before this write is closed because of it.
+void GatePolicy::parameterPutBack(const GateAction& action, const GateOutcome& outcome,
+                                  BootTime now) {
+    if (state_.parameter) {
+        state_.parameter->putBack = outcome.readBack == action.value;
+        state_.parameter->failedAt = state_.parameter->putBack ? std::nullopt : std::optional(now);
     }
 }
 
-void GatePolicy::hubPutBack(const GateAction& action, const GateOutcome& outcome) {
-    std::erase_if(state_.hubs,
-                  [&](const WrittenHub& known) { return known.inode == action.hub.inode; });
-    putBack_.push_back(action.hub.inode);
-    if (outcome.kind == GateOutcome::Kind::failed && state_.phase == Phase::opening) {
-        // Not tried again: it would fail for ever.
-        const WrittenDefault left{.before = action.hub.authorizedDefault,
-                                  .written = action.hub.authorizedDefault,
-                                  .confirmed = true};
-        state_.hubs.push_back({.bus = action.hub.bus, .inode = action.hub.inode, .value = left});
+/// It is remembered to the end, too: what it refused may come late.
+void GatePolicy::hubPutBack(const GateAction& action, const GateOutcome& outcome, BootTime now) {
+    WrittenHub* known = hubAt(action.hub.inode);
+    if (known == nullptr) {
+        // One that came closed, because of the parameter.
+        state_.hubs.push_back({.bus = action.hub.bus,
+                               .inode = action.hub.inode,
+                               .value = {.before = action.value,
+                                         .written = action.hub.authorizedDefault,
+                                         .confirmed = true}});
+        known = &state_.hubs.back();
     }
-}
-
-bool GatePolicy::isPutBack(const RootHub& hub) const {
-    return isAmong(putBack_, hub.inode);
+    const bool isDone =
+        outcome.kind == GateOutcome::Kind::vanished || outcome.readBack == action.value;
+    known->value.putBack = isDone;
+    known->value.failedAt = isDone ? std::nullopt : std::optional(now);
 }
 
 void GatePolicy::deviceWritten(const GateAction& action, const GateOutcome& outcome, BootTime now) {
@@ -496,8 +516,8 @@ void GatePolicy::deviceWritten(const GateAction& action, const GateOutcome& outc
             entry->since = now;
             return;
         }
-        // Not tried again: it would fail for ever.
-        entry->standing = Standing::refusedByOthers;
+        entry->standing = Standing::refused;
+        entry->givenUp = true;
         break;
     }
     entry->confirmed = true;
@@ -506,21 +526,58 @@ void GatePolicy::deviceWritten(const GateAction& action, const GateOutcome& outc
 
 std::optional<BootTime> GatePolicy::nextLook() const {
     std::optional<BootTime> next;
-    if (!closed()) {
-        return late_ ? std::optional(late_->until) : next;
+    const auto lookAt = [&next](BootTime at) {
+        next = std::min(next.value_or(at), at);
+    };
+    if (state_.parameter && state_.parameter->failedAt) {
+        lookAt(*state_.parameter->failedAt + kRetryTime);
+    }
+    for (const WrittenHub& hub : state_.hubs) {
+        if (hub.value.failedAt) {
+            lookAt(*hub.value.failedAt + kRetryTime);
+        }
+    }
+    if (putBackAt_ && isPutBack()) {
+        lookAt(*putBackAt_ + kLateTime);
     }
     for (const KnownDevice& known : state_.devices) {
-        std::optional<BootTime> at;
-        if (!known.confirmed) {
-            at = known.since + kRetryTime;
-        } else if (known.standing == Standing::probe) {
-            at = known.since + kProbeTime;
-        }
-        if (at && (!next || *at < *next)) {
-            next = at;
+        if (closed() && !known.confirmed) {
+            lookAt(known.since + kRetryTime);
+        } else if (closed() && known.standing == Standing::probe) {
+            lookAt(known.since + kProbeTime);
         }
     }
     return next;
+}
+
+bool GatePolicy::isPutBack() const {
+    return state_.phase == Phase::open ||
+           (state_.phase == Phase::opening && putBackAt_ && gaps().empty());
+}
+
+void GatePolicy::endLate(BootTime now) {
+    if (state_.phase == Phase::opening && isPutBack() && now >= *putBackAt_ + kLateTime) {
+        state_ = {};
+        putBackAt_.reset();
+    }
+}
+
+std::vector<std::string> GatePolicy::gaps() const {
+    std::vector<std::string> gaps;
+    if (state_.parameter && state_.parameter->failedAt) {
+        gaps.emplace_back("the parameter authorized_default");
+    }
+    for (const WrittenHub& hub : state_.hubs) {
+        if (hub.value.failedAt) {
+            gaps.push_back(base::concat("root hub usb", std::to_string(hub.bus)));
+        }
+    }
+    for (const KnownDevice& known : state_.devices) {
+        if (closed() && known.standing == Standing::refused && !known.confirmed) {
+            gaps.push_back(base::concat("device ", known.attachment.port));
+        }
+    }
+    return gaps;
 }
 
 const KnownDevice* GatePolicy::find(const Attachment& attachment) const {

@@ -68,6 +68,8 @@ struct KnownDevice {
     BootTime since{0};
     /// False between the decision and the kernel's having carried it out.
     bool confirmed = true;
+    /// The kernel could not let it in, and would not if it were asked at once again.
+    bool givenUp = false;
 
     bool operator==(const KnownDevice&) const = default;
 };
@@ -78,6 +80,14 @@ struct WrittenDefault {
     AuthorizedDefault written = kNobody;
     /// False between the decision and the kernel's having carried it out.
     bool confirmed = false;
+    /// When the kernel did not, or did not take back what had been there.
+    std::optional<BootTime> failedAt = std::nullopt;
+
+    /// What had been there was written again.
+    bool putBack = false;
+
+    /// Whether it is time to try it, once more if need be.
+    [[nodiscard]] bool isDue(BootTime now) const;
 
     /// Whether that changed something, and what reads `now` has not been changed by others since.
     [[nodiscard]] bool isStillThere(AuthorizedDefault now) const {
@@ -138,9 +148,11 @@ struct GateOutcome {
 class GatePolicy {
   public:
     static constexpr BootTime kProbeTime = std::chrono::seconds(5);
-    /// Until a device that could not be refused is refused again.
+    /// Until what could not be closed, refused or put back is tried again.
     static constexpr BootTime kRetryTime = std::chrono::seconds(10);
-    /// How long after opening there may still appear what the kernel has refused before.
+
+    /// The kernel decides about a device before it shows it, by what its root hub read then: so
+    /// long after the root hubs were put back one may still come that was refused.
     static constexpr BootTime kLateTime = std::chrono::seconds(10);
 
     explicit GatePolicy(GateRules rules);
@@ -149,7 +161,7 @@ class GatePolicy {
     /// is decided anew.
     void resume(GateState state);
 
-    /// What is in now stays. Nothing when the gate is closed.
+    /// What is in now stays; a glance is enough. Nothing when the gate is closed.
     void close(const BusView& view, BootTime now);
     /// Puts everything back. Nothing when it is open.
     void open();
@@ -162,37 +174,43 @@ class GatePolicy {
     /// The device comes in, whatever the rules say. False when it is not there or in already.
     [[nodiscard]] bool accept(const Attachment& attachment, BootTime now);
 
+    /// What closes, for a glance: the first that `decide` would say, too, of a gate that is closed.
+    [[nodiscard]] std::vector<GateAction> decideDefaults(const BusView& glance, BootTime now);
     /// What to write next, in this order. Remembered as decided, not yet as carried out.
     [[nodiscard]] std::vector<GateAction> decide(const BusView& view, BootTime now);
     void carriedOut(const GateAction& action, const GateOutcome& outcome, BootTime now);
 
     /// When to look again though nothing came.
     [[nodiscard]] std::optional<BootTime> nextLook() const;
-    /// The gate is open, and what comes has to be looked at for a while all the same.
-    [[nodiscard]] bool awaitsLate() const { return late_.has_value(); }
-    /// Ends that when it is time, whether the bus can be seen or not.
-    void endLate(BootTime now);
 
     [[nodiscard]] const GateState& state() const { return state_; }
     [[nodiscard]] bool closed() const { return state_.phase == GateState::Phase::closed; }
+    /// Everything is put back, as far as it is there by now.
+    [[nodiscard]] bool isPutBack() const;
+    /// Awaits nothing late any more when it is time, whether the bus can be seen or not.
+    void endLate(BootTime now);
     /// The device's entry, null for one that is not known.
     [[nodiscard]] const KnownDevice* find(const Attachment& attachment) const;
+    /// What the kernel did not close or refuse though the gate is closed, or did not take back
+    /// though it is open, in words for people.
+    [[nodiscard]] std::vector<std::string> gaps() const;
 
   private:
     using Actions = std::vector<GateAction>;
     using Entry = std::vector<KnownDevice>::iterator;
 
     void forgetWhatWent(const BusView& view);
+    void tryAgain();
     [[nodiscard]] Actions decideClosed(const BusView& view, BootTime now);
     [[nodiscard]] Actions decideOpening(const BusView& view, BootTime now);
-    [[nodiscard]] Actions decideOpen(const BusView& view, BootTime now);
-    [[nodiscard]] Actions closeDefaults(const BusView& view);
-    void remember(const RootHub& hub, AuthorizedDefault before);
-    [[nodiscard]] Actions putDefaultsBack(const BusView& view) const;
+    [[nodiscard]] Actions closeDefaults(const BusView& view, BootTime now);
+    [[nodiscard]] WrittenHub closedHub(const RootHub& hub, AuthorizedDefault before) const;
+    [[nodiscard]] Actions putDefaultsBack(const BusView& view, BootTime now) const;
     void takeInWhatCameLast(const BusView& view);
+    [[nodiscard]] bool refusesForThis(const RootHub& hub) const;
     [[nodiscard]] std::optional<AuthorizedDefault> valueBefore(const RootHub& hub) const;
     [[nodiscard]] std::optional<AuthorizedDefault>
-    valueOfLate(const RootHub& hub, const std::optional<WrittenDefault>& parameter) const;
+    valueWithoutTheParameter(const RootHub& hub) const;
     [[nodiscard]] Actions letIn(const BusView& view, bool hubs);
 
     [[nodiscard]] std::optional<GateAction> decideKnown(KnownDevice& known, const UsbDevice& device,
@@ -212,31 +230,19 @@ class GatePolicy {
     [[nodiscard]] bool isClosedByOthers(const UsbDevice& device) const;
     [[nodiscard]] bool isLetInByItsPort(const UsbDevice& device) const;
 
-    void defaultWritten(WrittenDefault& value, const GateOutcome& outcome);
-    void hubPutBack(const GateAction& action, const GateOutcome& outcome);
-    [[nodiscard]] bool isPutBack(const RootHub& hub) const;
+    void defaultWritten(WrittenDefault& value, const GateOutcome& outcome, BootTime now);
+    void parameterPutBack(const GateAction& action, const GateOutcome& outcome, BootTime now);
+    void hubPutBack(const GateAction& action, const GateOutcome& outcome, BootTime now);
     void deviceWritten(const GateAction& action, const GateOutcome& outcome, BootTime now);
     [[nodiscard]] Entry entryOf(const Attachment& attachment);
     [[nodiscard]] WrittenHub* hubAt(std::uint64_t inode);
 
-    /// The kernel decides some time before a device, or a root hub, is seen.
-    struct Late {
-        BootTime until{0};
-        /// What root hubs would read that came closed because of the parameter.
-        std::optional<WrittenDefault> parameter;
-        /// Inodes of the root hubs that were there when the gate opened.
-        std::vector<std::uint64_t> hubs;
-        /// What was there then, or was looked at since.
-        std::vector<Attachment> seen;
-    };
-
     GateRules rules_;
     GateState state_;
-    /// Inodes of the root hubs that were opened again since the gate was closed.
-    std::vector<std::uint64_t> putBack_;
-    std::optional<Late> late_;
     /// What closes: a kernel that does not know the value for hard-wired ports gets the other one.
     AuthorizedDefault closing_;
+    /// When the last default was put back, while it opens.
+    std::optional<BootTime> putBackAt_;
 };
 
 } // namespace keystrand::usb

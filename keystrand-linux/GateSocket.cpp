@@ -43,9 +43,6 @@ wire::GateAnswer devices(Keystrand& keystrand, const MachineClock& clock) {
 
 wire::GateAnswer status(Keystrand& keystrand) {
     const Keystrand::Status status = keystrand.status();
-    const auto listed = keystrand.gate().list();
-    const auto refused = std::count_if(listed.begin(), listed.end(),
-                                       [](const auto& each) { return !each.device.authorized; });
     return wire::GateStatus{
         .locked = status.locked,
         .starting = status.starting,
@@ -60,7 +57,8 @@ wire::GateAnswer status(Keystrand& keystrand) {
                                : std::nullopt,
         .untilClosed =
             status.untilClosed ? std::optional(secondsOf(*status.untilClosed)) : std::nullopt,
-        .refused = static_cast<std::uint32_t>(refused)};
+        .refused = static_cast<std::uint32_t>(keystrand.gate().countRefused()),
+        .gap = status.gap};
 }
 
 } // namespace

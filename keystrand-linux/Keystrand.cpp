@@ -167,8 +167,15 @@ void Keystrand::update() {
     gate_.remember({.restricted = model_.timer().restricted(),
                     .starting = starting_,
                     .openUntil = openUntil_});
-    gate_.setLocked(locked_ || sleeping_);
+    // What is attached is looked at when the gate is closed.
+    const bool locked = locked_ || sleeping_;
+    if (!locked) {
+        gate_.setLocked(false);
+    }
     gate_.setClosed(wanted && policy.enabled() && !openUntil_);
+    if (locked) {
+        gate_.setLocked(true);
+    }
     parts_.rearm();
 }
 
@@ -235,6 +242,7 @@ Keystrand::Status Keystrand::status() const {
             .sleeping = sleeping_,
             .restricted = timer.restricted(),
             .closed = gate_.closed(),
+            .gap = gate_.gap(),
             .policy = timer.policy(),
             .untilRestricted = alarm != 0 ? timeUntil(clock_.whenIs(alarm), now()) : std::nullopt,
             .untilClosed = openUntil_ ? timeUntil(*openUntil_, now()) : std::nullopt};

@@ -11,6 +11,7 @@
 #include <cstdint>
 #include <functional>
 #include <optional>
+#include <string>
 
 namespace keystrand::usb {
 
@@ -77,6 +78,8 @@ class Keystrand : private base::NotCopied {
         bool sleeping = false;
         bool restricted = false;
         bool closed = false;
+        /// What is open all the same, in words for people.
+        std::string gap = {};
         RestrictedModePolicy policy;
         /// Until restricted mode, none when no timer runs.
         std::optional<std::chrono::seconds> untilRestricted;

@@ -13,6 +13,7 @@
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <system_error>
+#include <thread>
 #include <unistd.h>
 #include <utility>
 #include <vector>
@@ -242,6 +243,10 @@ bool KeystrandService::restore(const std::string& root, GateLog& log) {
         return true;
     }
     gate.setClosed(false);
+    if (gate.isOpen()) {
+        // What the kernel refused at the last moment mostly comes within that time.
+        std::this_thread::sleep_for(std::chrono::seconds(3));
+    }
     gate.look();
     std::string problem;
     return gate.isOpen() && record.remove(problem);

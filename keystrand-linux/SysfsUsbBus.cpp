@@ -93,6 +93,12 @@ std::uint64_t inodeOf(int directory) {
     return ::fstat(directory, &status) == 0 ? status.st_ino : 0;
 }
 
+/// Whether the directory is that of the device that was seen.
+bool isSeen(int directory, const Attachment& attachment) {
+    return inodeOf(directory) == attachment.inode &&
+           numberAttribute<std::uint32_t>(directory, "devnum") == attachment.number;
+}
+
 /// Where the root hub's controller is, below the directory of all devices.
 std::string controllerOf(const std::string& rootHub, const std::string& root) {
     std::error_code error;
@@ -121,11 +127,35 @@ SysfsUsbBus::SysfsUsbBus(EventLoop& loop, std::string root, GateLog& log, System
       system_(std::move(system)) {}
 
 std::optional<BusView> SysfsUsbBus::look(std::string& problem) {
+    auto view = glance(problem);
+    if (view) {
+        // One that goes while it is read is not there any more.
+        std::erase_if(view->devices, [this](UsbDevice& device) { return !readWhatItSays(device); });
+        said_.clear();
+        for (const UsbDevice& device : view->devices) {
+            if (device.functions.understood) {
+                said_.emplace(device.attachment, device);
+            }
+        }
+    }
+    return view;
+}
+
+std::optional<BusView> SysfsUsbBus::glance(std::string& problem) {
+    problem.clear();
     std::vector<std::string> names;
-    if (!readNames(names, problem)) {
+    const int error = readNames(names, problem);
+    const base::FileDescriptor parameters = openDirectory(parameters_);
+    const bool hasParameter =
+        ::faccessat(parameters.get(), kAuthorizedDefault, F_OK, AT_EACCESS) == 0;
+    if (error == ENOENT && !hasParameter) {
+        return BusView{.hasUsb = false, .rootHubs = {}, .devices = {}};
+    }
+    // The parameter is there before the directory of the devices is.
+    if (error != 0 && error != ENOENT) {
         return std::nullopt;
     }
-    const base::FileDescriptor parameters = openDirectory(parameters_);
+    problem.clear();
     const auto parameter = numberAttribute<AuthorizedDefault>(parameters.get(), kAuthorizedDefault);
     if (!parameter) {
         problem = base::concat(parameters_, '/', kAuthorizedDefault, ": cannot be read");
@@ -155,23 +185,23 @@ std::optional<BusView> SysfsUsbBus::look(std::string& problem) {
     return view;
 }
 
-/// Sorted, so that a hub comes before what is behind it.
-bool SysfsUsbBus::readNames(std::vector<std::string>& names, std::string& problem) const {
+/// The error's number, or 0. Sorted, so that a hub comes before what is behind it.
+int SysfsUsbBus::readNames(std::vector<std::string>& names, std::string& problem) const {
     std::error_code error;
     for (fs::directory_iterator each(devices_, error); !error && each != fs::directory_iterator();
          each.increment(error)) {
         names.push_back(each->path().filename().string());
         if (names.size() > kMostNames) {
             problem = base::concat(devices_, ": more devices than can be looked at");
-            return false;
+            return EFBIG;
         }
     }
     if (error) {
         problem = base::concat(devices_, ": ", errorText(error.value()));
-        return false;
+        return error.value();
     }
     std::sort(names.begin(), names.end());
-    return true;
+    return 0;
 }
 
 std::optional<RootHub> SysfsUsbBus::readRootHub(const std::string& name) const {
@@ -198,30 +228,46 @@ std::optional<UsbDevice> SysfsUsbBus::readDevice(const std::string& name) const 
         return std::nullopt;
     }
     const int fd = directory.get();
-    const SmallFile descriptors = readSmallFile(fd, "descriptors", kDescriptorsLimit);
-    const std::span bytes(reinterpret_cast<const std::uint8_t*>(descriptors.bytes.data()),
-                          descriptors.bytes.size());
-    UsbDevice device{.attachment = {.port = name, .number = 0, .inode = inodeOf(fd)},
-                     .controller = {},
-                     .vendor = identifier(fd, "idVendor"),
-                     .product = identifier(fd, "idProduct"),
-                     .manufacturer = attribute(fd, "manufacturer").value_or(""),
-                     .name = attribute(fd, "product").value_or(""),
-                     .serial = attribute(fd, "serial").value_or(""),
-                     .descriptorsHash = hashOfDescriptors(bytes),
-                     .functions = readDescriptors(bytes),
-                     // What the kernel itself goes by. "removable" also says what the hub above
-                     // says about its ports, and that may be anybody's.
-                     .hardWired = attribute(fd, "port/connect_type") == "hardwired"};
-    // Last, because they are gone with the device: what was read before them was the device's.
     const auto number = numberAttribute<std::uint32_t>(fd, "devnum");
     const auto authorized = numberAttribute<int>(fd, kAuthorized);
     if (!number || !authorized) {
         return std::nullopt;
     }
-    device.attachment.number = *number;
-    device.authorized = *authorized != 0;
-    return device;
+    return UsbDevice{.attachment = {.port = name, .number = *number, .inode = inodeOf(fd)},
+                     .controller = {},
+                     .manufacturer = {},
+                     .name = {},
+                     .serial = {},
+                     .functions = {},
+                     .authorized = *authorized != 0};
+}
+
+/// False when it is not the one that was seen any more. The kernel holds some of this back while it
+/// is busy with the device, or with one behind it.
+bool SysfsUsbBus::readWhatItSays(UsbDevice& device) const {
+    if (const auto said = said_.find(device.attachment); said != said_.end()) {
+        const bool authorized = device.authorized;
+        device = said->second;
+        device.authorized = authorized;
+        return true;
+    }
+    const base::FileDescriptor directory = openDirectory(directoryOf(device.port()));
+    const int fd = directory.get();
+    const SmallFile descriptors = readSmallFile(fd, "descriptors", kDescriptorsLimit);
+    const std::span bytes(reinterpret_cast<const std::uint8_t*>(descriptors.bytes.data()),
+                          descriptors.bytes.size());
+    device.vendor = identifier(fd, "idVendor");
+    device.product = identifier(fd, "idProduct");
+    device.manufacturer = attribute(fd, "manufacturer").value_or("");
+    device.name = attribute(fd, "product").value_or("");
+    device.serial = attribute(fd, "serial").value_or("");
+    device.descriptorsHash = hashOfDescriptors(bytes);
+    device.functions = readDescriptors(bytes);
+    // What the kernel itself goes by. "removable" also says what the hub above says about its
+    // ports, and that may be anybody's.
+    device.hardWired = attribute(fd, "port/connect_type") == "hardwired";
+    // Last, because it is gone with the device: what was read before was the device's.
+    return isSeen(fd, device.attachment);
 }
 
 GateOutcome SysfsUsbBus::setParameter(AuthorizedDefault value) {
@@ -296,9 +342,7 @@ GateOutcome SysfsUsbBus::writeDevice(const base::FileDescriptor& directory, bool
 /// Not open, with ENODEV or the reason in errno, when it is not the one that was seen.
 base::FileDescriptor SysfsUsbBus::openSeen(const Attachment& attachment) const {
     base::FileDescriptor directory = openDirectory(directoryOf(attachment.port));
-    if (directory.isOpen() &&
-        (inodeOf(directory.get()) != attachment.inode ||
-         numberAttribute<std::uint32_t>(directory.get(), "devnum") != attachment.number)) {
+    if (directory.isOpen() && !isSeen(directory.get(), attachment)) {
         directory.reset();
         errno = ENODEV;
     }

@@ -7,6 +7,7 @@
 #include "keystrand-linux/UsbEvents.h"
 
 #include <functional>
+#include <map>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -18,6 +19,8 @@ namespace keystrand::usb {
 /// A device is always the one that was seen: its directory is opened, held against what was seen,
 /// and only then is something in it written; the directory of a device that went stays empty, even
 /// when another one is at its port already. `inUse` is what DevicesInUse says.
+///
+/// What a device says about itself is read once: it does not change as long as the device is there.
 ///
 /// A sysfs that cannot be written is one that cannot be guarded: `look` says so.
 class SysfsUsbBus : public UsbBus {
@@ -35,6 +38,7 @@ class SysfsUsbBus : public UsbBus {
     SysfsUsbBus(EventLoop& loop, std::string root, GateLog& log, System system);
 
     [[nodiscard]] std::optional<BusView> look(std::string& problem) override;
+    [[nodiscard]] std::optional<BusView> glance(std::string& problem) override;
     [[nodiscard]] GateOutcome setParameter(AuthorizedDefault value) override;
     [[nodiscard]] GateOutcome setRootHub(const RootHub& hub, AuthorizedDefault value) override;
     [[nodiscard]] GateOutcome accept(const UsbDevice& device) override;
@@ -45,9 +49,10 @@ class SysfsUsbBus : public UsbBus {
     void watch(Changed changed) override;
 
   private:
-    [[nodiscard]] bool readNames(std::vector<std::string>& names, std::string& problem) const;
+    [[nodiscard]] int readNames(std::vector<std::string>& names, std::string& problem) const;
     [[nodiscard]] std::optional<RootHub> readRootHub(const std::string& name) const;
     [[nodiscard]] std::optional<UsbDevice> readDevice(const std::string& name) const;
+    [[nodiscard]] bool readWhatItSays(UsbDevice& device) const;
     [[nodiscard]] GateOutcome writeDefault(int directory, AuthorizedDefault value) const;
     [[nodiscard]] GateOutcome writeDevice(const base::FileDescriptor& directory,
                                           bool authorized) const;
@@ -61,6 +66,8 @@ class SysfsUsbBus : public UsbBus {
     GateLog& log_;
     System system_;
     std::optional<UsbEvents> events_;
+    /// What the devices said when they were looked at last: they say it once.
+    std::map<Attachment, UsbDevice> said_;
 };
 
 } // namespace keystrand::usb

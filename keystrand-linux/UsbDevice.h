@@ -64,6 +64,8 @@ struct RootHub {
 
 /// One look at everything. What went away while it was taken is not in it.
 struct BusView {
+    /// False on a machine without USB, as long as nobody has loaded it.
+    bool hasUsb = true;
     AuthorizedDefault parameter = kAsTheControllerHasIt;
     std::vector<RootHub> rootHubs;
     /// Each hub before what is behind it.

@@ -17,6 +17,9 @@ using Kind = GateAction::Kind;
 /// at again with its next event.
 constexpr int kMostRounds = 64;
 
+/// Until a bus that could not be looked at is looked at again.
+constexpr BootTime kBlindTime = std::chrono::minutes(1);
+
 /// More than fit into a line nobody wants to read.
 constexpr std::size_t kMostClasses = 50;
 
@@ -34,6 +37,14 @@ std::string quoted(const std::string& text) {
         quoted += isPlain ? std::string(1, each) : base::concat("\\x", base::hexDigits({&byte, 1}));
     }
     return quoted + '"';
+}
+
+std::string listOf(const std::vector<std::string>& parts) {
+    std::string list;
+    for (const std::string& part : parts) {
+        list += base::concat(list.empty() ? "" : ", ", part);
+    }
+    return list;
 }
 
 std::string_view reasonFor(Standing standing) {
@@ -93,6 +104,7 @@ std::optional<GateRecord> UsbGate::resume() {
                                       "; what is attached counts as accepted"));
     }
     record_ = record.value_or(GateRecord());
+    toldClosed_ = record_.gate.phase != GateState::Phase::open;
     savedRecord_ = record ? *text : std::string();
     policy_.resume(record_.gate);
     watchAsNeeded();
@@ -101,32 +113,30 @@ std::optional<GateRecord> UsbGate::resume() {
 
 void UsbGate::setClosed(bool closed) {
     wantsClosed_ = closed;
-    if (closed == policy_.closed()) {
-        watchAsNeeded();
-        return;
+    if (closed != policy_.closed()) {
+        toldFailures_.clear();
     }
-    if (!closed) {
+    if (!closed && policy_.state().phase != GateState::Phase::open) {
+        // Also what an earlier service had begun.
         policy_.open();
-    } else if (const auto view = lookAtBus()) {
-        // First of all what is there now: whatever comes from here on is new.
-        watchAsNeeded();
-        policy_.close(*view, parts_.now());
-        saveDevices(*view);
-    } else {
-        // Until there is USB.
-        watchAsNeeded();
-        return;
+        settle();
+    } else if (closed && !policy_.closed()) {
+        if (const auto view = lookAtBus(&UsbBus::glance)) {
+            // First of all what is there now: whatever comes from here on is new.
+            policy_.close(*view, parts_.now());
+            watchAsNeeded();
+            settle();
+        } else {
+            parts_.rearm();
+        }
     }
-    settle();
-    parts_.log.write(closed ? GateLine::closed : GateLine::opened,
-                     closed ? "keystrand: the gate is closed" : "keystrand: the gate is open");
     watchAsNeeded();
 }
 
 void UsbGate::setLocked(bool locked) {
-    locked_ = locked;
+    const bool isNews = std::exchange(locked_, locked) != locked;
     watchAsNeeded();
-    if (locked_) {
+    if (isNews && locked_ && !policy_.closed()) {
         look();
     }
 }
@@ -189,8 +199,9 @@ std::optional<std::string> UsbGate::accept(const Attachment& attachment) {
 
 void UsbGate::look() {
     if (wantsClosed_ && !policy_.closed()) {
+        // It was not to be seen until now.
         setClosed(true);
-    } else if (!isOpen() || policy_.awaitsLate()) {
+    } else if (policy_.state().phase != GateState::Phase::open) {
         settle();
         watchAsNeeded();
     } else if (locked_) {
@@ -203,8 +214,9 @@ void UsbGate::look() {
 std::vector<UsbGate::Listed> UsbGate::list() {
     std::vector<Listed> listed;
     const BusView view = lookAtBus().value_or(BusView());
+    listed.reserve(view.devices.size());
     for (const UsbDevice& device : view.devices) {
-        const KnownDevice* const known = policy_.find(device.attachment);
+        const KnownDevice* const known = isOpen() ? nullptr : policy_.find(device.attachment);
         listed.push_back({.device = device,
                           .standing = known ? std::optional(known->standing) : std::nullopt,
                           .since = known ? known->since : BootTime(0)});
@@ -212,21 +224,37 @@ std::vector<UsbGate::Listed> UsbGate::list() {
     return listed;
 }
 
-std::optional<BusView> UsbGate::lookAtBus() {
-    std::string problem;
-    auto view = parts_.bus.look(problem);
-    if (!view && problem != toldProblem_) {
-        parts_.log.write(GateLine::cannotGuard,
-                         base::concat("keystrand: no port is guarded: ", problem));
-    }
-    toldProblem_ = view ? std::string() : problem;
-    blindSince_ = view ? std::nullopt : std::optional(parts_.now());
-    return view;
+std::size_t UsbGate::countRefused() {
+    const BusView view = lookAtBus(&UsbBus::glance).value_or(BusView());
+    return static_cast<std::size_t>(
+        std::count_if(view.devices.begin(), view.devices.end(),
+                      [](const UsbDevice& device) { return !device.authorized; }));
+}
+
+std::string UsbGate::gap() const {
+    return wantsClosed_ && !toldProblem_.empty() ? toldProblem_ : listOf(policy_.gaps());
 }
 
 std::optional<BootTime> UsbGate::nextLook() const {
     const auto next = policy_.nextLook();
-    return next && blindSince_ ? std::max(*next, *blindSince_ + GatePolicy::kRetryTime) : next;
+    const bool isDone = policy_.state().phase == GateState::Phase::open && !wantsClosed_;
+    if (!blindSince_ || isDone) {
+        return next;
+    }
+    return std::max(next.value_or(*blindSince_ + kBlindTime),
+                    *blindSince_ + GatePolicy::kRetryTime);
+}
+
+std::optional<BusView> UsbGate::lookAtBus(Look at) {
+    std::string problem;
+    auto view = (parts_.bus.*at)(problem);
+    if (!problem.empty() && problem != toldProblem_) {
+        parts_.log.write(GateLine::cannotGuard,
+                         base::concat("keystrand: no port is guarded: ", problem));
+    }
+    toldProblem_ = problem;
+    blindSince_ = view ? std::nullopt : std::optional(parts_.now());
+    return view;
 }
 
 void UsbGate::settle() {
@@ -238,20 +266,33 @@ void UsbGate::settle() {
     }
     settling_ = false;
     save();
+    tellState();
+    watchAsNeeded();
     parts_.rearm();
 }
 
 bool UsbGate::step() {
+    const BootTime now = parts_.now();
+    if (policy_.closed()) {
+        // What devices say may take as long as they like.
+        const auto glance = lookAtBus(&UsbBus::glance);
+        if (!glance || carryOut(policy_.decideDefaults(*glance, now), now)) {
+            return glance.has_value();
+        }
+    }
     const auto view = lookAtBus();
     if (!view) {
-        policy_.endLate(parts_.now());
+        policy_.endLate(now);
         return false;
     }
-    const BootTime now = parts_.now();
     const auto actions = policy_.decide(*view, now);
-    if (actions.empty() && locked_) {
+    if (actions.empty() && (locked_ || policy_.closed())) {
         saveDevices(*view);
     }
+    return carryOut(actions, now);
+}
+
+bool UsbGate::carryOut(const std::vector<GateAction>& actions, BootTime now) {
     save();
     for (const GateAction& action : actions) {
         const GateOutcome outcome = carryOut(action);
@@ -259,6 +300,28 @@ bool UsbGate::step() {
         tell(action, outcome);
     }
     return !actions.empty();
+}
+
+/// The gate is what was read back, not what was wished.
+void UsbGate::tellState() {
+    const bool isClosed = policy_.closed();
+    std::string gap = listOf(policy_.gaps());
+    if (isClosed ? !toldProblem_.empty() : !policy_.isPutBack() && gap.empty()) {
+        // Nobody knows yet.
+        return;
+    }
+    if (toldClosed_ == isClosed && toldGap_ == gap) {
+        return;
+    }
+    toldClosed_ = isClosed;
+    toldGap_ = std::move(gap);
+    const std::string exceptions =
+        toldGap_.empty() ? std::string() : base::concat(", but for ", toldGap_);
+    if (isClosed) {
+        parts_.log.write(GateLine::closed, "keystrand: the gate is closed" + exceptions);
+    } else {
+        parts_.log.write(GateLine::opened, "keystrand: the gate is open" + exceptions);
+    }
 }
 
 GateOutcome UsbGate::carryOut(const GateAction& action) {
@@ -289,15 +352,21 @@ void UsbGate::tell(const GateAction& action, const GateOutcome& outcome) {
     const std::string what = isParameter
                                  ? "the parameter authorized_default"
                                  : base::concat("root hub usb", std::to_string(action.hub.bus));
+    if (outcome.kind == GateOutcome::Kind::done && outcome.readBack == action.value) {
+        return;
+    }
     if (outcome.kind == GateOutcome::Kind::failed) {
-        parts_.log.write(GateLine::writeFailed,
-                         base::concat("keystrand: ", what, " cannot be set to ",
-                                      std::to_string(action.value), ": ", outcome.reason));
-    } else if (outcome.readBack != action.value) {
-        parts_.log.write(GateLine::writeFailed,
-                         base::concat("keystrand: ", what, " was set to ",
-                                      std::to_string(action.value), " and reads ",
-                                      std::to_string(outcome.readBack)));
+        tellFailure(base::concat("keystrand: ", what, " cannot be set to ",
+                                 std::to_string(action.value), ": ", outcome.reason));
+    } else {
+        tellFailure(base::concat("keystrand: ", what, " was set to ", std::to_string(action.value),
+                                 " and reads ", std::to_string(outcome.readBack)));
+    }
+}
+
+void UsbGate::tellFailure(const std::string& line) {
+    if (toldFailures_.insert(line).second) {
+        parts_.log.write(GateLine::writeFailed, line);
     }
 }
 
@@ -316,9 +385,8 @@ void UsbGate::tellDevice(const GateAction& action, const GateOutcome& outcome) {
                          base::concat("keystrand: left ", device, ": in use: ", outcome.reason));
         return;
     case GateOutcome::Kind::failed:
-        parts_.log.write(GateLine::writeFailed,
-                         base::concat("keystrand: cannot ", isAccepted ? "accept " : "refuse ",
-                                      device, ": ", outcome.reason));
+        tellFailure(base::concat("keystrand: cannot ", isAccepted ? "accept " : "refuse ", device,
+                                 ": ", outcome.reason));
         return;
     case GateOutcome::Kind::vanished:
         return;
@@ -363,7 +431,7 @@ void UsbGate::saveDevices(const BusView& view) {
 
 void UsbGate::watchAsNeeded() {
     // Nothing wakes the service while the gate is open and nobody will ask what was attached.
-    const bool wanted = locked_ || wantsClosed_ || !isOpen() || policy_.awaitsLate();
+    const bool wanted = locked_ || wantsClosed_ || policy_.state().phase != GateState::Phase::open;
     if (wanted == watching_) {
         return;
     }

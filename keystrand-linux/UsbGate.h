@@ -9,6 +9,7 @@
 
 #include <functional>
 #include <optional>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -39,10 +40,15 @@ class UsbGate : private base::NotCopied {
     /// the bus. None when there is none, or, with a line, none that can be understood.
     std::optional<GateRecord> resume();
 
-    /// Closes or opens; nothing when it is so already. Where there is no USB, it closes as soon as
-    /// there is; what is attached then stays.
+    /// Closes or opens; nothing when it is so already. Where there is no USB, all that comes with
+    /// it is new. Where it cannot be read or written, the gate closes as soon as it can, and what
+    /// is attached then stays.
+    ///
+    /// What devices say about themselves is read when the parameter and the root hubs are closed:
+    /// one that hangs has nothing wait that closes.
     void setClosed(bool closed);
-    /// While the machine is locked each change of what is attached is kept for the next start.
+    /// While the machine is locked each change of what is attached is kept for the next start. To
+    /// be said after `setClosed`, as it looks at the devices.
     void setLocked(bool locked);
     /// From now on the devices that are in are kept for the next start of the machine. Until then
     /// what the last one has left is not touched.
@@ -69,14 +75,23 @@ class UsbGate : private base::NotCopied {
         BootTime since{0};
     };
     [[nodiscard]] std::vector<Listed> list();
-    [[nodiscard]] bool closed() const { return policy_.closed(); }
+    /// How many devices are out.
+    [[nodiscard]] std::size_t countRefused();
+    [[nodiscard]] bool closed() const { return policy_.closed() && toldProblem_.empty(); }
+    /// What is open all the same while the gate is to be closed, or closed though it is to be open,
+    /// in words for people; empty when nothing is.
+    [[nodiscard]] std::string gap() const;
     /// Nothing that this service wrote is left to be put back.
-    [[nodiscard]] bool isOpen() const { return policy_.state().phase == GateState::Phase::open; }
+    [[nodiscard]] bool isOpen() const { return policy_.isPutBack(); }
 
   private:
-    [[nodiscard]] std::optional<BusView> lookAtBus();
+    using Look = std::optional<BusView> (UsbBus::*)(std::string& problem);
+    [[nodiscard]] std::optional<BusView> lookAtBus(Look at = &UsbBus::look);
     void settle();
     [[nodiscard]] bool step();
+    [[nodiscard]] bool carryOut(const std::vector<GateAction>& actions, BootTime now);
+    void tellState();
+    void tellFailure(const std::string& line);
     [[nodiscard]] GateOutcome carryOut(const GateAction& action);
     void tell(const GateAction& action, const GateOutcome& outcome);
     void tellDevice(const GateAction& action, const GateOutcome& outcome);
@@ -91,10 +106,15 @@ class UsbGate : private base::NotCopied {
     std::string savedRecord_;
     std::optional<std::string> savedDevices_;
     std::string toldProblem_;
-    /// When the bus was looked at last, if it could not be seen.
-    std::optional<BootTime> blindSince_;
+    /// Whether the gate was said to be closed, and what is said to be otherwise.
+    bool toldClosed_ = false;
+    std::string toldGap_;
+    /// The failures of this closing or opening; each is told once, however often it is met.
+    std::set<std::string> toldFailures_;
     bool keepsDevices_ = false;
     bool locked_ = false;
+    /// When the bus was looked at last, if it could not be seen.
+    std::optional<BootTime> blindSince_;
     /// What was said last, whether it could be done or not.
     bool wantsClosed_ = false;
     bool watching_ = false;

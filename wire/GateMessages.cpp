@@ -93,7 +93,8 @@ std::string encoded(const GateStatus& status) {
     }
     return text + timeLine("until-restricted", status.untilRestricted) +
            timeLine("until-closed", status.untilClosed) +
-           base::concat("refused ", std::to_string(status.refused), '\n');
+           base::concat("refused ", std::to_string(status.refused), '\n') +
+           (status.gap.empty() ? std::string() : base::concat("gap ", hexText(status.gap), '\n'));
 }
 
 std::optional<GateDevices> decodedDevices(const std::vector<std::string_view>& lines) {
@@ -121,6 +122,8 @@ bool takeStatusLine(GateStatus& status, std::string_view line) {
         status.untilClosed = words.number<std::uint64_t>();
     } else if (word == "refused") {
         status.refused = words.number<std::uint32_t>();
+    } else if (word == "gap") {
+        status.gap = words.bytes();
     } else {
         return false;
     }

@@ -85,6 +85,8 @@ struct GateStatus {
     std::optional<std::uint64_t> untilClosed = std::nullopt;
     /// Devices that are out.
     std::uint32_t refused = 0;
+    /// What is open though all is to be closed, in words for people; empty when nothing is.
+    std::string gap = {};
 
     bool operator==(const GateStatus&) const = default;
 };

@@ -11,6 +11,8 @@ namespace kstctl {
 
 namespace {
 
+constexpr char kNotClosed[] = "it could not be closed";
+
 void join(std::string& text, bool isSo, std::string_view part) {
     if (isSo) {
         text += base::concat(text.empty() ? "" : ", ", part);
@@ -40,7 +42,14 @@ std::string whyOpen(const wire::GateStatus& status) {
     if (!whyOff(status).empty()) {
         return "the policy is off";
     }
-    return whyClosed(status).empty() ? std::string() : "it could not be closed";
+    return whyClosed(status).empty() ? std::string() : kNotClosed;
+}
+
+const char* modeOf(const wire::GateStatus& status) {
+    if (status.gap.empty() || (!status.closed && whyOpen(status) == kNotClosed)) {
+        return status.closed ? "closed" : "open";
+    }
+    return status.closed ? "partly closed" : "partly open";
 }
 
 void addSeconds(Report& report, const char* name, const std::optional<std::uint64_t>& seconds,
@@ -55,15 +64,16 @@ void addSeconds(Report& report, const char* name, const std::optional<std::uint6
 
 void addStatus(Report& report, const wire::GateStatus& status, platform::Date now) {
     const std::string off = whyOff(status);
-    report
-        .add("mode", status.closed ? "closed" : "open",
-             status.closed ? whyClosed(status) : whyOpen(status))
+    report.add("mode", modeOf(status), status.closed ? whyClosed(status) : whyOpen(status))
         .add("isRestricted", status.restricted)
         .add("isStarting", status.starting)
         .add("isSleeping", status.sleeping)
         .add("isLocked", status.locked);
     addSeconds(report, "untilRestricted", status.untilRestricted, now);
     addSeconds(report, "untilClosed", status.untilClosed, now);
+    if (!status.gap.empty()) {
+        report.add("exceptions", status.gap);
+    }
     report.add("policy", off.empty() ? "on" : "off", off).add("refused", status.refused);
 }
 

@@ -11,6 +11,7 @@
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <unistd.h>
+#include <utility>
 
 namespace keystrand::usb {
 
@@ -76,18 +77,18 @@ fs::path FakeSysfs::directoryOf(const std::string& name) const {
 }
 
 void FakeSysfs::show() {
-    std::string problem;
-    const auto now = machine_.look(problem);
-    fs::path whole = devices().parent_path();
-    const fs::path away = root_ / "no-usb";
-    if (!now) {
-        fs::rename(whole, away);
+    if (std::exchange(hidden_, machine_.isMissing()) != hidden_) {
+        // The kernel has neither the bus nor the module's parameters then.
+        const fs::path places[] = {devices().parent_path(), parameter().parent_path()};
+        for (const fs::path& place : places) {
+            const fs::path away = root_ / base::concat("no-", place.filename().string());
+            hidden_ ? fs::rename(place, away) : fs::rename(away, place);
+        }
+    }
+    if (hidden_) {
         return;
     }
-    if (fs::exists(away)) {
-        fs::rename(away, whole);
-    }
-    view_ = *now;
+    view_ = machine_.present();
     std::map<std::string, std::uint64_t> present;
     for (const RootHub& hub : view_.rootHubs) {
         present[base::concat("usb", hub.bus)] = hub.inode;

@@ -61,6 +61,7 @@ class FakeSysfs {
     FakeUsbBus machine_;
     /// What is shown now.
     BusView view_;
+    bool hidden_ = false;
     /// What the directories stand for: "usb1", "1-2.3", and the inode that the machine gives.
     std::map<std::string, std::uint64_t> shown_;
     std::map<std::string, std::string> places_;

@@ -93,6 +93,7 @@ void FakeUsbBus::unplug(const std::string& port) {
         if (at == port || isBehind(at, port)) {
             plugs_.erase(at);
             seen_.erase(at);
+            unseen_.erase(at);
         }
     }
     tell();
@@ -130,12 +131,46 @@ AuthorizedDefault FakeUsbBus::rootHubDefault(std::uint32_t bus) const {
     return rootHubs_.at(bus).authorizedDefault;
 }
 
+void FakeUsbBus::setMissing(bool missing) {
+    missing_ = missing;
+    if (missing) {
+        parameter_ = kAsTheControllerHasIt;
+    }
+}
+
 std::optional<BusView> FakeUsbBus::look(std::string& problem) {
+    auto view = glance(problem);
+    if (view && hanging_ && !view->devices.empty()) {
+        hanging_();
+    }
+    return view && view->hasUsb ? present() : view;
+}
+
+std::optional<BusView> FakeUsbBus::glance(std::string& problem) {
     happen();
-    if (missing_) {
-        problem = "no USB here";
+    problem.clear();
+    if (unreadable_) {
+        problem = "it cannot be read";
         return std::nullopt;
     }
+    if (missing_) {
+        problem = "no USB here";
+        return BusView{.hasUsb = false, .rootHubs = {}, .devices = {}};
+    }
+    BusView view = present();
+    for (UsbDevice& device : view.devices) {
+        device = UsbDevice{.attachment = device.attachment,
+                           .controller = device.controller,
+                           .manufacturer = {},
+                           .name = {},
+                           .serial = {},
+                           .functions = {},
+                           .authorized = device.authorized};
+    }
+    return view;
+}
+
+BusView FakeUsbBus::present() const {
     BusView view{.parameter = parameter_, .rootHubs = {}, .devices = {}};
     for (const auto& [bus, hub] : rootHubs_) {
         view.rootHubs.push_back(hub);

@@ -58,13 +58,18 @@ class FakeUsbBus : public UsbBus {
     /// The kernel knows 0 and 1 only.
     void knowOnlyTwoValues() { twoValues_ = true; }
     /// Writes to the parameter and to root hubs fail, or are taken and change nothing.
-    void failDefaults() { defaultsFail_ = true; }
+    void failDefaults(bool fail = true) { defaultsFail_ = fail; }
     void ignoreDefaults() { defaultsAreIgnored_ = true; }
     /// Each write to a device fails that many times.
     void failWrites(unsigned count) { failures_ = count; }
-    void setMissing(bool missing) { missing_ = missing; }
+    /// Nobody has loaded USB, or it is unloaded: then the next one knows nothing of this one.
+    void setMissing(bool missing);
+    /// It is there and cannot be looked at.
+    void setUnreadable(bool unreadable) { unreadable_ = unreadable; }
     /// Called before each look and each write: what happens in between.
     void setMeanwhile(std::function<void()> meanwhile) { meanwhile_ = std::move(meanwhile); }
+    /// Called whenever what devices say is read: how long they take is theirs.
+    void setHanging(std::function<void()> hanging) { hanging_ = std::move(hanging); }
 
     [[nodiscard]] bool isPlugged(const std::string& port) const { return plugs_.contains(port); }
     /// False also for what is not seen.
@@ -79,7 +84,12 @@ class FakeUsbBus : public UsbBus {
     [[nodiscard]] const std::vector<std::string>& writes() const { return writes_; }
     void forgetWrites() { writes_.clear(); }
 
+    /// What a look shows, without anything happening.
+    [[nodiscard]] BusView present() const;
+    [[nodiscard]] bool isMissing() const { return missing_; }
+
     [[nodiscard]] std::optional<BusView> look(std::string& problem) override;
+    [[nodiscard]] std::optional<BusView> glance(std::string& problem) override;
     [[nodiscard]] GateOutcome setParameter(AuthorizedDefault value) override;
     [[nodiscard]] GateOutcome setRootHub(const RootHub& hub, AuthorizedDefault value) override;
     [[nodiscard]] GateOutcome accept(const UsbDevice& device) override;
@@ -118,8 +128,10 @@ class FakeUsbBus : public UsbBus {
     bool defaultsFail_ = false;
     bool defaultsAreIgnored_ = false;
     bool missing_ = false;
+    bool unreadable_ = false;
     unsigned failures_ = 0;
     std::function<void()> meanwhile_;
+    std::function<void()> hanging_;
     Changed changed_;
     std::vector<std::string> writes_;
 };

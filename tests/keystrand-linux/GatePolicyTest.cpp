@@ -19,6 +19,14 @@ class GatePolicyTest : public testing::Test {
 
     void with(const GateRules& rules) { gate.emplace(bus, rules); }
 
+    /// And nothing is remembered any more when nothing can come late.
+    void expectOpen() {
+        EXPECT_TRUE(gate->policy.isPutBack());
+        gate->pass(GatePolicy::kLateTime);
+        EXPECT_EQ(gate->policy.state(), GateState());
+        EXPECT_EQ(gate->policy.nextLook(), std::nullopt);
+    }
+
     FakeUsbBus bus;
     std::optional<GateOnBus> gate{std::in_place, bus, GateRules{}};
 };
@@ -31,7 +39,7 @@ TEST_F(GatePolicyTest, ParameterFirstThenEachRootHub) {
     EXPECT_EQ(bus.writes(), Writes());
     gate->open();
     EXPECT_EQ(bus.writes(), (Writes{"parameter=-1", "usb1=1", "usb2=1"}));
-    EXPECT_EQ(gate->policy.state(), GateState());
+    expectOpen();
 }
 
 TEST_F(GatePolicyTest, HardWiredPortsAreClosedTooWhenTheRulesSaySo) {
@@ -97,33 +105,60 @@ TEST_F(GatePolicyTest, HardWiredPortThatIsClosedTooGetsNothing) {
     EXPECT_FALSE(bus.isAuthorized("1-1"));
 }
 
-TEST_F(GatePolicyTest, DefaultsThatCannotBeWrittenAreGivenUp) {
+TEST_F(GatePolicyTest, DefaultsThatCannotBeWrittenAreTriedAgain) {
     bus.failDefaults();
     gate->close();
     bus.plug("1-1", aDisk());
     gate->settle();
     // It came in, and is taken back.
     EXPECT_FALSE(bus.isAuthorized("1-1"));
+    EXPECT_EQ(gate->policy.nextLook(), gate->now() + 10s);
+    bus.failDefaults(false);
+    gate->pass(10s - 1us);
+    EXPECT_EQ(bus.rootHubDefault(1), kEverybody);
+    gate->pass(1us);
+    EXPECT_EQ(bus.parameter(), kHardWiredOnly);
+    EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
+    EXPECT_EQ(gate->policy.nextLook(), std::nullopt);
     gate->open();
     EXPECT_TRUE(bus.isAuthorized("1-1"));
-    EXPECT_EQ(gate->policy.state(), GateState());
+    expectOpen();
 }
 
-TEST_F(GatePolicyTest, DefaultsThatCannotBePutBackAreGivenUp) {
+TEST_F(GatePolicyTest, DefaultsThatCannotBePutBackAreTriedAgain) {
     gate->close();
+    bus.plug("1-1", aDisk());
+    gate->settle();
     bus.failDefaults();
     gate->open();
+    bus.addRootHub(3);
+    gate->settle();
     EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
-    EXPECT_EQ(gate->policy.state(), GateState());
+    EXPECT_EQ(gate->policy.gaps(),
+              (std::vector<std::string>{"the parameter authorized_default", "root hub usb1",
+                                        "root hub usb2", "root hub usb3"}));
+    // The first of them failed when it was opened.
+    EXPECT_EQ(gate->policy.nextLook(), gate->now() + 10s);
+    EXPECT_FALSE(gate->policy.isPutBack());
+    bus.failDefaults(false);
+    gate->pass(10s);
+    EXPECT_EQ(bus.parameter(), kAsTheControllerHasIt);
+    EXPECT_EQ(bus.rootHubDefault(1), kEverybody);
+    EXPECT_EQ(bus.rootHubDefault(3), kEverybody);
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+    EXPECT_TRUE(gate->policy.isPutBack());
+    gate->pass(GatePolicy::kLateTime);
+    expectOpen();
+    EXPECT_EQ(gate->policy.nextLook(), std::nullopt);
 }
 
-TEST_F(GatePolicyTest, DefaultsThatReadWhatTheyLikeAreGivenUp) {
+TEST_F(GatePolicyTest, DefaultsThatReadWhatTheyLikeAreNotWrittenWithoutEnd) {
     bus.ignoreDefaults();
     gate->close();
     EXPECT_EQ(bus.writes(),
               (Writes{"parameter=2", "usb1=2", "usb2=2", "parameter=0", "usb1=0", "usb2=0"}));
     gate->open();
-    EXPECT_EQ(gate->policy.state(), GateState());
+    expectOpen();
 }
 
 TEST_F(GatePolicyTest, WhatIsAttachedStays) {
@@ -211,7 +246,7 @@ TEST_F(GatePolicyTest, RootHubThatGoesIsForgotten) {
     gate->settle();
     EXPECT_EQ(gate->policy.state().hubs.size(), 1U);
     gate->open();
-    EXPECT_EQ(gate->policy.state(), GateState());
+    expectOpen();
 }
 
 TEST_F(GatePolicyTest, RefusedAreLetInWhenItOpensHubsFirst) {
@@ -235,6 +270,43 @@ TEST_F(GatePolicyTest, RefusedStayOutWhenTheyAreToBePluggedAgain) {
     gate->open();
     EXPECT_FALSE(bus.isAuthorized("1-1"));
     bus.replug("1-1");
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+}
+
+TEST_F(GatePolicyTest, WhatIsRefusedBetweenTheLookAndTheWriteIsLetIn) {
+    gate->close();
+    gate->meanwhile(1, [&] { bus.plug("1-1", aDisk()); });
+    gate->open();
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+    expectOpen();
+}
+
+TEST_F(GatePolicyTest, WhatOthersRefuseWhenItOpensIsTheirs) {
+    bus.setRootHubDefault(1, kNobody);
+    gate->close();
+    gate->policy.open();
+    gate->settle();
+    bus.plug("1-1", aDisk());
+    gate->settle();
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+}
+
+TEST_F(GatePolicyTest, WhatSomebodyElseOpenedIsClosedWhenItClosesAgain) {
+    gate->close();
+    gate->policy.open();
+    bus.setRootHubDefault(1, kEverybody);
+    gate->close();
+    EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
+    EXPECT_EQ(bus.parameter(), kHardWiredOnly);
+}
+
+TEST_F(GatePolicyTest, KeyboardThatCouldNotBeAcceptedIsLetInWhenItOpens) {
+    gate->close();
+    bus.failWrites(1);
+    bus.plug("1-1", aKeyboard());
+    gate->settle();
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+    gate->open();
     EXPECT_TRUE(bus.isAuthorized("1-1"));
 }
 
@@ -609,15 +681,18 @@ TEST_F(GatePolicyTest, NextServiceLetsInWhatWasStillToBeLetIn) {
     gate->settle();
     gate->policy.open();
     // Each step in turn is the last one.
-    for (int step = 0; gate->policy.state() != GateState(); ++step) {
+    int step = 0;
+    for (bool goesOn = true; goesOn; ++step) {
         ASSERT_LT(step, 5);
         const GateState left = gate->policy.state();
-        gate->step();
+        goesOn = gate->step();
         if (step == 1) {
             with({});
             gate->policy.resume(left);
         }
     }
+    EXPECT_GT(step, 2);
+    EXPECT_TRUE(gate->policy.isPutBack());
     EXPECT_TRUE(bus.isAuthorized("1-1"));
     EXPECT_TRUE(bus.isAuthorized("1-2"));
 }
@@ -644,7 +719,7 @@ TEST_F(GatePolicyTest, RefusedBeforeItOpensAndSeenAfterwards) {
     bus.plugUnseen("1-1", aDisk());
     bus.plugUnseen("1-2", aHub());
     gate->open();
-    EXPECT_EQ(gate->policy.state(), GateState());
+    EXPECT_TRUE(gate->policy.isPutBack());
     bus.show("1-1");
     ASSERT_FALSE(bus.isAuthorized("1-1"));
     gate->pass(GatePolicy::kLateTime - 1us);
@@ -726,7 +801,7 @@ TEST_F(GatePolicyTest, RootHubThatCameClosedIsOpenedAlsoAfterTheGateWasClosedOnc
     EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
 }
 
-TEST_F(GatePolicyTest, RootHubThatCannotBeOpenedIsTriedOnce) {
+TEST_F(GatePolicyTest, RootHubThatCannotBeOpenedIsNotTriedWithoutEnd) {
     gate->close();
     gate->open();
     bus.setParameterDefault(kHardWiredOnly);

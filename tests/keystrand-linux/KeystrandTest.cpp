@@ -482,8 +482,7 @@ TEST_F(KeystrandTest, ListenerIsAwayAndTheLastStateHolds) {
 TEST_F(KeystrandTest, UnlockedMachineIsLeftAlone) {
     begin();
     acknowledge();
-    clocks.pass(10s);
-    keystrand->wake();
+    pass(10s);
     EXPECT_FALSE(bus.isWatched());
     // Nothing but the figures' period, a day later.
     EXPECT_GE(keystrand->nextWake() - clocks.boot, 86000s);

@@ -151,7 +151,18 @@ TEST_F(SysfsUsbBusTest, ReasonsWhyNothingCanBeGuarded) {
     fs::remove(parameter);
     EXPECT_EQ(problemOfLook(), parameter + ": cannot be read");
     fs::remove_all(sysfs.devices());
-    EXPECT_EQ(problemOfLook(), sysfs.devices().string() + ": No such file or directory");
+    std::string problem;
+    const auto without = bus.look(problem);
+    ASSERT_TRUE(without);
+    EXPECT_FALSE(without->hasUsb);
+    EXPECT_EQ(problem, sysfs.devices().string() + ": No such file or directory");
+    put(sysfs.devices(), "no directory");
+    EXPECT_EQ(problemOfLook(), sysfs.devices().string() + ": Not a directory");
+    // The module is loaded, and has not made its bus yet.
+    fs::remove(sysfs.devices());
+    put(parameter, "-1\n");
+    EXPECT_TRUE(look().hasUsb);
+    EXPECT_EQ(look().parameter, kAsTheControllerHasIt);
 }
 
 TEST_F(SysfsUsbBusTest, SysfsThatCannotBeWrittenSaysSo) {
@@ -457,14 +468,14 @@ TEST_F(KernelEventsTest, LostEventsLeadToALook) {
 
 /// The gate before this bus, as it stands in a machine.
 TEST_F(SysfsUsbBusTest, GateRefusesWhatComesAndLetsItInAgain) {
-    BootTime now(1);
     const StateFile record(directory.file("gate"), StateFile::Durability::none);
     const StateFile devices(directory.file("devices"), StateFile::Durability::none);
+    BootTime now(1);
     UsbGate gate({.bus = bus,
                   .record = record,
                   .devices = devices,
                   .log = log,
-                  .now = [&] { return now; },
+                  .now = [&now] { return now; },
                   .rearm =
                       [] {
                       }},
@@ -481,12 +492,11 @@ TEST_F(SysfsUsbBusTest, GateRefusesWhatComesAndLetsItInAgain) {
     EXPECT_EQ(machine.rootHubDefault(2), kHardWiredOnly);
     gate.setClosed(false);
     turnAll(*loop);
+    now += GatePolicy::kLateTime;
+    gate.look();
     EXPECT_TRUE(machine.isAuthorized("1-2"));
     EXPECT_EQ(machine.rootHubDefault(1), kEverybody);
     EXPECT_EQ(machine.parameter(), kAsTheControllerHasIt);
-    now += GatePolicy::kLateTime;
-    machine.plug("1-3", aMouse());
-    turnAll(*loop);
     EXPECT_FALSE(sysfs.isHeard());
     EXPECT_EQ(log.lines,
               (Lines{"keystrand: the gate is closed",

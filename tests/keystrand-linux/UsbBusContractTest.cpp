@@ -310,12 +310,40 @@ TEST_P(UsbBusContract, WriteThatFailsSaysWhy) {
 TEST_P(UsbBusContract, MachineWithoutUsbHasAReason) {
     machine.setMissing(true);
     bench->show();
-    std::string problem;
-    EXPECT_FALSE(bus.look(problem));
-    EXPECT_NE(problem, "");
+    for (const auto look : {&UsbBus::look, &UsbBus::glance}) {
+        std::string problem;
+        const auto view = (bus.*look)(problem);
+        ASSERT_TRUE(view);
+        EXPECT_FALSE(view->hasUsb);
+        EXPECT_TRUE(view->rootHubs.empty());
+        EXPECT_NE(problem, "");
+    }
     machine.setMissing(false);
     bench->show();
+    EXPECT_TRUE(look().hasUsb);
     EXPECT_EQ(look().rootHubs.size(), 1U);
+}
+
+TEST_P(UsbBusContract, GlanceShowsWhatNoDeviceIsAskedFor) {
+    machine.plug("1-1", aMouse());
+    machine.setRootHubDefault(1, kNobody);
+    machine.plug("1-2", aDisk());
+    bench->show();
+    std::string problem = "of the last one";
+    const auto glance = bus.glance(problem);
+    ASSERT_TRUE(glance);
+    EXPECT_EQ(problem, "");
+    const BusView whole = look();
+    EXPECT_EQ(glance->parameter, whole.parameter);
+    EXPECT_EQ(glance->rootHubs, whole.rootHubs);
+    ASSERT_EQ(glance->devices.size(), 2U);
+    for (std::size_t index = 0; index < 2; ++index) {
+        EXPECT_EQ(glance->devices[index].attachment, whole.devices[index].attachment);
+        EXPECT_EQ(glance->devices[index].authorized, whole.devices[index].authorized);
+        EXPECT_EQ(glance->devices[index].vendor, 0);
+        EXPECT_EQ(glance->devices[index].name, "");
+        EXPECT_EQ(glance->devices[index].functions, UsbFunctions());
+    }
 }
 
 TEST_P(UsbBusContract, ChangesAreToldUntilNobodyWatches) {

@@ -50,6 +50,13 @@ class UsbGateTest : public testing::Test {
         return gate->resume();
     }
 
+    /// Until nothing that was refused can come any more.
+    void open() {
+        gate->setClosed(false);
+        now += GatePolicy::kLateTime;
+        gate->look();
+    }
+
     std::optional<GateRecord> recordOnDisk() {
         std::string problem;
         const auto text = record.read(problem);
@@ -80,7 +87,7 @@ TEST_F(UsbGateTest, ClosesAndOpensWithALineEach) {
     gate->setClosed(true);
     EXPECT_EQ(log.take(), Lines{"keystrand: the gate is closed"});
     gate->setClosed(true);
-    gate->setClosed(false);
+    open();
     EXPECT_EQ(log.take(), Lines{"keystrand: the gate is open"});
     EXPECT_EQ(recordOnDisk(), GateRecord());
     gate->setClosed(false);
@@ -168,8 +175,7 @@ TEST_F(UsbGateTest, KilledAtEachMomentTheNextServiceGoesOn) {
         EXPECT_EQ(bus.rootHubDefault(1), wanted) << moment;
         EXPECT_EQ(bus.rootHubDefault(2), wanted) << moment;
         EXPECT_TRUE(bus.isAuthorized("1-1")) << moment;
-        gate->setClosed(false);
-        gate->look();
+        open();
         EXPECT_EQ(bus.parameter(), kAsTheControllerHasIt) << moment;
         EXPECT_EQ(bus.rootHubDefault(1), kEverybody) << moment;
         for (const char* port : {"1-2", "1-3"}) {
@@ -215,23 +221,166 @@ TEST_F(UsbGateTest, WithoutUsbThatIsSaidOnce) {
     gate->setClosed(true);
     EXPECT_EQ(log.take(), Lines{"keystrand: no port is guarded: no USB here"});
     EXPECT_FALSE(gate->closed());
-    // It comes later.
-    bus.setMissing(false);
+    EXPECT_EQ(gate->gap(), "no USB here");
+    EXPECT_EQ(gate->nextLook(), std::nullopt);
+}
+
+TEST_F(UsbGateTest, UsbThatCannotBeLookedAtIsClosedWhenItCanAndWhatIsAttachedStays) {
+    bus.plug("1-1", aDisk());
+    bus.setUnreadable(true);
     gate->setClosed(true);
-    EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
+    EXPECT_EQ(log.take(), Lines{"keystrand: no port is guarded: it cannot be read"});
+    EXPECT_FALSE(gate->closed());
+    EXPECT_EQ(gate->gap(), "it cannot be read");
+    EXPECT_EQ(gate->nextLook(), now + 60s);
+    now += 60s;
+    gate->look();
+    EXPECT_EQ(gate->nextLook(), now + 60s);
+    EXPECT_EQ(log.take(), Lines());
+    bus.setUnreadable(false);
+    now += 60s;
+    gate->look();
+    EXPECT_TRUE(gate->closed());
+    EXPECT_EQ(gate->gap(), "");
+    EXPECT_EQ(gate->nextLook(), std::nullopt);
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+    EXPECT_EQ(log.take(), Lines{"keystrand: the gate is closed"});
 }
 
 TEST_F(UsbGateTest, UsbThatComesLaterIsClosedWhenItComes) {
+    bus.removeRootHub(1);
+    bus.removeRootHub(2);
     bus.setMissing(true);
     gate->setClosed(true);
     EXPECT_TRUE(bus.isWatched());
+    log.take();
     bus.setMissing(false);
+    // A controller is faster than whoever tells of it, and so is what is plugged in there.
+    gate->setLocked(true);
+    bus.watch(nullptr);
     bus.addRootHub(2);
-    EXPECT_TRUE(gate->closed());
-    EXPECT_EQ(bus.parameter(), kHardWiredOnly);
-    EXPECT_EQ(bus.rootHubDefault(2), kHardWiredOnly);
     bus.plug("2-1", aDisk());
-    EXPECT_FALSE(bus.isAuthorized("2-1"));
+    ASSERT_TRUE(bus.isAuthorized("2-1"));
+    gate->look();
+    EXPECT_TRUE(gate->closed());
+    EXPECT_EQ(bus.writes(), (std::vector<std::string>{"parameter=2", "usb2=2", "2-1=0"}));
+    EXPECT_EQ(log.take().back(), "keystrand: the gate is closed");
+    gate->setClosed(false);
+    EXPECT_TRUE(bus.isAuthorized("2-1"));
+    EXPECT_EQ(bus.parameter(), kAsTheControllerHasIt);
+}
+
+TEST_F(UsbGateTest, UsbThatIsLoadedAnewIsClosedAnew) {
+    gate->setClosed(true);
+    ASSERT_EQ(bus.parameter(), kHardWiredOnly);
+    bus.removeRootHub(1);
+    bus.setMissing(true);
+    bus.removeRootHub(2);
+    EXPECT_FALSE(gate->closed());
+    bus.setMissing(false);
+    bus.addRootHub(1);
+    EXPECT_EQ(bus.parameter(), kHardWiredOnly);
+    EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
+    gate->setClosed(false);
+    EXPECT_EQ(bus.parameter(), kAsTheControllerHasIt);
+    EXPECT_EQ(bus.rootHubDefault(1), kEverybody);
+}
+
+TEST_F(UsbGateTest, DeviceThatHangsKeepsNothingOpen) {
+    bus.plug("1-1", aMouse());
+    int reads = 0;
+    bus.setHanging([&] {
+        ++reads;
+        EXPECT_EQ(bus.parameter(), kHardWiredOnly);
+        EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
+        EXPECT_EQ(bus.rootHubDefault(2), kHardWiredOnly);
+    });
+    gate->keepDevices();
+    gate->setClosed(true);
+    gate->setLocked(true);
+    EXPECT_GT(reads, 0);
+    // Nor one behind which there is a root hub that comes later.
+    reads = 0;
+    bus.watch(nullptr);
+    bus.addRootHub(3);
+    bus.setRootHubDefault(3, kEverybody);
+    bus.setHanging([&] {
+        ++reads;
+        EXPECT_EQ(bus.rootHubDefault(3), kHardWiredOnly);
+    });
+    gate->look();
+    EXPECT_GT(reads, 0);
+    // How many are out is known without asking them.
+    reads = 0;
+    EXPECT_EQ(gate->countRefused(), 0U);
+    EXPECT_EQ(reads, 0);
+    EXPECT_EQ(pathsOnDisk(), std::set<std::string>{"pci0 1"});
+}
+
+TEST_F(UsbGateTest, WhatCouldNotBeClosedIsNamedAndTriedAgain) {
+    bus.plug("1-1", aMouse());
+    bus.failDefaults();
+    gate->setClosed(true);
+    EXPECT_EQ(log.take(),
+              (Lines{"keystrand: the parameter authorized_default cannot be set to 2: "
+                     "Input/output error",
+                     "keystrand: root hub usb1 cannot be set to 2: Input/output error",
+                     "keystrand: root hub usb2 cannot be set to 2: Input/output error",
+                     "keystrand: the gate is closed, but for the parameter authorized_default, "
+                     "root hub usb1, root hub usb2"}));
+    EXPECT_EQ(gate->gap(), "the parameter authorized_default, root hub usb1, root hub usb2");
+    EXPECT_EQ(gate->nextLook(), now + 10s);
+    now += 10s;
+    gate->look();
+    EXPECT_EQ(log.take(), Lines());
+    bus.failDefaults(false);
+    now += 10s;
+    gate->look();
+    EXPECT_EQ(log.take(), Lines{"keystrand: the gate is closed"});
+    EXPECT_EQ(gate->gap(), "");
+    EXPECT_EQ(bus.rootHubDefault(2), kHardWiredOnly);
+    EXPECT_EQ(gate->nextLook(), std::nullopt);
+}
+
+TEST_F(UsbGateTest, DeviceThatCannotBeRefusedIsNamed) {
+    gate->setClosed(true);
+    bus.failWrites(1);
+    log.take();
+    bus.watch(nullptr);
+    bus.setRootHubDefault(1, kEverybody);
+    bus.plug("1-1", aDisk());
+    gate->look();
+    EXPECT_EQ(log.take(),
+              (Lines{R"(keystrand: cannot refuse 1-1 (1111:2222 "maker" "disk", classes )"
+                     R"(08/06/50): Input/output error)",
+                     "keystrand: the gate is closed, but for device 1-1"}));
+    now += 10s;
+    gate->look();
+    EXPECT_EQ(log.take(), (Lines{R"(keystrand: refused 1-1 (1111:2222 "maker" "disk", classes )"
+                                 R"(08/06/50))",
+                                 "keystrand: the gate is closed"}));
+}
+
+TEST_F(UsbGateTest, WhatCouldNotBePutBackIsNamed) {
+    gate->setClosed(true);
+    log.take();
+    bus.failDefaults();
+    gate->setClosed(false);
+    EXPECT_EQ(log.take().back(),
+              "keystrand: the gate is open, but for the parameter authorized_default, "
+              "root hub usb1, root hub usb2");
+    EXPECT_EQ(gate->gap(), "the parameter authorized_default, root hub usb1, root hub usb2");
+    EXPECT_FALSE(gate->isOpen());
+    EXPECT_TRUE(bus.isWatched());
+    log.take();
+    bus.failDefaults(false);
+    now += 10s;
+    gate->look();
+    EXPECT_EQ(log.take(), Lines{"keystrand: the gate is open"});
+    EXPECT_TRUE(gate->isOpen());
+    open();
+    EXPECT_FALSE(bus.isWatched());
+    EXPECT_EQ(recordOnDisk(), GateRecord());
 }
 
 TEST_F(UsbGateTest, UsbThatComesWhenTheGateIsToBeOpenAgainIsLeftAlone) {
@@ -252,11 +401,31 @@ TEST_F(UsbGateTest, NothingIsWatchedWhileTheMachineIsUnlocked) {
     gate->setClosed(true);
     gate->setLocked(false);
     EXPECT_TRUE(bus.isWatched());
-    gate->setClosed(false);
-    EXPECT_TRUE(bus.isWatched());
-    now = gate->nextLook().value();
-    gate->look();
+    open();
     EXPECT_FALSE(bus.isWatched());
+    EXPECT_EQ(gate->nextLook(), std::nullopt);
+}
+
+TEST_F(UsbGateTest, WhatAnEarlierServiceBeganToOpenIsOpened) {
+    gate->setClosed(true);
+    bus.plug("1-1", aDisk());
+    int left = 4;
+    const std::function<void()> kill = [&] {
+        if (--left == 0) {
+            throw Killed();
+        }
+        bus.setMeanwhile(kill);
+    };
+    bus.setMeanwhile(kill);
+    EXPECT_THROW(gate->setClosed(false), Killed);
+    bus.setMeanwhile(nullptr);
+    const auto kept = start();
+    ASSERT_TRUE(kept);
+    ASSERT_EQ(kept->gate.phase, GateState::Phase::opening);
+    open();
+    EXPECT_EQ(bus.rootHubDefault(2), kEverybody);
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+    EXPECT_TRUE(gate->isOpen());
 }
 
 TEST_F(UsbGateTest, WhatWasRefusedBeforeItOpensAndIsSeenAfterwardsComesIn) {
@@ -275,18 +444,18 @@ TEST_F(UsbGateTest, WhatWasRefusedBeforeItOpensAndIsSeenAfterwardsComesIn) {
     EXPECT_EQ(log.take(), Lines());
 }
 
-TEST_F(UsbGateTest, UsbThatWentDoesNotKeepItBusy) {
+TEST_F(UsbGateTest, UsbThatCannotBeSeenDoesNotKeepItBusy) {
     gate->setClosed(true);
     // Looked behind for a keyboard.
     bus.plug("1-1", aHub());
     now = gate->nextLook().value();
-    bus.setMissing(true);
+    bus.setUnreadable(true);
     gate->look();
     EXPECT_EQ(gate->nextLook(), now + GatePolicy::kRetryTime);
-    bus.setMissing(false);
+    bus.setUnreadable(false);
     gate->look();
     gate->setClosed(false);
-    bus.setMissing(true);
+    bus.setUnreadable(true);
     now = gate->nextLook().value();
     gate->look();
     EXPECT_EQ(gate->nextLook(), std::nullopt);

@@ -285,6 +285,9 @@ TEST_F(GateTest, ModesInTheStatus) {
         {{.allowed = false}, "open", "the policy is off"},
         {{.sleeping = true, .bootArgument = true}, "open", "the policy is off"},
         {{.restricted = true}, "open", "it could not be closed"},
+        {{.restricted = true, .closed = true, .gap = "root hub usb2"},
+         "partly closed",
+         "restricted mode"},
     };
     for (const Mode& mode : kModes) {
         const PacketServer server = serveStatus(mode.status);
@@ -301,6 +304,8 @@ TEST_F(GateTest, ModesInTheStatus) {
         EXPECT_EQ(at(shown, "untilRestricted"), seconds(mode.status.untilRestricted));
         EXPECT_EQ(at(shown, "untilClosed"), seconds(mode.status.untilClosed));
         EXPECT_EQ(at(shown, "refusedDevices"), Value(platform::ValueList()));
+        EXPECT_EQ(at(shown, "exceptions"), mode.status.gap.empty() ? Value("there is no exceptions")
+                                                                   : Value(mode.status.gap));
     }
 }
 

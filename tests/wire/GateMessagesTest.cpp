@@ -102,6 +102,10 @@ TEST(GateMessagesTest, Status) {
                     "allowed no\npassword-set yes\nboot-argument no\nuntil-restricted 3600\n"
                     "until-closed 0\nrefused 2\n");
     EXPECT_EQ(decodeGateAnswer(text), GateAnswer(status));
+    const GateStatus partly{.closed = true, .gap = "usb2"};
+    EXPECT_EQ(encodeGateAnswer(partly),
+              encodeGateAnswer(GateStatus{.closed = true}) + "gap 75736232\n");
+    EXPECT_EQ(decodeGateAnswer(encodeGateAnswer(partly)), GateAnswer(partly));
     EXPECT_EQ(decodeGateAnswer(encodeGateAnswer(GateStatus())), GateAnswer(GateStatus()));
 }
 
