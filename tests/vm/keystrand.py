@@ -20,16 +20,19 @@ class Keystrand:
 
     def set_period(self, seconds):
         """For a service that is to start again."""
-        self.vm.run(f"mkdir -p /etc/keystrand; echo 'period = {seconds}' >/etc/keystrand/keystrand.conf")
+        self.vm.run(f"mkdir -p /etc/keystrand; echo 'period = {seconds}' >/etc/keystrand/keystrand.conf; sync")
         self.vm.run("systemctl restart keystrand.service")
         self.wait_running()
+
+    def main_process(self):
+        return self.vm.run("systemctl show --property=MainPID --value keystrand.service")
 
     # Who sits there.
 
     def log_in(self):
         self.vm.run("systemctl start person.service")
         self.vm.until("a session", self.session)
-        self.await_open()
+        self.await_unlocked()
 
     def log_out(self):
         self.vm.run("systemctl stop person.service")
@@ -39,17 +42,31 @@ class Keystrand:
         return next((each["session"] for each in listed if each["user"] == "person"), None)
 
     def hint(self, locked):
-        answer = self.vm.run(f"busctl call {LOGIN1} /org/freedesktop/login1 {LOGIN1}.Manager GetSession s {self.session()}")
+        answer = self.vm.run(f"busctl call {LOGIN1} /org/freedesktop/login1 {LOGIN1}.Manager "
+                             f"GetSession s {self.session()}")
         path = answer.split('"')[1]
         self.vm.run(f"busctl call {LOGIN1} {path} {LOGIN1}.Session SetLockedHint b {'true' if locked else 'false'}")
 
     def lock(self):
-        seen = self.count("keystrand: the machine is locked")
         self.hint(True)
-        self.await_line("keystrand: the machine is locked", seen)
+        self.vm.until("keystrand knows that it is locked", self.is_locked)
 
     def unlock(self):
         self.hint(False)
+        self.await_unlocked()
+
+    def is_locked(self):
+        """As the service that runs knows it; one that has just started has heard of nobody."""
+        is_locked = True
+        for line in self.lines():
+            if line.startswith(("keystrand: ready", "keystrand: the machine is locked")):
+                is_locked = True
+            elif line.startswith("keystrand: the machine is unlocked"):
+                is_locked = False
+        return is_locked
+
+    def await_unlocked(self):
+        self.vm.until("keystrand knows that it is unlocked", lambda: not self.is_locked())
         self.await_open()
 
     # What the service says and does.
@@ -66,6 +83,28 @@ class Keystrand:
             found = [line for line in self.lines() if line.startswith(beginning)]
             return found[seen:] and found[-1]
         return self.vm.until(f"a line that begins with {beginning!r}", newest)
+
+    def kstctl(self, words):
+        """What kstctl shows for these words."""
+        return json.loads(self.vm.run(f"kstctl --json {words}"))
+
+    def gate(self):
+        return self.kstctl("status")["gate"]
+
+    def listed(self, name):
+        """What kstctl says of the device with this name."""
+        return next(each for each in self.kstctl("devices")["devices"] if each["serial"] == name)
+
+    def await_saved(self, check):
+        """Waits until what kstd has on disk for the next start is so."""
+        self.vm.until("kstd has saved the state", lambda: check(self.kstctl("status")["stateFile"]))
+
+    def await_gate(self, **expected):
+        """Waits until kstctl shows these of the gate, and returns all."""
+        def shown():
+            gate = self.gate()
+            return all(gate[key] == value for key, value in expected.items()) and gate
+        return self.vm.until(f"the gate becomes {expected}", shown)
 
     def root_hubs(self):
         return set(self.vm.run(f"cat {D}/usb*/authorized_default").split())
@@ -99,9 +138,14 @@ class Keystrand:
 
     def disk_of(self, name):
         """The disk that a device became."""
-        find = f"basename $(ls -d {self.vm.device(name)}:1.0/host*/target*/*/block/*)"
-        return "/dev/" + self.vm.until(f"{name} is a disk", lambda: self.vm.ask(find)[1].startswith("sd") and self.vm.run(find))
+        find = f"basename $(ls -d {self.vm.device(name)}:1.0/host*/target*/*/block/sd*)"
+
+        def found():
+            status, disk = self.vm.ask(find)
+            return status == 0 and disk.startswith("sd") and disk
+        return "/dev/" + self.vm.until(f"{name} is a disk", found)
 
     def survives(self, disk):
         """What is written to an attached disk is read back from it, not from memory."""
-        self.vm.run(f"echo written >/mnt/file; sync; echo 3 >/proc/sys/vm/drop_caches; grep -qx written /mnt/file; grep -q '^{disk} /mnt ' /proc/mounts")
+        self.vm.run("echo written >/mnt/file; sync; echo 3 >/proc/sys/vm/drop_caches; grep -qx written /mnt/file && "
+                    f"grep -q '^{disk} /mnt ' /proc/mounts")

@@ -1,6 +1,6 @@
 """A machine in QEMU, without hardware's help: started, asked, plugged into, put to sleep and switched off."""
-import base64
 import ctypes
+import datetime
 import json
 import os
 import select
@@ -10,8 +10,8 @@ import subprocess
 import sys
 import time
 
-PATIENCE = 60  # seconds for whatever is waited for; emulated and on a loaded machine, much takes long
-START = 240  # seconds for a whole start of the machine
+PATIENCE = 60  # seconds of the machine's own time for whatever is waited for
+FAR = 900  # seconds of ours for one answer: only what hangs takes that long
 SLOTS = 6  # for controllers that are plugged in: one slot takes one, once
 PR_SET_PDEATHSIG = 1
 
@@ -25,7 +25,7 @@ def die_with_parent():
 
 
 class Lines:
-    """A connection on which lines come and go."""
+    """A connection on which lines come and go, some with more behind them."""
 
     def __init__(self, end):
         self.end = end
@@ -34,28 +34,40 @@ class Lines:
     def put(self, text):
         self.end.sendall(text.encode() + b"\n")
 
-    def get(self, limit, what):
-        deadline = time.monotonic() + limit
+    def get(self, what):
         while b"\n" not in self.rest:
-            left = deadline - time.monotonic()
-            if left <= 0 or not select.select([self.end], [], [], left)[0]:
-                raise Failure(f"{what}: no answer within {limit} seconds")
-            received = self.end.recv(65536)
-            if not received:
-                raise Failure(f"{what}: the machine is gone")
-            self.rest += received
+            self.receive(what)
         line, self.rest = self.rest.split(b"\n", 1)
         return line.decode()
+
+    def get_bytes(self, size, what):
+        while len(self.rest) < size:
+            self.receive(what)
+        taken, self.rest = self.rest[:size], self.rest[size:]
+        return taken
+
+    def receive(self, what):
+        if not select.select([self.end], [], [], FAR)[0]:
+            raise Failure(f"{what}: no answer within {FAR} seconds")
+        received = self.end.recv(65536)
+        if not received:
+            raise Failure(f"{what}: the machine is gone")
+        self.rest += received
 
 
 class Machine:
     """One start of a machine, from power on to power off. What outlives it is its disk.
 
-    With a root_port, the disk is a USB disk in that port.
+    With a root_port, the disk is a USB disk in that port. Its clock says our time, and some hours more; it counts
+    the instructions that the machine executes, and goes on while that has nothing to do. So no time inside
+    depends on how busy we are.
     """
 
-    def __init__(self, base, disk, console, *, root_port=None, sleeps=False, words=""):
+    def __init__(self, base, disk, console, *, root_port=None, sleeps=False, words="", hours_later=0):
         self.console = console
+        self.date = datetime.datetime.utcnow() + datetime.timedelta(hours=hours_later)
+        self.uptime = 0.0
+        self.events = []
         self.qmp_end, qmp_far = socket.socketpair()
         self.agent_end, agent_far = socket.socketpair()
         self.slots = 0
@@ -68,22 +80,23 @@ class Machine:
         agent_far.close()
         self.qmp_lines = Lines(self.qmp_end)
         self.agent = Lines(self.agent_end)
-        self.qmp_lines.get(PATIENCE, "QEMU's greeting")
+        self.qmp_lines.get("QEMU's greeting")
         self.qmp("qmp_capabilities")
 
     def command(self, base, disk, far, root_port, kernel, words):
-        disk_device = f"usb-storage,bus=usb.0,port={root_port},serial=root" if root_port else "virtio-blk-pci"
+        device = f"usb-storage,bus=usb.0,port={root_port},serial=root" if root_port else "virtio-blk-pci"
         slots = [word for number in range(SLOTS)
                  for word in ("-device", f"pcie-root-port,id=slot{number},chassis={number + 1},slot={number + 1}")]
-        return ["qemu-system-x86_64", "-nodefaults", "-no-user-config", "-no-reboot",
+        return ["qemu-system-x86_64", "-nodefaults", "-no-user-config", "-no-reboot", "-S",
                 "-machine", "q35,sata=off,smbus=off,i8042=off", "-accel", "tcg,tb-size=128", "-m", "384",
+                "-icount", "shift=1", "-rtc", f"base={self.date.isoformat(timespec='seconds')},clock=vm",
                 "-display", "none", "-vga", "none", "-serial", f"file:{self.console}",
                 "-chardev", f"socket,id=qmp,fd={far[0]}", "-mon", "chardev=qmp,mode=control",
                 "-kernel", f"{base}/{kernel}", "-initrd", f"{base}/initrd",
                 "-append", f"console=ttyS0 no_timer_check panic=-1 loglevel=5 mitigations=off {words}",
                 *slots,
                 "-device", "qemu-xhci,id=usb,p2=8,p3=8",
-                "-drive", f"file={disk},format=raw,if=none,id=disk,cache=unsafe", "-device", f"{disk_device},drive=disk",
+                "-drive", f"file={disk},format=raw,if=none,id=disk,cache=unsafe", "-device", f"{device},drive=disk",
                 "-device", "virtio-serial-pci",
                 "-chardev", f"socket,id=agent,fd={far[1]}", "-device", "virtserialport,chardev=agent,name=agent"]
 
@@ -92,16 +105,18 @@ class Machine:
     def qmp(self, command, **arguments):
         self.qmp_lines.put(json.dumps({"execute": command, "arguments": arguments}))
         while True:
-            answer = json.loads(self.qmp_lines.get(PATIENCE, command))
+            answer = json.loads(self.qmp_lines.get(command))
             if "error" in answer:
                 raise Failure(f"{command} {arguments}: {answer['error']['desc']}")
             if "return" in answer:
                 return answer["return"]
+            self.events.append(answer["event"])
 
-    def wait_event(self, name, limit=PATIENCE):
+    def wait_event(self, name):
         """The next event of this name; those before it are of no interest."""
-        while json.loads(self.qmp_lines.get(limit, name)).get("event") != name:
-            pass
+        while name not in self.events:
+            self.events.append(json.loads(self.qmp_lines.get(name))["event"])
+        del self.events[:self.events.index(name) + 1]
 
     def plug(self, driver, name, port, bus="usb.0", **properties):
         """Plugs a device into a port. Its serial number is its name, by which it is found inside."""
@@ -109,7 +124,8 @@ class Machine:
 
     def plug_disk(self, name, port, image, **properties):
         """The same for a disk, which keeps what is written in this image."""
-        self.qmp("blockdev-add", driver="raw", file={"driver": "file", "filename": image}, **{"node-name": "node-" + name})
+        self.qmp("blockdev-add", driver="raw", file={"driver": "file", "filename": image},
+                 **{"node-name": "node-" + name})
         self.plug("usb-storage", name, port, drive="node-" + name, **properties)
 
     def plug_controller(self, name):
@@ -122,34 +138,41 @@ class Machine:
     # What is inside.
 
     def wait_ready(self):
-        if self.agent.get(START, "the start") != "ready":
+        """The machine runs from here on. What was plugged in before is there before its kernel is."""
+        self.qmp("cont")
+        if self.agent.get("the start") != "ready":
             raise Failure("the agent says something else than that it is ready")
 
-    def ask(self, command, limit=PATIENCE):
+    def ask(self, command):
         """The status and the output of a command inside."""
-        self.agent.put(base64.b64encode(command.encode()).decode())
-        status, _, output = self.agent.get(limit, command).partition(" ")
-        return int(status), base64.b64decode(output).decode(errors="replace").rstrip("\n")
+        self.agent.put(command)
+        status, uptime, size = self.agent.get(command).split(" ")
+        self.uptime = float(uptime)
+        return int(status), self.agent.get_bytes(int(size), command).decode(errors="replace").rstrip("\n")
 
-    def run(self, command, limit=PATIENCE):
+    def run(self, command):
         """The output of a command inside that must succeed."""
-        status, output = self.ask(command, limit)
+        status, output = self.ask(command)
         if status:
             raise Failure(f"{command}: status {status}\n{output}")
         return output
 
-    def until(self, what, check, limit=PATIENCE):
-        """Asks again until check() says something; returns that."""
-        deadline = time.monotonic() + limit
+    def until(self, what, check):
+        """Asks again until check(), which runs something inside, says something; returns that."""
+        began = None
+        pause = 0.1
         while True:
             said = check()
             if said:
                 return said
-            if time.monotonic() >= deadline:
-                raise Failure(f"{what}: not within {limit} seconds")
-            time.sleep(0.1)
+            began = began or self.uptime
+            if self.uptime >= began + PATIENCE:
+                raise Failure(f"{what}: not within {PATIENCE} seconds of the machine")
+            # Its clock hardly goes on while it is busy with being asked.
+            time.sleep(pause)
+            pause = min(2 * pause, 1)
 
-    def until_says(self, command, expected, limit=PATIENCE):
+    def until_says(self, command, expected):
         """Runs a command again until its output is this."""
         said = [""]
 
@@ -157,7 +180,7 @@ class Machine:
             said[0] = self.ask(command)[1]
             return said[0] == expected
         try:
-            self.until(command, check, limit)
+            self.until(command, check)
         except Failure as failure:
             raise Failure(f"{failure}: it says\n{said[0]}\nand not\n{expected}") from None
 
@@ -174,38 +197,42 @@ class Machine:
     # Its end.
 
     def power_off(self):
-        self.agent.put(base64.b64encode(b"systemctl poweroff").decode())
+        self.agent.put("systemctl poweroff")
         self.wait_end()
 
     def sleep(self):
-        """Returns when the machine sleeps; wakes by wake()."""
+        """Returns when the machine sleeps; wakes by wake(), or by an alarm of its own."""
         self.run("systemctl suspend >/run/suspend 2>&1 &")
         self.wait_event("SUSPEND")
 
     def wake(self):
         self.qmp("system_wakeup")
+        self.wait_event("WAKEUP")
 
     def wait_end(self):
         try:
-            self.process.wait(PATIENCE)
+            self.process.wait(FAR)
         except subprocess.TimeoutExpired:
-            raise Failure(f"the machine does not end within {PATIENCE} seconds") from None
+            raise Failure(f"the machine does not end within {FAR} seconds") from None
 
-    def kill(self):
-        """As if the power were cut."""
+    def cut_power(self):
+        """What has not reached the disk by now never will."""
         self.process.kill()
         self.process.wait()
         self.qmp_end.close()
         self.agent_end.close()
 
+    def printed(self, suffix=""):
+        """The lines on the console."""
+        path = self.console + suffix
+        if not os.path.exists(path):
+            return []
+        with open(path, "rb") as file:
+            return file.read().decode(errors="replace").splitlines()
+
     def last_words(self):
         """What the console and QEMU said last."""
-        said = []
-        for path in (self.console, self.console + ".qemu"):
-            if os.path.exists(path):
-                with open(path, "rb") as file:
-                    said += file.read().decode(errors="replace").splitlines()[-40:]
-        return "\n".join(said)
+        return "\n".join(self.printed()[-40:] + self.printed(".qemu")[-40:])
 
 
 class Story:
@@ -224,7 +251,7 @@ class Story:
     def switch_on(self, **how):
         """For the first time or again. What is plugged in now is there before the kernel is."""
         if self.machine:
-            self.machine.kill()
+            self.machine.cut_power()
         self.machine = Machine(self.base, self.work + "/disk", self.work + "/console", **how)
         return self.machine
 
@@ -272,4 +299,4 @@ def told(tell):
         sys.exit(1)
     finally:
         if story.machine:
-            story.machine.kill()
+            story.machine.cut_power()
