@@ -116,8 +116,6 @@ Result decodeNumbers(Bytes bytes, const char* firstName, bool isType, Second sec
     return decoded;
 }
 
-} // namespace
-
 Result decodeNoPayload(Bytes /*bytes*/, Secrets /*secrets*/) {
     return Decoded{};
 }
@@ -147,6 +145,8 @@ Result decodeContainsPassphrase(Bytes bytes, Secrets /*secrets*/) {
 Result decodeRemovePassphrases(Bytes bytes, Secrets /*secrets*/) {
     return decodeNumbers(bytes, "purpose", false, Second::scope);
 }
+
+} // namespace
 
 // The payloads that are a number and bytes: environment variables and kernel control.
 
@@ -200,8 +200,6 @@ std::optional<platform::Error> refusalOfNumber(base::ByteReader& reader, std::ui
     return std::nullopt;
 }
 
-} // namespace
-
 Result decodeSetEnvironmentVariable(Bytes bytes, Secrets /*secrets*/) {
     base::ByteReader reader(bytes);
     std::uint32_t variable = 0;
@@ -248,8 +246,6 @@ Result decodeKernelControl(Bytes bytes, Secrets /*secrets*/) {
     control->addInput(decoded.fields, input);
     return decoded;
 }
-
-namespace {
 
 /// The decoder of a command that the table has.
 constexpr Decoder decoderOf(std::uint8_t code) {

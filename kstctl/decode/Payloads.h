@@ -29,20 +29,11 @@ struct CommandPayload {
 /// By its name or by its code in decimal; null when there is no such command.
 [[nodiscard]] const CommandPayload* findCommand(std::string_view nameOrCode);
 
-// What the decoders of the table are, one for each layout.
-[[nodiscard]] Result decodeNoPayload(Bytes bytes, Secrets secrets);
-[[nodiscard]] Result decodeHandle(Bytes bytes, Secrets secrets);
+// The decoders of payloads that the library reads, too.
 [[nodiscard]] Result decodeVerifyPolicy(Bytes bytes, Secrets secrets);
 [[nodiscard]] Result decodeVerifyAclConstraint(Bytes bytes, Secrets secrets);
 [[nodiscard]] Result decodeProcessAcl(Bytes bytes, Secrets secrets);
 [[nodiscard]] Result decodeCredentialCommand(Bytes bytes, Secrets secrets);
-[[nodiscard]] Result decodeContainsCredentialType(Bytes bytes, Secrets secrets);
-[[nodiscard]] Result decodeRemoveCredentialsByType(Bytes bytes, Secrets secrets);
-[[nodiscard]] Result decodeContainsPassphrase(Bytes bytes, Secrets secrets);
-[[nodiscard]] Result decodeRemovePassphrases(Bytes bytes, Secrets secrets);
-[[nodiscard]] Result decodeSetEnvironmentVariable(Bytes bytes, Secrets secrets);
-[[nodiscard]] Result decodeGetEnvironmentVariable(Bytes bytes, Secrets secrets);
-[[nodiscard]] Result decodeKernelControl(Bytes bytes, Secrets secrets);
 
 /// What an age limit of global credentials stands for when it is no number; else empty.
 [[nodiscard]] inline const char* ageText(std::uint32_t maxGlobalCredentialAge) {
