@@ -51,6 +51,7 @@ bool ControlConnection::receive() {
     if (size < 0) {
         return errno == EAGAIN || errno == EINTR;
     }
+    // The lines before the end are carried out all the same.
     inputEnded_ = size == 0;
     input_.append(buffer.data(), static_cast<std::size_t>(size));
     return true;
@@ -61,12 +62,14 @@ bool ControlConnection::proceed() {
         if (!sendOutput()) {
             return false;
         }
+        // A client that does not read its answers gets no more of them, and none pile up here.
         if (!output_.empty()) {
             source_.listenFor(EPOLLOUT);
             return true;
         }
     } while (runNextLine());
     if (wait_) {
+        // A hang-up is heard even so.
         source_.listenFor(0);
         return true;
     }
@@ -133,6 +136,7 @@ bool ControlConnection::sendOutput() {
 
 void ControlConnection::endUnless(bool alive) const {
     if (!alive) {
+        // It destroys this connection, and so must not be called where it is kept.
         const auto ended = handlers_.ended;
         ended();
     }

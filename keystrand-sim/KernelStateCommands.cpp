@@ -80,6 +80,7 @@ ControlOutcome post(ControlContext& context, ControlArguments& arguments) {
     if (!wire::encodeEvent(stream, name)) {
         return ControlOutcome::failed("not the names of an event");
     }
+    // All of them or none.
     if (count > EventSender::kMaxQueued - context.events.queued()) {
         return ControlOutcome::failed("no room for so many events");
     }

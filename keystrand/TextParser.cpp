@@ -48,6 +48,7 @@ void TextParser::advance() {
     skipBlanks();
     const auto* end = std::find_if_not(rest_.begin(), rest_.end(), isWordCharacter);
     const auto length = static_cast<std::size_t>(end - rest_.begin());
+    // A character that no word has is a token of its own.
     token_ = rest_.substr(0, std::max<std::size_t>(length, 1));
     rest_.remove_prefix(token_.size());
 }
@@ -103,6 +104,7 @@ bool TextParser::takeMark(char wanted) {
 }
 
 void TextParser::fail(std::string reason) {
+    // What is wrong with a word is found once it has been taken.
     failAt(lineOfLast_, std::move(reason));
 }
 
@@ -117,6 +119,7 @@ void TextParser::failExpecting(std::string_view what) {
 }
 
 void TextParser::failAt(std::size_t line, std::string reason) {
+    // Those that come later only follow from the first.
     if (!error_) {
         error_ = {.line = line, .reason = std::move(reason)};
     }

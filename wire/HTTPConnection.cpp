@@ -47,6 +47,7 @@ State HTTPConnection::awaitReady(short events, const Deadline& deadline) const {
     if (ready == 0) {
         return State::timedOut;
     }
+    // A hang-up, too: the call that follows tells of it.
     return watched[0].revents != 0 ? State::open : State::interrupted;
 }
 
@@ -83,6 +84,7 @@ State HTTPConnection::sendAll(std::initializer_list<std::span<const std::uint8_t
 
 State HTTPConnection::receive(HTTPMessage& message) {
     const Deadline deadline(patience_, end_);
+    // Also when something has come: a peer that never stops sending is not listened to for ever.
     if (deadline.hasPassed()) {
         return State::timedOut;
     }

@@ -64,6 +64,7 @@ bool isGateThere(const platform::Paths& paths) {
 platform::Result<GateClient> GateClient::connect(const platform::Paths& paths,
                                                  std::chrono::milliseconds patience) {
     const std::string path = paths.under(wire::kGateSocket);
+    // Of any file `connect` says that nobody listens.
     struct stat status {};
     if (::stat(path.c_str(), &status) != 0) {
         return gateSocketError(path, errno);
@@ -75,6 +76,7 @@ platform::Result<GateClient> GateClient::connect(const platform::Paths& paths,
     if (!address) {
         return failure(ExitStatus::failed, base::concat(path, ": too long for a socket"));
     }
+    // It does not wait for room in the listener's queue, either.
     base::FileDescriptor connection(
         ::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
     if (!connection.isOpen() || ::connect(connection.get(), address->get(), address->size()) != 0) {

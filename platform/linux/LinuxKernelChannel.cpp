@@ -63,6 +63,7 @@ Status LinuxKernelChannel::open(ServiceHandle service, std::uint32_t connectionT
     if (!path) {
         return statusFromErrno(ENOENT);
     }
+    // What was left to the parent is nobody's here.
     const auto place = std::find_if(connections_.begin(), connections_.end(),
                                     [](const auto& held) { return !held || held->leftToParent; });
     if (place == connections_.end()) {
@@ -70,6 +71,7 @@ Status LinuxKernelChannel::open(ServiceHandle service, std::uint32_t connectionT
     }
     Opened& opened =
         place->emplace(address_, log_, timeout_, registry_.program(), connectionType, *path);
+    // The call that runs has set its deadline before there was this connection.
     opened.setDeadline(deadline_);
     const Status status = opened.connect();
     if (status == kSuccess) {
@@ -99,6 +101,7 @@ Status LinuxKernelChannel::structCall(ConnectionHandle connection, std::uint32_t
     if (status != kSuccess || reply.status != kSuccess) {
         return status != kSuccess ? status : reply.status;
     }
+    // Whose bytes are not as many as it says may be out of step: nothing more is asked of it.
     const bool saysItsSize = reply.reported == reply.body.size();
     if (!saysItsSize) {
         socket->disconnect();

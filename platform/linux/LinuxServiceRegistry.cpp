@@ -38,6 +38,7 @@ ServiceHandle LinuxServiceRegistry::findByClassName(std::string_view name) {
         return kNoService;
     }
     const Lookup found = lookUp(wire::KernelOperation::findByClassName, name);
+    // What is withheld is held, too: who opens it is told why.
     return found.path || isWithheld(found.outcome) ? hold(found.path, found.outcome) : kNoService;
 }
 
@@ -83,6 +84,7 @@ ServiceHandle LinuxServiceRegistry::hold(const std::optional<RegistryPath>& path
     if (room == nullptr) {
         return kNoService;
     }
+    // No handle comes again, so that one that was released is never another's.
     room->emplace(Entry{++lastHandle_, 1, path, status});
     return lastHandle_;
 }
@@ -110,6 +112,7 @@ std::optional<std::vector<std::uint8_t>> LinuxServiceRegistry::copyProperty(Serv
 /// The line is made on the stack: a client may have no memory left.
 void LinuxServiceRegistry::tell(const char* what, std::string_view name, Outcome outcome,
                                 Outcome& last) {
+    // Once for each change. That there is no connection was told by the connection.
     if (outcome == std::exchange(last, outcome) || outcome == kSuccess ||
         outcome == connection_.connectStatus()) {
         return;
