@@ -8,7 +8,8 @@
 
 /// The numbers of the binary form that both its writer and its reader need, and how objects are
 /// found in a file; PropertyListCodec.h describes the form. The file may hold anything; every
-/// length is compared with what is left.
+/// length is compared with what is left. What an upload does for each key and value of each event
+/// stands in this header, where it can become a part of its caller.
 namespace platform::binary_property_list {
 
 /// The high half of a marker byte.
@@ -47,13 +48,46 @@ inline constexpr std::size_t kTrailerSize = kUnusedTrailerSize + 2 + 3 * sizeof(
 
 using Span = std::span<const std::uint8_t>;
 
-/// Reads a number that has its high byte first, of at most 8 bytes.
-[[nodiscard]] bool readNumber(base::ByteReader& reader, std::size_t width, std::uint64_t& number);
+/// The number that has its high byte first, of at most 8 bytes.
+[[nodiscard]] inline std::uint64_t numberIn(Span bytes) {
+    // Nearly every reference and offset of a small file is of one or two bytes.
+    if (bytes.size() == 1) {
+        return bytes[0];
+    }
+    if (bytes.size() == 2) {
+        return (std::uint64_t{bytes[0]} << 8U) | bytes[1];
+    }
+    std::uint64_t number = 0;
+    for (const std::uint8_t byte : bytes) {
+        number = (number << 8U) | byte;
+    }
+    return number;
+}
+
+/// Reads such a number.
+[[nodiscard]] inline bool readNumber(base::ByteReader& reader, std::size_t width,
+                                     std::uint64_t& number) {
+    Span bytes;
+    if (!reader.readSpan(bytes, width)) {
+        return false;
+    }
+    number = numberIn(bytes);
+    return true;
+}
+
+/// Reads the count behind a marker that says that it follows.
+[[nodiscard]] bool readLargeCount(base::ByteReader& reader, std::uint64_t& count);
 
 /// Reads the content of an object that has a count, in its marker or behind it: so many elements of
 /// `width` bytes.
-[[nodiscard]] bool readElements(std::uint8_t marker, base::ByteReader& reader, std::size_t width,
-                                Span& elements);
+[[nodiscard]] inline bool readElements(std::uint8_t marker, base::ByteReader& reader,
+                                       std::size_t width, Span& elements) {
+    std::uint64_t count = marker & 0xfU;
+    if (count == kCountFollows && !readLargeCount(reader, count)) {
+        return false;
+    }
+    return count <= reader.left() / width && reader.readSpan(elements, count * width);
+}
 
 /// The objects of a file, which must outlive it.
 class ObjectTable {
@@ -67,11 +101,24 @@ class ObjectTable {
     [[nodiscard]] std::size_t referenceWidth() const { return referenceWidth_; }
 
     /// The object that the `index`-th of the references is to; there must be so many.
-    [[nodiscard]] std::uint64_t reference(Span references, std::size_t index) const;
+    [[nodiscard]] std::uint64_t reference(Span references, std::size_t index) const {
+        return numberIn(references.subspan(index * referenceWidth_, referenceWidth_));
+    }
 
     /// Gives the object's marker, and in `reader` all that stands behind it in the object table.
     [[nodiscard]] bool find(std::uint64_t object, std::uint8_t& marker,
-                            base::ByteReader& reader) const;
+                            base::ByteReader& reader) const {
+        if (object >= count_) {
+            return false;
+        }
+        const std::uint64_t offset =
+            numberIn(offsets_.subspan(object * offsetWidth_, offsetWidth_));
+        if (offset < kMagicSize || offset >= objects_.size()) {
+            return false;
+        }
+        reader = base::ByteReader(objects_.subspan(offset));
+        return reader.readU8(marker);
+    }
 
   private:
     /// All that stands before the offset table.

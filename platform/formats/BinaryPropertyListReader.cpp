@@ -27,8 +27,9 @@ struct FileText {
     }
 };
 
-/// The first keys of a map, kept from the first look at them: few maps have more.
-using FirstKeys = std::array<FileText, 16>;
+/// The first keys of a map, kept from the first look at them for when they are all in ASCII: few
+/// maps have more.
+using FirstKeys = std::array<std::string_view, 16>;
 
 /// The references of one map.
 struct Entries {
@@ -225,7 +226,7 @@ class Reader {
             isSorted = isSorted && !key.isUTF16 && (i == 0 || last < key.ascii());
             last = key.ascii();
             if (i < firstKeys.size()) {
-                firstKeys[i] = key;
+                firstKeys[i] = last;
             }
         }
         return true;
@@ -233,11 +234,11 @@ class Reader {
 
     bool readSortedEntries(const Entries& entries, const FirstKeys& firstKeys) {
         for (std::size_t i = 0; i < entries.count; ++i) {
-            FileText key;
+            std::string_view key;
             if (!readKeyAgain(entries, i, firstKeys, key)) {
                 return false;
             }
-            sink_.key(key.ascii());
+            sink_.key(key);
             if (!readObject(objects_.reference(entries.values, i))) {
                 return false;
             }
@@ -277,12 +278,15 @@ class Reader {
 
     /// Costs the same whether the key was kept or not.
     bool readKeyAgain(const Entries& entries, std::size_t index, const FirstKeys& firstKeys,
-                      FileText& key) {
-        if (index >= firstKeys.size()) {
-            return readKey(objects_.reference(entries.keys, index), key);
+                      std::string_view& key) {
+        if (index < firstKeys.size()) {
+            key = firstKeys[index];
+            return spend(key.size());
         }
-        key = firstKeys[index];
-        return spend(key.bytes.size());
+        FileText text;
+        const bool isRead = readKey(objects_.reference(entries.keys, index), text);
+        key = text.ascii();
+        return isRead;
     }
 
     bool readKey(std::uint64_t object, FileText& key) {

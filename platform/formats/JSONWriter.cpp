@@ -142,7 +142,10 @@ void JSONWriter::key(std::string_view key) {
     }
     beginEntry();
     if (appendQuoted(text_, key)) {
-        text_.append(isPretty_ ? ": " : ":");
+        text_.append(':');
+        if (isPretty_) {
+            text_.append(' ');
+        }
         hasKey_ = true;
     } else {
         text_.truncate(entryStart_);

@@ -63,6 +63,12 @@ char* putDeceptive(char32_t character, char* place) {
 
 char* showLogText(std::string_view text, char* line) noexcept {
     while (!text.empty()) {
+        // Most lines have nothing else.
+        if (isBetween(static_cast<unsigned char>(text.front()), ' ', '~')) {
+            *line++ = text.front();
+            text.remove_prefix(1);
+            continue;
+        }
         const std::string_view before = text;
         const std::optional<char32_t> character = takeUTF8(text);
         if (!character) {
