@@ -133,11 +133,15 @@ class TreeBuilder : private base::NotCopied {
 
     /// A node with all but its children, in its slot. Null when there is no memory.
     KSTRequirement* makeNode(const Announcement& announcement) {
-        auto* node = static_cast<KSTRequirement*>(kst::allocate(announcement.nodeSize));
-        if (node == nullptr) {
+        void* const memory = kst::allocateUncleared(announcement.nodeSize);
+        if (memory == nullptr) {
             return nullptr;
         }
-        std::memcpy(node, rest_.data(), announcement.wireSize);
+        std::memcpy(memory, rest_.data(), announcement.wireSize);
+        // The slots of the children, which are filled one by one.
+        std::memset(static_cast<std::uint8_t*>(memory) + announcement.wireSize, 0,
+                    announcement.nodeSize - announcement.wireSize);
+        auto* const node = static_cast<KSTRequirement*>(memory);
         node->dataLength =
             static_cast<std::uint32_t>(announcement.nodeSize - sizeof(KSTRequirement));
         if (levels_.empty()) {
@@ -203,11 +207,18 @@ KSTStatus DeserializeRequirement(const void* buffer, std::size_t size,
 namespace {
 
 /// A node that is being freed counts in `state` the children it has been left to. Null when there
-/// is no other child.
-KSTRequirement* nextChild(KSTRequirement* node) {
-    const std::uint32_t count = wire::childCount(node);
+/// is no other child; otherwise the child's slot holds `parent` afterwards.
+KSTRequirement* leaveForChild(KSTRequirement* node, KSTRequirement* parent) {
+    const wire::CompositeLayout* const layout = wire::findCompositeLayout(node->type);
+    if (layout == nullptr) {
+        return nullptr;
+    }
+    const std::uint32_t count = wire::childCount(node, *layout);
+    std::uint8_t* const slots = reinterpret_cast<std::uint8_t*>(node) + layout->childrenOffset;
     while (node->state < count) {
-        if (KSTRequirement* child = wire::childAt(node, node->state++)) {
+        std::uint8_t* const slot = slots + node->state++ * wire::kChildSize;
+        if (KSTRequirement* child = wire::childIn(slot)) {
+            std::memcpy(slot, &parent, wire::kChildSize);
             return child;
         }
     }
@@ -226,8 +237,7 @@ void DeallocRequirement(KSTRequirement* requirement) noexcept {
         node->state = 0;
     }
     while (node != nullptr) {
-        if (KSTRequirement* child = nextChild(node)) {
-            wire::setChildAt(node, node->state - 1, parent);
+        if (KSTRequirement* child = leaveForChild(node, parent)) {
             parent = node;
             node = child;
             node->state = 0;

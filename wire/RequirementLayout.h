@@ -65,14 +65,20 @@ inline constexpr CompositeLayout kInMemoryLayout{33, 37};
     return count;
 }
 
-/// How many children the node has: what it says, as far as it has slots for them.
-[[nodiscard]] inline std::uint32_t childCount(const KSTRequirement* node) noexcept {
-    const CompositeLayout* layout = findCompositeLayout(node->type);
-    if (layout == nullptr || nodeSize(node) < layout->childrenOffset) {
+/// How many children a node of that layout has: what it says, as far as it has slots for them.
+[[nodiscard]] inline std::uint32_t childCount(const KSTRequirement* node,
+                                              const CompositeLayout& layout) noexcept {
+    if (nodeSize(node) < layout.childrenOffset) {
         return 0;
     }
-    const std::size_t slots = (nodeSize(node) - layout->childrenOffset) / kChildSize;
-    return std::min(storedChildCount(node, *layout), static_cast<std::uint32_t>(slots));
+    const std::size_t slots = (nodeSize(node) - layout.childrenOffset) / kChildSize;
+    return std::min(storedChildCount(node, layout), static_cast<std::uint32_t>(slots));
+}
+
+/// The same for any node; a leaf has none.
+[[nodiscard]] inline std::uint32_t childCount(const KSTRequirement* node) noexcept {
+    const CompositeLayout* layout = findCompositeLayout(node->type);
+    return layout != nullptr ? childCount(node, *layout) : 0;
 }
 
 /// Where the pointers to the children of `node`, a composite, begin.
