@@ -71,21 +71,20 @@ LinuxServiceRegistry::Lookup LinuxServiceRegistry::lookUp(wire::KernelOperation 
 }
 
 ServiceHandle LinuxServiceRegistry::hold(const std::optional<RegistryPath>& path, Status status) {
-    std::optional<Entry>* room = nullptr;
+    std::optional<Entry>* room = &entries_.front();
     for (auto& entry : entries_) {
-        if (!entry) {
-            room = &entry;
-        } else if (path ? entry->path && entry->path->text() == path->text() : !entry->path) {
+        if (entry && (path ? entry->path && entry->path->text() == path->text() : !entry->path)) {
             ++entry->references;
             entry->status = status;
+            entry->found = ++lastFound_;
             return entry->handle;
         }
+        if (*room && (!entry || entry->found < (*room)->found)) {
+            room = &entry;
+        }
     }
-    if (room == nullptr) {
-        return kNoService;
-    }
-    // No handle comes again, so that one that was released is never another's.
-    room->emplace(Entry{++lastHandle_, 1, path, status});
+    // No handle comes again, so that one that was released or gave way is never another's.
+    room->emplace(Entry{++lastHandle_, 1, path, status, ++lastFound_});
     return lastHandle_;
 }
 

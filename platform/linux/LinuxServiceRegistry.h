@@ -35,7 +35,10 @@ class RegistryPath {
 /// such property is no failure.
 class LinuxServiceRegistry final : public ServiceRegistry {
   public:
-    /// How many entries are held at the same time. One more is not found.
+    /// How many entries are held at the same time. One more takes the place of the one that was
+    /// found the longest ago, whose handle is then not held any more: a kernel side that is
+    /// somewhere else at every look must not use them up, because a library that cannot open what
+    /// it has found keeps it.
     static constexpr std::size_t kMaxEntries = 16;
 
     LinuxServiceRegistry(std::string_view socketPath, SystemLog& log,
@@ -69,6 +72,8 @@ class LinuxServiceRegistry final : public ServiceRegistry {
         /// None when the kernel service could not be asked for it.
         std::optional<RegistryPath> path;
         Status status;
+        /// A number that grows.
+        std::uint64_t found;
     };
 
     /// How a request ended: as a status, or with no entry of that name.
@@ -96,6 +101,7 @@ class LinuxServiceRegistry final : public ServiceRegistry {
     Outcome lastCopy_ = kSuccess;
     std::array<std::optional<Entry>, kMaxEntries> entries_;
     ServiceHandle lastHandle_ = kNoService;
+    std::uint64_t lastFound_ = 0;
 };
 
 } // namespace platform

@@ -91,7 +91,7 @@ TEST_F(LinuxServiceRegistryTest, PathsInRepliesAtTheirLimits) {
     EXPECT_EQ(connections, 4);
 }
 
-TEST_F(LinuxServiceRegistryTest, SixteenEntriesAreTheLimit) {
+TEST_F(LinuxServiceRegistryTest, SeventeenthEntryTakesThePlaceOfTheOneFoundLongestAgo) {
     std::atomic<int> number = 0;
     serve([&](const Packet& request) {
         return support::reply(request, 0, 1, "/" + std::to_string(number));
@@ -101,13 +101,22 @@ TEST_F(LinuxServiceRegistryTest, SixteenEntriesAreTheLimit) {
         entries.push_back(registry.findByPath("/a"));
         EXPECT_EQ(registry.pathOf(entries.back()), "/" + std::to_string(number));
     }
-    EXPECT_EQ(registry.findByPath("/a"), kNoService);
-    number = 7;
-    EXPECT_EQ(registry.findByPath("/a"), entries[7]);
+    EXPECT_EQ(registry.pathOf(entries[0]), "/0");
+    // Found again, so that another one is the oldest.
+    number = 0;
+    EXPECT_EQ(registry.findByPath("/a"), entries[0]);
+    number = 16;
+    EXPECT_EQ(registry.pathOf(registry.findByClassName("a")), "/16");
+    EXPECT_EQ(registry.pathOf(entries[0]), "/0");
+    EXPECT_EQ(registry.pathOf(entries[1]), "");
+    // What gave way is nobody's, whatever is done with it.
+    registry.release(entries[1]);
+    EXPECT_FALSE(registry.copyProperty(entries[1], "p"));
     registry.release(entries[3]);
     EXPECT_EQ(registry.pathOf(entries[3]), "");
-    number = 16;
-    EXPECT_NE(registry.findByPath("/a"), kNoService);
+    number = 17;
+    EXPECT_EQ(registry.pathOf(registry.findByPath("/a")), "/17");
+    EXPECT_EQ(registry.pathOf(entries[2]), "/2");
 }
 
 TEST_F(LinuxServiceRegistryTest, PropertyOfAnEntryThatIsNotHeldIsNone) {
