@@ -5,6 +5,7 @@
 
 #include <systemd/sd-bus.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <chrono>
 #include <cstdint>
@@ -22,13 +23,13 @@ namespace {
 
 /// A connection to systemd's manager over the system's message bus, for a few calls in a row.
 ///
-/// Every call waits for its answer, and a job for its end, as long as `kPatience`.
+/// Every call waits for its answer, and a job for its end, as long as its patience.
 class SystemdBus : private base::NotCopied {
   public:
-    static constexpr std::chrono::seconds kPatience{5};
+    using Patience = std::chrono::microseconds;
 
     /// `socket` is the file of the bus's socket. That nobody serves it shows in the calls.
-    explicit SystemdBus(const std::string& socket);
+    SystemdBus(const std::string& socket, Patience patience);
     ~SystemdBus();
 
     [[nodiscard]] platform::Result<std::uint64_t>
@@ -49,6 +50,7 @@ class SystemdBus : private base::NotCopied {
     [[nodiscard]] std::optional<platform::Error> awaitRemoval(const std::string& job);
 
     sd_bus* bus_ = nullptr;
+    Patience patience_;
     /// Why there is no connection; 0 when there is one.
     int failure_ = 0;
     /// The job whose end was told last.
@@ -59,10 +61,12 @@ constexpr char kSystemd[] = "org.freedesktop.systemd1";
 constexpr char kManagerPath[] = "/org/freedesktop/systemd1";
 constexpr char kManager[] = "org.freedesktop.systemd1.Manager";
 
-constexpr std::uint64_t kPatienceMicroseconds =
-    std::chrono::microseconds(SystemdBus::kPatience).count();
+/// As the bus's library takes it.
+std::uint64_t microseconds(SystemdBus::Patience time) {
+    return static_cast<std::uint64_t>(std::max<SystemdBus::Patience::rep>(time.count(), 0));
+}
 
-int connect(sd_bus** bus, const std::string& socket) {
+int connect(sd_bus** bus, const std::string& socket, SystemdBus::Patience patience) {
     int result = sd_bus_new(bus);
     const auto then = [&result](int next) {
         result = next;
@@ -70,7 +74,7 @@ int connect(sd_bus** bus, const std::string& socket) {
     };
     if (result >= 0 && then(sd_bus_set_address(*bus, base::concat("unix:path=", socket).c_str())) &&
         then(sd_bus_set_bus_client(*bus, 1)) &&
-        then(sd_bus_set_method_call_timeout(*bus, kPatienceMicroseconds))) {
+        then(sd_bus_set_method_call_timeout(*bus, microseconds(patience)))) {
         then(sd_bus_start(*bus));
     }
     return result;
@@ -98,8 +102,8 @@ int takeRemovedJob(sd_bus_message* signal, void* removedJob, sd_bus_error* /*err
     return 0;
 }
 
-SystemdBus::SystemdBus(const std::string& socket) {
-    const int result = connect(&bus_, socket);
+SystemdBus::SystemdBus(const std::string& socket, Patience patience) : patience_(patience) {
+    const int result = connect(&bus_, socket, patience);
     failure_ = result < 0 ? result : 0;
 }
 
@@ -143,7 +147,7 @@ std::optional<platform::Error> SystemdBus::runJob(const char* method, const Argu
                          then(sd_bus_message_new_method_call(bus_, &call, kSystemd, kManagerPath,
                                                              kManager, method)) &&
                          then(arguments(call)) &&
-                         then(sd_bus_call(bus_, call, kPatienceMicroseconds, &error, &reply)) &&
+                         then(sd_bus_call(bus_, call, microseconds(patience_), &error, &reply)) &&
                          then(sd_bus_message_read(reply, "o", &job));
     std::optional<platform::Error> failed = isBegun ? awaitRemoval(job) : errorOf(result, error);
     sd_bus_error_free(&error);
@@ -153,21 +157,19 @@ std::optional<platform::Error> SystemdBus::runJob(const char* method, const Argu
 }
 
 std::optional<platform::Error> SystemdBus::awaitRemoval(const std::string& job) {
-    const auto deadline = std::chrono::steady_clock::now() + kPatience;
+    const auto deadline = std::chrono::steady_clock::now() + patience_;
     while (removedJob_ != job) {
         const int processed = sd_bus_process(bus_, nullptr);
         if (processed < 0) {
             return systemError(processed);
         }
-        if (processed > 0) {
-            continue;
-        }
-        const auto left = std::chrono::duration_cast<std::chrono::microseconds>(
-            deadline - std::chrono::steady_clock::now());
+        // Also after a message that was processed: there may always be another one.
+        const auto left =
+            std::chrono::duration_cast<Patience>(deadline - std::chrono::steady_clock::now());
         if (left.count() <= 0) {
             return systemError(-ETIMEDOUT);
         }
-        const int waited = sd_bus_wait(bus_, static_cast<std::uint64_t>(left.count()));
+        const int waited = processed > 0 ? 0 : sd_bus_wait(bus_, microseconds(left));
         if (waited < 0 && waited != -EINTR) {
             return systemError(waited);
         }
@@ -216,8 +218,8 @@ int appendUnit(sd_bus_message* call, AlarmTimerUnit::Time time, AlarmTimerUnit::
 } // namespace
 
 platform::Result<std::optional<AlarmTimerUnit::Time>> SystemdAlarmTimer::elapses() {
-    const auto next =
-        SystemdBus(busSocket_).unsignedProperty(kUnitPath, kTimer, "NextElapseUSecRealtime");
+    const auto next = SystemdBus(busSocket_, patience_)
+                          .unsignedProperty(kUnitPath, kTimer, "NextElapseUSecRealtime");
     if (!next) {
         return next.error();
     }
@@ -229,19 +231,19 @@ platform::Result<std::optional<AlarmTimerUnit::Time>> SystemdAlarmTimer::elapses
 }
 
 std::optional<platform::Error> SystemdAlarmTimer::start(Time time, Wakes wakes) {
-    return SystemdBus(busSocket_).runJob("StartTransientUnit", [&](sd_bus_message* call) {
-        return appendUnit(call, time, wakes);
-    });
+    return SystemdBus(busSocket_, patience_)
+        .runJob("StartTransientUnit",
+                [&](sd_bus_message* call) { return appendUnit(call, time, wakes); });
 }
 
 std::optional<platform::Error> SystemdAlarmTimer::elapseNow() {
-    return SystemdBus(busSocket_).runJob("StartUnit", [](sd_bus_message* call) {
+    return SystemdBus(busSocket_, patience_).runJob("StartUnit", [](sd_bus_message* call) {
         return sd_bus_message_append(call, "ss", kService, kReplace);
     });
 }
 
 std::optional<platform::Error> SystemdAlarmTimer::stop() {
-    auto error = SystemdBus(busSocket_).runJob("StopUnit", [](sd_bus_message* call) {
+    auto error = SystemdBus(busSocket_, patience_).runJob("StopUnit", [](sd_bus_message* call) {
         return sd_bus_message_append(call, "ss", kUnit, kReplace);
     });
     return error && error->domain == SystemdBus::kNoSuchUnit ? std::nullopt : error;

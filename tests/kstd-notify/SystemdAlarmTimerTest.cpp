@@ -2,11 +2,14 @@
 
 #include "base/FileDescriptor.h"
 #include "base/UnixAddress.h"
+#include "tests/neighbours/Bus.h"
 #include "tests/support/TemporaryDirectory.h"
 
 #include <gtest/gtest.h>
 
 #include <cerrno>
+#include <chrono>
+#include <optional>
 #include <string>
 #include <sys/socket.h>
 #include <utility>
@@ -50,6 +53,35 @@ TEST(SystemdAlarmTimerTest, BusThatDoesNotListenIsAnError) {
     ASSERT_EQ(::bind(socket.get(), address.get(), address.size()), 0);
     expectEveryCallFails(SystemdAlarmTimer(directory.file("bus")),
                          {platform::kSystemErrorDomain, ECONNREFUSED, "Connection refused"});
+}
+
+TEST(SystemdAlarmTimerTest, WordsAboutOtherJobsGainABusNoTime) {
+    const support::TemporaryDirectory directory;
+    neighbours::Bus bus(directory.file("bus"), neighbours::Random(1), 0);
+    bus.beTalkative();
+    // Time for the calls, which the bus's library limits, and none for the end of a job.
+    SystemdAlarmTimer timer(directory.file("bus"), std::chrono::milliseconds(0));
+    const platform::Error tooLate{platform::kSystemErrorDomain, ETIMEDOUT, "Connection timed out"};
+    EXPECT_EQ(timer.stop(), tooLate);
+    EXPECT_EQ(timer.start(1, AlarmTimerUnit::Wakes::nothing), tooLate);
+    EXPECT_EQ(timer.elapseNow(), tooLate);
+    EXPECT_EQ(SystemdAlarmTimer(directory.file("bus")).stop(), std::nullopt);
+}
+
+TEST(SystemdAlarmTimerTest, TimerIsMadeAskedForAndTakenAwayOverTheBus) {
+    const support::TemporaryDirectory directory;
+    neighbours::Bus bus(directory.file("bus"), neighbours::Random(1), 0);
+    SystemdAlarmTimer timer(directory.file("bus"));
+    const auto elapses = [&timer] {
+        const auto time = timer.elapses();
+        EXPECT_TRUE(time);
+        return time ? time.value() : std::optional<AlarmTimerUnit::Time>(-1);
+    };
+    EXPECT_EQ(elapses(), std::nullopt);
+    EXPECT_EQ(timer.start(1'700'000'000'999'999, AlarmTimerUnit::Wakes::machine), std::nullopt);
+    EXPECT_EQ(elapses(), 1'700'000'000'999'999);
+    EXPECT_EQ(timer.stop(), std::nullopt);
+    EXPECT_EQ(elapses(), std::nullopt);
 }
 
 } // namespace
