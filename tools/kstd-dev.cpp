@@ -29,6 +29,7 @@ namespace {
 struct Options {
     std::string root;
     int idleMilliseconds = 0;
+    bool httpsSocket = false;
     std::string trustAnchors;
     double fetchSeconds = 0;
     double answerSeconds = 0;
@@ -96,7 +97,9 @@ int runDaemon(const Options& options, const platform::StopRequest& stop) {
     if (options.idleMilliseconds > 0) {
         hostOptions.idleTime = std::chrono::milliseconds(options.idleMilliseconds);
     }
-    hostOptions.https.program = httpsClient(options);
+    if (!options.httpsSocket) {
+        hostOptions.https.program = httpsClient(options);
+    }
     platform::LinuxHost host(std::move(hostOptions));
     const platform::Host interfaces = host.interfaces();
     const kstd::DaemonLibrary library(interfaces);
@@ -115,6 +118,10 @@ int main(int argc, char** argv) try {
         ->required();
     app.add_option("--idle-exit", options.idleMilliseconds,
                    "End after this many milliseconds without work; 0 is never");
+    app.add_flag(
+        "--https-socket", options.httpsSocket,
+        "Reach the HTTPS client behind /run/kstd/https.sock, as the installed daemon does, "
+        "and start none");
     app.add_option("--trust-anchors", options.trustAnchors,
                    "Certificates (PEM) that servers are trusted by, in place of the system's");
     app.add_option("--fetch-limit", options.fetchSeconds,
