@@ -1,3 +1,4 @@
+#include "KSTLib/ContextCredentials.h"
 #include "KSTLib/LibCall.h"
 #include "tests/KSTLib/ChannelFixture.h"
 #include "tests/support/ScriptedGate.h"
@@ -5,6 +6,7 @@
 #include <gtest/gtest.h>
 
 #include <array>
+#include <cerrno>
 #include <limits>
 
 namespace {
@@ -16,6 +18,47 @@ using support::ScriptedGate;
 using support::ScriptedRegistry;
 
 using Open = support::ChannelFixture;
+
+/// A channel whose connection is lost when the test says so, and which keeps the deadlines it got.
+class NotingChannel : public ScriptedChannel {
+  public:
+    bool isLost = false;
+    bool isInheritedOnce = false;
+    std::vector<bool> deadlines;
+    platform::Status postStatus = platform::kSuccess;
+    std::size_t posts = 0;
+
+    [[nodiscard]] bool isConnected(platform::ConnectionHandle /*connection*/) const override {
+        return !isLost;
+    }
+    [[nodiscard]] bool isInherited() const noexcept override { return isInheritedOnce; }
+    void leaveToParent() noexcept override { isInheritedOnce = false; }
+    void setDeadline(std::optional<Deadline> deadline) noexcept override {
+        deadlines.push_back(deadline.has_value());
+    }
+    platform::Status post(platform::ConnectionHandle /*connection*/, std::uint32_t /*selector*/,
+                          const void* /*input*/, std::size_t /*inputSize*/) override {
+        ++posts;
+        return postStatus;
+    }
+};
+
+class NotingOpen : public support::LibraryFixture {
+  protected:
+    void SetUp() override {
+        LibraryFixture::SetUp();
+        kst::installPlatform({log, registry, channel});
+        ASSERT_EQ(kst::init(), 0);
+    }
+
+    void TearDown() override {
+        kst::removePlatform();
+        LibraryFixture::TearDown();
+    }
+
+    ScriptedRegistry registry;
+    NotingChannel channel;
+};
 
 /// The channel is open already.
 class PerformCommand : public support::ChannelFixture {
@@ -292,4 +335,71 @@ TEST_F(PerformCommand, TransportSendsTheLowBytesAndIgnoresItsContext) {
     const KSTTransport transport = kst::channelTransport;
     EXPECT_EQ(transport(nullptr, 0xffffff19, 0x100, nullptr, 0, nullptr, nullptr), 0);
     EXPECT_EQ(channel.structCalls.back().input, (Bytes{'D', 'R', 'C', 'S', 0x19, 0, 0, 0}));
+}
+
+TEST_F(Open, WantOfMemoryIsTheLibrarysStatus) {
+    channel.openStatus = platform::statusFromErrno(ENOMEM);
+    EXPECT_EQ(kst::init(), kKSTErrorOutOfMemory);
+    channel.openStatus = 0;
+    channel.structStatus = platform::statusFromErrno(ENOMEM);
+    EXPECT_EQ(kst::channelTransport(nullptr, 26, 0, nullptr, 0, nullptr, nullptr),
+              kKSTErrorOutOfMemory);
+    EXPECT_EQ(logged(), (Lines{failedCheck("err == 0 ", "0xfffffffffffffffc"),
+                               failedCheck("err == 0 ", "0xfffffffffffffffc")}));
+}
+
+TEST_F(NotingOpen, ReplyThatDoesNotFitTellsOfALostConnection) {
+    channel.reportedSize = 1;
+    EXPECT_EQ(kst::performCommand(26, 0, nullptr, 0, nullptr, nullptr), kKSTErrorUnexpected);
+    EXPECT_FALSE(kst::isConnectionLost());
+    channel.isLost = true;
+    EXPECT_EQ(kst::performCommand(26, 0, nullptr, 0, nullptr, nullptr), kKSTErrorUnexpected);
+    EXPECT_TRUE(kst::isConnectionLost());
+    // Whoever begins anew has lost nothing yet.
+    kst::closeChannel();
+    EXPECT_FALSE(kst::isConnectionLost());
+}
+
+TEST_F(NotingOpen, DeadlineOfACallEndsWithIt) {
+    {
+        const kst::CallScope outer;
+        const kst::CallScope inner;
+    }
+    EXPECT_EQ(channel.deadlines, (std::vector<bool>{true, true, true, false}));
+}
+
+TEST_F(NotingOpen, PostedCommand) {
+    EXPECT_EQ(kst::postCommand(2, "a", 1), 0);
+    {
+        const ScriptedGate gate(0);
+        EXPECT_EQ(kst::postCommand(2, "a", 1), kKSTErrorOutOfMemory);
+    }
+    EXPECT_EQ(channel.posts, 1U);
+    channel.postStatus = platform::statusFromErrno(ENOMEM);
+    EXPECT_EQ(kst::postCommand(2, "a", 1), kKSTErrorOutOfMemory);
+    channel.postStatus = -9;
+    EXPECT_EQ(kst::postCommand(2, "a", 1), -9);
+    EXPECT_EQ(channel.posts, 3U);
+    kst::removePlatform();
+    EXPECT_EQ(kst::postCommand(2, "a", 1), kKSTErrorUnexpected);
+    EXPECT_EQ(channel.posts, 3U);
+}
+
+TEST_F(NotingOpen, ChildDeletesItsTemporaryContextsToo) {
+    channel.isInheritedOnce = true;
+    // Its handle, and the level.
+    channel.reply = Bytes(17, 40);
+    KSTCredential* credential = nullptr;
+    ASSERT_EQ(KSTCredentialCreate(kKSTCredentialTypePasscodeValidated, &credential), 0);
+    static_cast<void>(KSTGlobalContextAddCredential(credential));
+    KSTCredentialDelete(credential);
+    EXPECT_FALSE(channel.isInheritedOnce);
+    ASSERT_FALSE(channel.structCalls.empty());
+    EXPECT_EQ(channel.structCalls.front().input.at(4), 1);
+    EXPECT_EQ(channel.structCalls.back().input.at(4), 2);
+    gAllocatedBytes -= 1;
+}
+
+TEST(CallTime, IsFiveSecondsInAll) {
+    EXPECT_EQ(kst::CallTime().limit, std::chrono::seconds(5));
 }

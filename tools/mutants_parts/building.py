@@ -5,6 +5,7 @@ import hashlib
 import json
 import os
 import re
+import shlex
 import subprocess
 import sys
 
@@ -100,6 +101,13 @@ class Build:
             ["pkg-config", "--cflags", "libsystemd", "sqlite3", "libcrypto", "libplist-2.0"], text=True).split()
         return ["-xc++", "-std=c++20", "-I.", "-w", *packages, "-resource-dir", source.resource_directory()]
 
+    def definitions(self):
+        """What the build defines for each source."""
+        listed = os.path.join(self.binary, "compile_commands.json")
+        commands = json.loads(read(listed)) if os.path.exists(listed) else []
+        return {os.path.relpath(each["file"], self.tree):
+                [word for word in shlex.split(each["command"]) if word.startswith("-D")] for each in commands}
+
     def find_points(self, paths):
         """The points of each source; those of a source that has not changed are kept from before."""
         kept_file = os.path.join(self.directory, "points.json")
@@ -107,18 +115,13 @@ class Build:
         program = read(os.path.join(HERE, "source.py"))
         hashes = {path: hashlib.sha256(program + read(os.path.join(self.root, path))).hexdigest() for path in paths}
         points = {path: kept[path][1] for path in paths if path in kept and kept[path][0] == hashes[path]}
-        arguments = self.arguments()
-        tasks = [(self.root, path, arguments) for path in paths if path not in points]
+        arguments, definitions = self.arguments(), self.definitions()
+        tasks = [(self.root, path, arguments + definitions.get(path, [])) for path in paths if path not in points]
         with concurrent.futures.ProcessPoolExecutor(2) as pool:
             points.update(pool.map(analyse, tasks))
         write_if_different(kept_file, json.dumps({path: (hashes[path], points[path]) for path in paths}).encode())
         return {path: [source.Point(start, end, form, shared(changes)) for start, end, form, changes in each]
                 for path, each in points.items()}
-
-    def rewrite(self, paths):
-        for path, points in self.find_points(paths).items():
-            text = read(os.path.join(self.root, path)).decode("latin-1")
-            self.rewritings[path] = Rewriting(path, text, points)
 
     def numbers(self, path):
         """Of every mutant of the source that can be compiled."""
@@ -139,13 +142,12 @@ class Build:
                 for path in self.rewritings for name, number in self.numbers(path).items()}
 
     def copy(self):
-        """The tree as it is, but for the sources, which get their mutants."""
+        """The tree as it is. A source stays as it was written here, if it was."""
         files = self.files_of_tree()
-        self.rewrite(self.sources(files))
-        kept = set(files)
+        sources, kept = set(self.sources(files)), set(files)
         for path in files:
             from_, to = os.path.join(self.root, path), os.path.join(self.tree, path)
-            if path in self.rewritings:
+            if path in sources and os.path.exists(to):
                 continue
             if os.path.islink(from_):
                 if not os.path.lexists(to):
@@ -158,8 +160,12 @@ class Build:
                 path = os.path.relpath(os.path.join(directory, name), self.tree)
                 if path not in kept:
                     os.remove(os.path.join(directory, name))
-        for path in self.rewritings:
-            self.write(path)
+
+    def rewrite(self):
+        """Knows all mutants, as the build has them."""
+        for path, points in self.find_points(self.sources(self.files_of_tree())).items():
+            text = read(os.path.join(self.root, path)).decode("latin-1")
+            self.rewritings[path] = Rewriting(path, text, points)
 
     def write(self, path):
         text = self.rewritings[path].write(self.numbers(path))
@@ -176,7 +182,7 @@ class Build:
                         "-DCMAKE_C_COMPILER=clang", "-DCMAKE_CXX_COMPILER=clang++", "-DCMAKE_BUILD_TYPE=Debug",
                         "-DCMAKE_CXX_FLAGS_DEBUG=-O0 -g0", f"-DCMAKE_CXX_FLAGS={flags}",
                         f"-DCMAKE_EXE_LINKER_FLAGS={runtime}", f"-DCMAKE_SHARED_LINKER_FLAGS={runtime}",
-                        "-DKSTD_BENCHMARKS=OFF"], check=True, stdout=subprocess.DEVNULL)
+                        "-DKSTD_BENCHMARKS=OFF", "-DCMAKE_EXPORT_COMPILE_COMMANDS=ON"], check=True, stdout=subprocess.DEVNULL)
 
     def drop_blamed(self, output):
         """Takes out the mutants that the compiler refuses. How many there were."""
@@ -239,6 +245,9 @@ class Build:
     def make(self, targets, jobs=2):
         self.copy()
         self.configure()
+        self.rewrite()
+        for path in self.rewritings:
+            self.write(path)
         self.check_headers()
         self.save()
         self.compile(targets, jobs)

@@ -43,6 +43,7 @@ def run(program, names, seconds, mutant=0, reached=None):
     if reached is not None:
         environment["MUTANTS_REACHED"] = reached
     private = tempfile.mkdtemp(prefix="mutants-")
+    os.chmod(private, 0o755)  # Some tests become another user.
     environment["TMPDIR"] = private
     began = time.monotonic()
     output_file = os.path.join(private, "output")
