@@ -66,6 +66,24 @@ TEST_F(DeepRequirement, ManyLevelsThereAndBack) {
     expectLogged({});
 }
 
+TEST_F(DeepRequirement, LevelsHaveMoreChildrenBehindTheDeepOne) {
+    // More than there is room for without any memory: what has begun goes on in the new room.
+    Bytes bytes = support::leafBytes(1);
+    for (std::uint32_t level = 0; level < 80; ++level) {
+        bytes = support::compositeBytes(4, {bytes, support::leafBytes(1), support::leafBytes(1)});
+    }
+    ASSERT_EQ(DeserializeRequirement(bytes.data(), bytes.size(), &tree, &consumed), 0);
+    EXPECT_EQ(consumed, bytes.size());
+    std::size_t size = 0;
+    EXPECT_EQ(GetSerializedRequirementSize(tree, &size), 0);
+    EXPECT_EQ(size, bytes.size());
+    const ExactBuffer target(size);
+    EXPECT_EQ(SerializeRequirement(tree, target.data(), &size), 0);
+    EXPECT_TRUE(target.bytes() == bytes);
+    DeallocRequirement(tree);
+    expectLogged({});
+}
+
 TEST_F(DeepRequirement, FailureBelowManyLevels) {
     CountingLog counting;
     kst::setLibraryLog(&counting);

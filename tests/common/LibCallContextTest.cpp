@@ -282,12 +282,15 @@ TEST_F(LibCallContext, VerifyPolicyWithoutRequirement) {
     EXPECT_TRUE(satisfied);
     EXPECT_EQ(requirement, nullptr);
     // Nobody wants it, so nobody reads it.
-    transport.replyWith({0, 0, 0, 0, 1, 2, 3});
-    ASSERT_EQ(LibCall_KSTContextVerifyPolicyAndCopyRequirementEx(ContextlessTransport::answer,
-                                                                 context, "p", false, nullptr, 0, 0,
-                                                                 &satisfied, nullptr),
-              0);
-    EXPECT_FALSE(satisfied);
+    for (const std::size_t size : {7U, 4096U}) {
+        satisfied = true;
+        transport.replyWith(Bytes(size));
+        ASSERT_EQ(LibCall_KSTContextVerifyPolicyAndCopyRequirementEx(ContextlessTransport::answer,
+                                                                     context, "p", false, nullptr,
+                                                                     0, 0, &satisfied, nullptr),
+                  0);
+        EXPECT_FALSE(satisfied);
+    }
 }
 
 TEST_F(LibCallContext, VerifyPolicyWithBadArguments) {

@@ -1,5 +1,6 @@
 // The causes of failures, which are told as warnings.
 
+#include "kstd/Analytics/SQLite/DatabaseEnvironment.h"
 #include "tests/kstd/Analytics/SQLite/DatabaseFixture.h"
 
 #include <sqlite3.h>
@@ -51,6 +52,33 @@ TEST_F(DatabaseCausesTest, WhatCannotBeOpenedIsToldOnceWithTheSystemsReason) {
     EXPECT_EQ(warnings(), Texts{told("unable to open database file (14), Is a directory")});
     EXPECT_FALSE(made->openWithError(nullptr));
     EXPECT_EQ(warnings(), Texts());
+}
+
+TEST_F(DatabaseCausesTest, WhatPassesIsToldAgainAfterARowWasWritten) {
+    const std::pair<int, bool> kCodes[] = {
+        {SQLITE_BUSY, true},        {SQLITE_LOCKED, true}, {SQLITE_NOMEM, true},
+        {SQLITE_READONLY, true},    {SQLITE_IOERR, true},  {SQLITE_FULL, true},
+        {SQLITE_CANTOPEN, true},    {SQLITE_ERROR, false}, {SQLITE_CORRUPT, false},
+        {SQLITE_CONSTRAINT, false}, {SQLITE_NOTADB, false}};
+    for (const auto& [code, passes] : kCodes) {
+        // An extended code is told by its own number and is of its primary code's kind.
+        for (const int told : {code, code | (1 << 8)}) {
+            SCOPED_TRACE(told);
+            DatabaseCauses causes(&log, path);
+            causes.tell(told, nullptr);
+            causes.tell(told, nullptr);
+            EXPECT_EQ(warnings().size(), 1U);
+            causes.wrote();
+            causes.tell(told, nullptr);
+            EXPECT_EQ(warnings().size(), passes ? 1U : 0U);
+        }
+    }
+}
+
+TEST_F(DatabaseCausesTest, OthersLocksAreAwaitedFiveMinutes) {
+    const DatabaseEnvironment usual{
+        .log = log, .clock = environment.clock, .propertyLists = environment.propertyLists};
+    EXPECT_EQ(usual.busyTimeout, std::chrono::minutes(5));
 }
 
 TEST_F(DatabaseCausesTest, DirectoryThatCannotBeMadeIsTold) {

@@ -76,6 +76,18 @@ TEST(DateFormatter, ReadsUTCAndOffsets) {
     }
 }
 
+TEST(DateFormatter, NeighboursOfTheDigitsAreNone) {
+    const std::string text = "2001-01-01T01:01:01+01:01";
+    ASSERT_TRUE(DateFormatter().date(text).has_value());
+    for (std::size_t at = 0; at < text.size(); ++at) {
+        for (const char neighbour : {'/', ':'}) {
+            std::string changed = text;
+            changed[at] = neighbour;
+            EXPECT_EQ(DateFormatter().date(changed).has_value(), changed == text) << changed;
+        }
+    }
+}
+
 TEST(DateFormatter, EverythingElseIsNoDate) {
     const std::string_view texts[] = {
         "",

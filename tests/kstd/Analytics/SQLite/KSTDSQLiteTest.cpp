@@ -199,6 +199,29 @@ bool isLocked(const std::string& file) {
            }) == 1;
 }
 
+TEST_F(KSTDSQLiteTest, NewFileIsTheOwnersAlone) {
+    const std::string fresh = directory.file("fresh.db");
+    for (const mode_t mask : {mode_t{0}, mode_t{0777}}) {
+        const mode_t former = ::umask(mask);
+        EXPECT_TRUE(createDatabaseFile(fresh));
+        ::umask(former);
+        EXPECT_EQ(std::filesystem::status(fresh).permissions(),
+                  std::filesystem::perms::owner_read | std::filesystem::perms::owner_write);
+        EXPECT_FALSE(createDatabaseFile(fresh));
+        std::filesystem::remove(fresh);
+    }
+    EXPECT_TRUE(createDatabaseFile(directory.file("nowhere/fresh.db")));
+}
+
+TEST_F(KSTDSQLiteTest, ParentDirectoriesAreMadeFromTheFirst) {
+    const std::string current = std::filesystem::current_path();
+    std::filesystem::current_path(directory.file(""));
+    EXPECT_FALSE(makeParentDirectories("d/e//f/x.db").has_value());
+    std::filesystem::current_path(current);
+    EXPECT_TRUE(std::filesystem::is_directory(directory.file("d/e/f")));
+    EXPECT_FALSE(std::filesystem::exists(directory.file("d/e/f/x.db")));
+}
+
 TEST_F(KSTDSQLiteTest, SecondObjectLeavesTheLocksOfTheFirst) {
     const auto first = openDatabase();
     ASSERT_TRUE(isLocked(path));
