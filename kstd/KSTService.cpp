@@ -1,5 +1,6 @@
 #include "kstd/KSTService.h"
 
+#include "KSTLib/Status.h"
 #include "kstd/LogLines.h"
 #include "platform/MessageClasses.h"
 #include "platform/ServiceRegistry.h"
