@@ -27,6 +27,7 @@ class NotingChannel : public ScriptedChannel {
     std::vector<bool> deadlines;
     platform::Status postStatus = platform::kSuccess;
     std::size_t posts = 0;
+    Bytes posted;
 
     [[nodiscard]] bool isConnected(platform::ConnectionHandle /*connection*/) const override {
         return !isLost;
@@ -37,8 +38,10 @@ class NotingChannel : public ScriptedChannel {
         deadlines.push_back(deadline.has_value());
     }
     platform::Status post(platform::ConnectionHandle /*connection*/, std::uint32_t /*selector*/,
-                          const void* /*input*/, std::size_t /*inputSize*/) override {
+                          const void* input, std::size_t inputSize) override {
         ++posts;
+        const auto* in = static_cast<const std::uint8_t*>(input);
+        posted = {in, in + inputSize};
         return postStatus;
     }
 };
@@ -397,6 +400,29 @@ TEST_F(NotingOpen, ChildDeletesItsTemporaryContextsToo) {
     ASSERT_FALSE(channel.structCalls.empty());
     EXPECT_EQ(channel.structCalls.front().input.at(4), 1);
     EXPECT_EQ(channel.structCalls.back().input.at(4), 2);
+    gAllocatedBytes -= 1;
+}
+
+TEST_F(NotingOpen, TemporaryContextOfACallWhoseTimeIsUpIsDeletedByAPost) {
+    static std::chrono::steady_clock::time_point now;
+    const kst::CallTime time{.limit = std::chrono::seconds(5), .now = [] {
+                                 return now;
+                             }};
+    kst::installPlatform({log, registry, channel, time});
+    channel.reply = Bytes(17, 7);
+    channel.duringStructCall = [&] {
+        if (channel.structCalls.back().input.at(4) == 5) {
+            now += std::chrono::seconds(5);
+        }
+    };
+    KSTCredential* credential = nullptr;
+    ASSERT_EQ(KSTCredentialCreate(kKSTCredentialTypePasscodeValidated, &credential), 0);
+    static_cast<void>(KSTGlobalContextAddCredential(credential));
+    KSTCredentialDelete(credential);
+    EXPECT_EQ(channel.posts, 1U);
+    Bytes frame = {'D', 'R', 'C', 'S', 2, 0, 0, 0};
+    frame.insert(frame.end(), 16, 7);
+    EXPECT_EQ(channel.posted, frame);
     gAllocatedBytes -= 1;
 }
 

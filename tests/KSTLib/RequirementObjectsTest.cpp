@@ -223,12 +223,30 @@ TEST_F(RequirementObjects, EntriesAndReturnsAtLevel30) {
     static_cast<void>(KSTRequirementGetProperties(asRequirement(bytes),
                                                   [](std::uint32_t, const void*, std::size_t) {}));
     KSTRequirementGetSubrequirements(asRequirement(bytes), [](const KSTRequirement*) {});
+    static_cast<void>(KSTRequirementGetState(asRequirement(bytes)));
+    static_cast<void>(KSTRequirementGetPriority(asRequirement(bytes)));
+    const void* data = nullptr;
+    std::size_t length = 0;
+    static_cast<void>(KSTRequirementGetPropertyData(asRequirement(bytes), 1, &data, &length));
     EXPECT_EQ(newLines(), (Lines{
                               "KSTLib: KSTRequirementGetType: called.\n",
                               "KSTLib: KSTRequirementGetType: returning.\n",
                               "KSTLib: KSTRequirementGetProperties: called.\n",
                               "KSTLib: KSTRequirementGetProperties: returning, err = 0.\n",
                               "KSTLib: KSTRequirementGetSubrequirements: called.\n",
+                              "KSTLib: KSTRequirementGetSubrequirements: returning.\n",
+                              "KSTLib: KSTRequirementGetState: called.\n",
+                              "KSTLib: KSTRequirementGetState: returning.\n",
+                              "KSTLib: KSTRequirementGetPriority: called.\n",
+                              "KSTLib: KSTRequirementGetPriority: returning.\n",
+                              "KSTLib: KSTRequirementGetPropertyData: called.\n",
+                              "KSTLib: KSTRequirementGetPropertyData: returning, err = 0.\n",
+                          }));
+    // What fails is told between the two.
+    KSTRequirementGetSubrequirements(nullptr, nullptr);
+    EXPECT_EQ(newLines(), (Lines{
+                              "KSTLib: KSTRequirementGetSubrequirements: called.\n",
+                              failedCheck("requirement"),
                               "KSTLib: KSTRequirementGetSubrequirements: returning.\n",
                           }));
 }

@@ -1,12 +1,15 @@
 #include "common/Allocation.h"
 
+#include "tests/support/ChildProcess.h"
 #include "tests/support/ScriptedGate.h"
 
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <array>
 #include <cstring>
 #include <limits>
+#include <thread>
 
 namespace {
 
@@ -19,6 +22,21 @@ class Allocation : public testing::Test {
 
     const std::int64_t before = gAllocatedBytes;
 };
+
+using Secret = std::array<std::uint8_t, 24>;
+
+constexpr Secret kForgotten{};
+
+Secret secret() {
+    Secret bytes{};
+    bytes.fill(0x55);
+    return bytes;
+}
+
+/// In a process that ends soon: what a thread that is there no more has held, and holds for good.
+void holdInAnotherThread(Secret& bytes) {
+    std::thread([&bytes] { new kst::CallBuffer(bytes.data(), bytes.size()); }).join();
+}
 
 } // namespace
 
@@ -115,6 +133,56 @@ TEST_F(Allocation, ScopeReleases) {
     }
     EXPECT_EQ(gate.freed, std::vector<std::size_t>{12});
     EXPECT_TRUE(gate.everyFreeWasWiped);
+}
+
+TEST_F(Allocation, ChildForgetsWhatOtherThreadsHeldAndNothingElse) {
+    EXPECT_EQ(support::exitStatusOfChild([] {
+                  Secret first = secret();
+                  Secret own = secret();
+                  Secret second = secret();
+                  Secret left = secret();
+                  holdInAnotherThread(first);
+                  kst::CallBuffer mine(own.data(), own.size());
+                  kst::CallBuffer gone(left.data(), left.size());
+                  holdInAnotherThread(second);
+                  gone.leave();
+                  kst::CallBuffer nothing(nullptr, 24);
+                  kst::CallBuffer::wipeThoseOfOtherThreads();
+                  const bool wiped = first == kForgotten && second == kForgotten;
+                  const bool kept = own == secret() && left == secret();
+
+                  // It is forgotten, and what is its own is known still.
+                  first = secret();
+                  kst::CallBuffer::wipeThoseOfOtherThreads();
+                  const bool once = first == secret() && own == secret();
+                  std::thread([] { kst::CallBuffer::wipeThoseOfOtherThreads(); }).join();
+                  const bool known = own == kForgotten && left == secret();
+                  return (wiped ? 0 : 1) + (kept ? 0 : 2) + (once ? 0 : 4) + (known ? 0 : 8);
+              }),
+              0);
+}
+
+TEST_F(Allocation, MemoryOfACallIsKnownUntilItIsHandedOut) {
+    EXPECT_EQ(support::exitStatusOfChild([] {
+                  kst::AllocatedMemory held(sizeof(Secret));
+                  kst::AllocatedMemory handed(sizeof(Secret));
+                  std::memset(held.bytes(), 0x55, sizeof(Secret));
+                  std::memset(handed.bytes(), 0x55, sizeof(Secret));
+                  std::uint8_t* const bytes = handed.handOut();
+                  const Secret whole = secret();
+                  std::thread([] { kst::CallBuffer::wipeThoseOfOtherThreads(); }).join();
+                  const bool wiped =
+                      std::memcmp(held.bytes(), kForgotten.data(), sizeof(Secret)) == 0;
+                  const bool kept = std::memcmp(bytes, whole.data(), sizeof(Secret)) == 0;
+                  return (wiped ? 0 : 1) + (kept ? 0 : 2) + (handed.bytes() == nullptr ? 0 : 4);
+              }),
+              0);
+}
+
+TEST_F(Allocation, GateThatWasThereIsHandedBack) {
+    ScriptedGate first;
+    EXPECT_EQ(kst::setAllocationGate(nullptr), &first);
+    EXPECT_EQ(kst::setAllocationGate(&first), nullptr);
 }
 
 TEST_F(Allocation, LeavesTheLastValueToItsOwner) {

@@ -249,6 +249,9 @@ TEST(HTTPMessages, NumbersOfARequestAtTheirLimits) {
     EXPECT_TRUE(encoded(63, 0, 0));
     EXPECT_TRUE(encoded(64, 0, 0));
     EXPECT_FALSE(encoded(65, 0, 0));
+    HTTPRequestFields many{.method = "GET", .link = "l"};
+    many.headers.resize(65, {"n", "v"});
+    EXPECT_FALSE(encodeHTTPRequest(many));
     EXPECT_TRUE(encoded(0, kHTTPMaxBodySize, kHTTPMaxBodySize));
     EXPECT_FALSE(encoded(0, kHTTPMaxBodySize + 1, 0));
     EXPECT_FALSE(encoded(0, 0, kHTTPMaxBodySize + 1));

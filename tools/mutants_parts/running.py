@@ -39,7 +39,8 @@ class Outcome:
 
 def run(program, names, seconds, mutant=0, reached=None):
     """Runs tests of a program; status None when the time is over."""
-    environment = dict(os.environ, MUTANT=str(mutant), GTEST_BRIEF="0", GTEST_COLOR="no")
+    environment = dict(os.environ, MUTANT=str(mutant), GTEST_BRIEF="0", GTEST_COLOR="no",
+                       MALLOC_PERTURB_="165")  # Memory that was freed, or never written, is no zeros.
     if reached is not None:
         environment["MUTANTS_REACHED"] = reached
     private = tempfile.mkdtemp(prefix="mutants-")
@@ -121,15 +122,18 @@ class Tests:
                 return None
             with mmap.mmap(file.fileno(), LAST_NUMBER, access=mmap.ACCESS_READ) as reached:
                 numbers = [match.start() for match in re.finditer(b"\x01", reached)]
-        return {"seconds": outcome.seconds, "reached": numbers}
+        # What it costs among others in one process, however busy the machine is.
+        own = re.search(r"(?m)^\[       OK \] .*\((\d+) ms\)", outcome.output)
+        return {"seconds": outcome.seconds, "own": int(own[1]) / 1000 if own else outcome.seconds,
+                "reached": numbers}
 
     def reaching(self):
-        """For each mutant the tests that reach it: (seconds, program, test)."""
+        """For each mutant the tests that reach it: (own seconds, seconds, program, test)."""
         found = {}
         for program in self.programs:
             for test, what in self.known[os.path.basename(program)]["tests"].items():
                 for number in what["reached"]:
-                    found.setdefault(number, []).append((what["seconds"], program, test))
+                    found.setdefault(number, []).append((what["own"], what["seconds"], program, test))
         return found
 
     def runs_together(self, program):
@@ -147,15 +151,14 @@ class Killer:
     def order(self, path, reaching):
         """Those that bear the source's name first, then the fast ones."""
         stem = os.path.splitext(os.path.basename(path))[0].lower()
-        tests = sorted(reaching, key=lambda each: (stem not in each[2].lower(), each[0]))
+        tests = sorted(reaching, key=lambda each: (stem not in each[3].lower(), each))
         seconds, kept = 0.0, []
-        for each in sorted(tests, key=lambda each: each[0]):
+        for each in tests:
             seconds += each[0]
             if seconds > self.budget and kept:
                 break
             kept.append(each)
-        kept = set(kept)
-        return [each for each in tests if each in kept]
+        return kept
 
     def verdict(self, number, path, reaching):
         """What killed it, or None; and how many tests were run."""
@@ -163,7 +166,7 @@ class Killer:
         rounds = [tests[:self.FIRST], tests[self.FIRST:self.THEN], tests[self.THEN:]]
         for each in rounds:
             by_program = {}
-            for seconds, program, test in each:
+            for _, seconds, program, test in each:
                 by_program.setdefault(program, []).append((seconds, test))
             for program, batch in by_program.items():
                 killed = self.together(number, program, batch) if self.tests.runs_together(program) \

@@ -122,7 +122,7 @@ class Source:
         elif kind in (Kind.FIELD_DECL, Kind.VAR_DECL):
             if kind == Kind.FIELD_DECL:
                 self.function = function_of(cursor)
-                self.variable(cursor, is_local=False)
+                self.variable(cursor, is_overwritten=cursor.semantic_parent.kind == Kind.STRUCT_DECL)
         elif kind in SCOPES:
             for child in cursor.get_children():
                 self.declaration(child)
@@ -130,7 +130,7 @@ class Source:
     def definition(self, cursor):
         children = list(cursor.get_children())
         bodies = [child for child in children if child.kind in (Kind.COMPOUND_STMT, Kind.CXX_TRY_STMT)]
-        if not bodies:
+        if not bodies or not self.clean.startswith("{", bodies[-1].extent.start.offset):  # Written by the compiler.
             return
         head = self.clean[cursor.extent.start.offset:bodies[-1].extent.start.offset]
         if "consteval" in head or "= default" in head:
@@ -142,7 +142,7 @@ class Source:
         self.statement(bodies[-1])
         self.function = outer
 
-    def variable(self, cursor, is_local=True):
+    def variable(self, cursor, is_overwritten=True):
         """Its initial value, unless the compiler has to know it."""
         start, end = self.span(cursor)
         name = cursor.location.offset
@@ -158,7 +158,8 @@ class Source:
             if constant and not self.runs(child):
                 continue
             # Most are overwritten by who fills the variable: nothing can tell.
-            if is_local and self.clean[first:last].strip() in ("0", "false", "{}", "{0}", "nullptr"):
+            if is_overwritten and (self.clean[first:last].strip() in ("0", "false", "{}", "{0}", "nullptr")
+                                   or cursor.kind == Kind.FIELD_DECL and "::" in self.clean[first:last]):
                 continue
             self.expression(child)
 
@@ -227,8 +228,8 @@ class Source:
                     self.statement(child)
         elif kind.is_expression():
             words = self.words(*self.span(cursor))
-            # Room made beforehand, and names that are only mentioned.
-            if re.search(r"\.reserve\(|^static_cast<void>\(\w+\)$", words):
+            # Room made beforehand, names that are only mentioned, and what cannot be.
+            if re.search(r"\.reserve\(|^static_cast<void>\(\w+\)$|^assert\(", words):
                 return
             self.drop(cursor, "drop-wipe" if re.search(r"(?i)wipe|explicit_bzero", words) else "drop-statement")
             self.expression(cursor)
@@ -289,7 +290,7 @@ class Source:
             first, _ = self.span(child)
             if first < marks[0]:
                 for inner in child.get_children() if child.kind == Kind.DECL_STMT else ():
-                    self.variable(inner, is_local=False)
+                    self.variable(inner, is_overwritten=False)
             elif first < marks[1]:
                 self.decision(child, loops=True)
             else:

@@ -32,6 +32,9 @@ const std::vector<Pair> kPairs = {
     {"efbfbf", "ffff"},
     {"f0908080", "d800dc00"},
     {"f09f9880", "d83dde00"},
+    {"f1808080", "d8c0dc00"},
+    {"f2808080", "d9c0dc00"},
+    {"f3808080", "dac0dc00"},
     {"f48fbfbf", "dbffdfff"},
     {"61 c3a9 f09f9880 62", "0061 00e9 d83dde00 0062"},
 };
