@@ -120,8 +120,6 @@ int syncDirectory(const std::string& path) {
     return errorUnless(directory.isOpen() && ::fsync(directory.get()) == 0);
 }
 
-/// Whether it was there before does not matter; it is synced all the same, because a process that
-/// made it may have ended before it did so.
 int makeDirectory(const std::string& path) {
     const std::string parent = base::directoryOf(path);
     int error = errorUnless(::mkdir(path.c_str(), kDirectoryMode) == 0);
@@ -132,6 +130,14 @@ int makeDirectory(const std::string& path) {
     return error == 0 || error == EEXIST ? syncDirectory(parent) : error;
 }
 
+/// Puts the file's name on disk, and that of its directory. Who made them may have ended before
+/// that.
+int syncName(const std::string& path) {
+    const std::string directory = base::directoryOf(path);
+    const int error = syncDirectory(directory);
+    return error != 0 ? error : syncDirectory(base::directoryOf(directory));
+}
+
 /// Fails with ENOENT when there is no such file.
 int overwrite(const std::string& path, std::string_view line) {
     const base::FileDescriptor file(::open(path.c_str(), kWriteFlags));
@@ -139,13 +145,11 @@ int overwrite(const std::string& path, std::string_view line) {
 }
 
 int make(const std::string& path, std::string_view line) {
-    const std::string directory = base::directoryOf(path);
-    if (const int error = makeDirectory(directory); error != 0) {
+    if (const int error = makeDirectory(base::directoryOf(path)); error != 0) {
         return error;
     }
     const base::FileDescriptor file(::open(path.c_str(), kWriteFlags | O_CREAT, kFileMode));
-    const int error = file.isOpen() ? writeDurably(file.get(), line) : errno;
-    return error != 0 ? error : syncDirectory(directory);
+    return file.isOpen() ? writeDurably(file.get(), line) : errno;
 }
 
 int cancel(const std::string& path) {
@@ -221,10 +225,17 @@ bool AlarmStore::save(std::string_view stream, std::string_view event, Date date
     }
     const std::string line = lineFor(date);
     int error = overwrite(path, line);
-    error = error == ENOENT ? make(path, line) : error;
+    if (error == ENOENT) {
+        syncedNames_.erase(path);
+        error = make(path, line);
+    }
+    if (error == 0 && !syncedNames_.contains(path)) {
+        error = syncName(path);
+    }
     if (error != 0) {
         return failToSave(path, reasonOf(error));
     }
+    syncedNames_.insert(path);
     known_.insert_or_assign(path, date);
     reported_.erase(path);
     return true;

@@ -6,6 +6,7 @@
 #include <functional>
 #include <map>
 #include <optional>
+#include <set>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -17,7 +18,8 @@ namespace platform {
 ///
 /// One file for each alarm, <directory>/<stream>/<event>, that holds one line of 21 bytes: the date
 /// as 20 digits (nanoseconds since 1970-01-01 UTC), or "none" filled up with blanks after a
-/// cancellation. It is overwritten in place, which keeps a registration to one write and one sync.
+/// cancellation. It is overwritten in place, which keeps a registration to one write and one sync;
+/// the first of a process syncs the file's name as well.
 /// A file that holds anything else stands for an alarm that is due, and a directory that cannot be
 /// read for all of them: waking once too often does no harm, a lost alarm does.
 ///
@@ -58,6 +60,8 @@ class AlarmStore {
     /// What each file holds, by its path, as far as this store knows: the date that it has put
     /// there, or that the alarm is cancelled. A date that was only read may not be synced.
     std::map<std::string, std::optional<Date>, std::less<>> known_;
+    /// Files whose names this store has synced.
+    std::set<std::string, std::less<>> syncedNames_;
     /// What was said last about each file.
     std::map<std::string, std::string, std::less<>> reported_;
     /// Why each alarm is not on disk.

@@ -12,6 +12,9 @@ namespace platform {
 
 namespace {
 
+/// How often the clock may be set while a timer is armed.
+constexpr int kArmAttempts = 100;
+
 int makeTimer() {
     // The clock that wakes a sleeping machine takes a privilege, which a container may not give.
     const int waking = ::timerfd_create(CLOCK_REALTIME_ALARM, TFD_CLOEXEC | TFD_NONBLOCK);
@@ -32,9 +35,13 @@ void RealTimeTimer::arm(Date date) {
     itimerspec time{};
     time.it_value.tv_sec = nanoseconds / kNanosecondsPerSecond;
     time.it_value.tv_nsec = nanoseconds % kNanosecondsPerSecond;
-    // A clock that is set then shows as ECANCELED.
-    ::timerfd_settime(descriptor_.get(), TFD_TIMER_ABSTIME | TFD_TIMER_CANCEL_ON_SET, &time,
-                      nullptr);
+    // A clock that is set then shows as ECANCELED: here, where the timer is to be armed once more,
+    // or as it is waited for.
+    int attempts = kArmAttempts;
+    while (::timerfd_settime(descriptor_.get(), TFD_TIMER_ABSTIME | TFD_TIMER_CANCEL_ON_SET, &time,
+                             nullptr) != 0 &&
+           errno == ECANCELED && --attempts > 0) {
+    }
 }
 
 void RealTimeTimer::disarm() {

@@ -2,6 +2,7 @@
 
 #include "platform/fake/FakeSystemLog.h"
 #include "platform/linux/alarms/AlarmStore.h"
+#include "platform/linux/alarms/TimerAlarmWaker.h"
 #include "tests/support/TemporaryDirectory.h"
 
 #include <gmock/gmock.h>
@@ -13,9 +14,11 @@
 #include <filesystem>
 #include <fstream>
 #include <functional>
+#include <poll.h>
 #include <set>
 #include <string>
 #include <sys/stat.h>
+#include <sys/timerfd.h>
 #include <sys/types.h>
 #include <utility>
 #include <vector>
@@ -27,6 +30,8 @@ int theFailing = 0;
 int theError = 0;
 int theCalls = 0;
 std::set<std::string> theNames;
+/// How often the clock is set while a timer is armed.
+int theCancelledArmings = 0;
 
 /// Whether this call is the one; errno is set then.
 bool fails(const char* name) {
@@ -52,6 +57,7 @@ int __real_ftruncate(int descriptor, off_t size);
 int __real_fdatasync(int descriptor);
 int __real_mkdir(const char* path, mode_t mode);
 int __real_fsync(int descriptor);
+int __real_timerfd_settime(int descriptor, int flags, const itimerspec* time, itimerspec* former);
 DIR* __real_opendir(const char* path);
 dirent* __real_readdir(DIR* listing);
 
@@ -83,6 +89,14 @@ int __wrap_mkdir(const char* path, mode_t mode) {
 }
 int __wrap_fsync(int descriptor) {
     return fails("fsync") ? -1 : __real_fsync(descriptor);
+}
+int __wrap_timerfd_settime(int descriptor, int flags, const itimerspec* time, itimerspec* former) {
+    if (theCancelledArmings > 0) {
+        --theCancelledArmings;
+        errno = ECANCELED;
+        return -1;
+    }
+    return __real_timerfd_settime(descriptor, flags, time, former);
 }
 DIR* __wrap_opendir(const char* path) {
     return fails("opendir") ? nullptr : __real_opendir(path);
@@ -159,12 +173,41 @@ TEST_F(AlarmStoreSystemCallsTest, FirstRegistration) {
 
 TEST_F(AlarmStoreSystemCallsTest, RegistrationInThePlaceOfAnother) {
     failEachCallOfASave([this] { putAlarm("00000000000000000001\n"); }, EIO, "Input/output error");
-    EXPECT_EQ(theNames, (Names{"open", "pwrite", "fstat", "fdatasync"}));
+    EXPECT_EQ(theNames, (Names{"open", "pwrite", "fstat", "fdatasync", "fsync"}))
+        << "whoever made it may have ended before its name was on disk";
 }
 
 TEST_F(AlarmStoreSystemCallsTest, RegistrationInThePlaceOfSomethingLonger) {
     failEachCallOfASave([this] { putAlarm(std::string(100, 'x')); }, EDQUOT, "Disk quota exceeded");
-    EXPECT_EQ(theNames, (Names{"open", "pwrite", "fstat", "ftruncate", "fdatasync"}));
+    EXPECT_EQ(theNames, (Names{"open", "pwrite", "fstat", "ftruncate", "fdatasync", "fsync"}));
+}
+
+TEST_F(AlarmStoreSystemCallsTest, NameIsSyncedOnceInAProcess) {
+    putAlarm("00000000000000000001\n");
+    FakeSystemLog log;
+    AlarmStore store(path, {"a"}, log);
+    EXPECT_TRUE(store.save("stream", "a", kDate));
+    // Open, write, look at the size, sync, and nothing of the directory.
+    EXPECT_TRUE(fail(5, EIO, [&] { return store.save("stream", "a", Date{1}); }));
+    EXPECT_FALSE(hasFailed);
+    // Made anew it has a new name.
+    std::filesystem::remove(path + "/stream/a");
+    theNames.clear();
+    for (int failing = 1; theNames.count("fsync") == 0 && failing < 20; ++failing) {
+        std::filesystem::remove(path + "/stream/a");
+        static_cast<void>(fail(failing, EIO, [&] { return store.save("stream", "a", kDate); }));
+    }
+    EXPECT_EQ(theNames.count("fsync"), 1U);
+}
+
+TEST(RealTimeTimerSystemCallsTest, IsArmedThoughTheClockIsSetMeanwhile) {
+    RealTimeTimer timer;
+    theCancelledArmings = 3;
+    timer.arm(Date{1});
+    EXPECT_EQ(theCancelledArmings, 0);
+    pollfd watched{timer.descriptor(), POLLIN, 0};
+    EXPECT_EQ(::poll(&watched, 1, 30'000), 1);
+    EXPECT_EQ(timer.acknowledge(), RealTimeTimer::Wake::due);
 }
 
 TEST_F(AlarmStoreSystemCallsTest, WriteThatWritesNothingHasAReasonOfItsOwn) {
