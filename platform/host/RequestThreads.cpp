@@ -4,6 +4,7 @@
 
 #include <csignal>
 #include <iterator>
+#include <malloc.h>
 #include <system_error>
 #include <utility>
 
@@ -47,6 +48,9 @@ bool RequestThreads::start(std::function<void()> work) {
     const std::lock_guard lock(mutex_);
     const auto request = requests_.emplace(requests_.end());
     const SignalsBlocked blocked;
+    // An arena for each thread takes memory that may not be had; then nothing could be allocated in
+    // it, not even what says so.
+    ::mallopt(M_ARENA_MAX, 1);
     try {
         request->thread = std::thread(
             [this, request, work = std::move(work)]() mutable { run(request, std::move(work)); });

@@ -1,10 +1,12 @@
 #include "platform/linux/RemoteHTTPSessions.h"
 
+#include "base/Concat.h"
 #include "platform/host/HTTPRequests.h"
 #include "platform/host/RequestThreads.h"
 #include "platform/linux/HTTPSClient.h"
 #include "platform/linux/RemoteHTTPExchange.h"
 
+#include <exception>
 #include <utility>
 
 namespace platform {
@@ -26,6 +28,15 @@ HTTPReply replyTo(const HTTPRequest& request, const RemoteHTTPSettings& settings
     return RemoteHTTPExchange(reached.connection(), request, settings).perform();
 }
 
+/// On a thread nobody else catches what memory that has ended throws.
+HTTPReply replyOrReason(const HTTPRequest& request, const RemoteHTTPSettings& settings) {
+    try {
+        return replyTo(request, settings);
+    } catch (const std::exception& error) {
+        return failedReply(kTransferFailed, base::concat("transfer failed: ", error.what()));
+    }
+}
+
 /// A session of RemoteHTTPSessions. Requests may be started from any thread.
 ///
 /// When no thread can be made for a request, its completion is called before `start` returns.
@@ -35,7 +46,7 @@ class RemoteHTTPSession final : public HTTPSession {
 
     void start(const HTTPRequest& request, HTTPCompletion completion) override {
         if (!threads_.start(
-                [this, request, completion] { completion(replyTo(request, settings_)); })) {
+                [this, request, completion] { completion(replyOrReason(request, settings_)); })) {
             completion(failedReply(kTransferFailed, "no thread for the request"));
         }
     }
