@@ -7,8 +7,8 @@
 #include <chrono>
 #include <csignal>
 #include <cstdlib>
+#include <exception>
 #include <optional>
-#include <system_error>
 
 namespace {
 
@@ -28,12 +28,13 @@ int main() {
                                                 .eventSocket = platform::takeActivatedEventSocket(),
                                                 .idleTime = kIdleTime,
                                                 .stop = &stop});
-    } catch (const std::system_error&) {
+    } catch (const std::exception&) {
         // The host has said why.
         return EXIT_FAILURE;
     }
-    const platform::Host interfaces = host->interfaces();
-    const kstd::DaemonLibrary library(interfaces);
-    const kstd::AnalyticsLifetime analytics;
-    return kstd::Daemon(interfaces, kstd::makeServices(interfaces)).run();
+    return host->run([](const platform::Host& interfaces) {
+        const kstd::DaemonLibrary library(interfaces);
+        const kstd::AnalyticsLifetime analytics;
+        return kstd::Daemon(interfaces, kstd::makeServices(interfaces)).run();
+    });
 }

@@ -14,6 +14,7 @@
 #include <chrono>
 #include <csignal>
 #include <cstdio>
+#include <cstdlib>
 #include <exception>
 #include <fcntl.h>
 #include <filesystem>
@@ -74,9 +75,11 @@ base::FileDescriptor holdRoot(const platform::Paths& paths) {
 }
 
 base::FileDescriptor eventSocket(const platform::Paths& paths) {
+    const bool isHandedOver = std::getenv("LISTEN_FDS") != nullptr;
     base::FileDescriptor activated = platform::takeActivatedEventSocket();
-    return activated.isOpen() ? std::move(activated)
-                              : platform::makeEventSocket(paths.eventSocket());
+    // What is handed over but cannot be used is not replaced: events wait in it.
+    return activated.isOpen() || isHandedOver ? std::move(activated)
+                                              : platform::makeEventSocket(paths.eventSocket());
 }
 
 int runDaemon(const Options& options, const platform::StopRequest& stop) {
@@ -101,10 +104,11 @@ int runDaemon(const Options& options, const platform::StopRequest& stop) {
         hostOptions.https.program = httpsClient(options);
     }
     platform::LinuxHost host(std::move(hostOptions));
-    const platform::Host interfaces = host.interfaces();
-    const kstd::DaemonLibrary library(interfaces);
-    const kstd::AnalyticsLifetime analytics;
-    return kstd::Daemon(interfaces, kstd::makeServices(interfaces)).run();
+    return host.run([](const platform::Host& interfaces) {
+        const kstd::DaemonLibrary library(interfaces);
+        const kstd::AnalyticsLifetime analytics;
+        return kstd::Daemon(interfaces, kstd::makeServices(interfaces)).run();
+    });
 }
 
 } // namespace

@@ -7,6 +7,7 @@
 #include <systemd/sd-daemon.h>
 
 #include <cerrno>
+#include <chrono>
 #include <cstring>
 #include <fcntl.h>
 #include <memory>
@@ -24,6 +25,7 @@ namespace {
 
 constexpr char kActivationName[] = "events";
 constexpr mode_t kSocketMode = 0600;
+constexpr std::chrono::seconds kPause{1};
 
 /// The owner of the socket's file, or of the socket itself when it has no file that can be seen.
 uid_t ownerOf(int socket) {
@@ -64,6 +66,8 @@ EventSocket::EventSocket(base::FileDescriptor socket, LinuxRunLoop& loop, System
     // A socket from the init system has it set by its unit; one that was handed over may not.
     acceptCredentials(socket_.get());
     source_ = loop.addReadable(socket_.get(), [this] { receiveOne(); });
+    pause_ =
+        loop.addTimer([this] { source_->setEnabled(true); }, RunLoopSource::Keeps::loopRunning);
 }
 
 bool EventSocket::mayServe(uid_t sender) const {
@@ -87,13 +91,11 @@ void EventSocket::receiveOne() {
         ::recvmsg(socket_.get(), &message, MSG_DONTWAIT | MSG_TRUNC | MSG_CMSG_CLOEXEC);
     if (length < 0) {
         if (errno != EAGAIN && errno != EINTR) {
-            log_.write(LogLevel::warning,
-                       base::concat("kstd: EventSocket: cannot receive: ",
-                                    std::generic_category().message(errno), ".\n"),
-                       {.messageId = message::kNoEventSocket});
+            pauseAfter(errno);
         }
         return;
     }
+    failure_ = 0;
     const std::optional<uid_t> sender = senderOf(message);
     if (!sender || !mayServe(*sender)) {
         log_.write(
@@ -104,6 +106,18 @@ void EventSocket::receiveOne() {
         return;
     }
     handOn(buffer_.data(), static_cast<std::size_t>(length));
+}
+
+/// Without a pause the loop would turn for as long as the cause is there.
+void EventSocket::pauseAfter(int error) {
+    if (std::exchange(failure_, error) != error) {
+        log_.write(LogLevel::warning,
+                   base::concat("kstd: EventSocket: cannot receive: ",
+                                std::generic_category().message(error), ".\n"),
+                   {.messageId = message::kNoEventSocket});
+    }
+    source_->setEnabled(false);
+    pause_->fireAfter(kPause);
 }
 
 void EventSocket::handOn(const std::uint8_t* data, std::size_t length) {

@@ -17,8 +17,9 @@ namespace platform {
 /// Receives events from a datagram socket, one in each turn of the run loop, and hands them on.
 ///
 /// Only root and the owner of the socket may send. What comes from anybody else, is too large or
-/// malformed is dropped with a log line. Nothing is read ahead: a datagram is either in the
-/// socket's queue, which outlives the process, or handed on.
+/// malformed is dropped with a log line. When the system refuses to hand a datagram over it stays
+/// in the queue, and is asked for again after a second. Nothing is read ahead: a datagram is either
+/// in the socket's queue, which outlives the process, or handed on.
 class EventSocket {
   public:
     using Receiver = std::function<void(const wire::EventDatagram&)>;
@@ -27,6 +28,7 @@ class EventSocket {
 
   private:
     void receiveOne();
+    void pauseAfter(int error);
     void handOn(const std::uint8_t* data, std::size_t length);
     [[nodiscard]] bool mayServe(uid_t sender) const;
 
@@ -36,6 +38,10 @@ class EventSocket {
     uid_t owner_;
     std::array<std::uint8_t, wire::kEventMaxSize> buffer_{};
     std::unique_ptr<RunLoopSource> source_;
+    /// Ends a pause.
+    std::unique_ptr<RunLoopSource> pause_;
+    /// Why nothing could be received last; 0 when something was.
+    int failure_ = 0;
 };
 
 /// The event socket that the init system or a supervisor handed to this process under the name

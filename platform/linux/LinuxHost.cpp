@@ -25,6 +25,8 @@
 
 #include <systemd/sd-daemon.h>
 
+#include <cstdlib>
+#include <exception>
 #include <string>
 #include <string_view>
 #include <system_error>
@@ -82,6 +84,11 @@ struct LinuxHost::Parts {
         }
         if (options.stop != nullptr && options.stop->descriptor() >= 0) {
             stop = runLoop.addUrgent(options.stop->descriptor(), [this] { closeStreams(); });
+        } else if (options.stop != nullptr) {
+            log.write(LogLevel::warning,
+                      base::concat("kstd: StopRequest: SIGTERM ends the daemon wherever it is: ",
+                                   std::generic_category().message(options.stop->failure()), ".\n"),
+                      {});
         }
         if (options.idleTime) {
             idleExit = std::make_unique<IdleExit>(
@@ -156,7 +163,7 @@ LinuxHost::LinuxHost(LinuxHostOptions options) {
     SystemLog& log = options.log != nullptr ? *options.log : systemLog;
     try {
         parts_ = std::make_unique<Parts>(std::move(options));
-    } catch (const std::system_error& error) {
+    } catch (const std::exception& error) {
         log.write(LogLevel::error, base::concat("kstd: cannot start: ", error.what(), ".\n"),
                   {.messageId = message::kCannotStart});
         throw;
@@ -165,6 +172,21 @@ LinuxHost::LinuxHost(LinuxHostOptions options) {
 
 LinuxHost::~LinuxHost() {
     parts_->events.clearHandlers();
+}
+
+int LinuxHost::run(const std::function<int(const Host&)>& program) {
+    int status = EXIT_FAILURE;
+    try {
+        status = program(interfaces());
+        if (!parts_->runLoop.hasFailed()) {
+            return status;
+        }
+    } catch (const std::exception& error) {
+        parts_->log.write(LogLevel::error,
+                          base::concat("kstd: cannot go on: ", error.what(), ".\n"), {});
+    }
+    closeStreams();
+    return EXIT_FAILURE;
 }
 
 void LinuxHost::closeStreams() {

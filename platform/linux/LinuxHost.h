@@ -10,6 +10,7 @@
 #include "wire/EventDatagram.h"
 
 #include <chrono>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -43,12 +44,17 @@ struct LinuxHostOptions {
 /// they use is still there.
 class LinuxHost : private base::NotCopied {
   public:
-    /// Throws std::system_error, and leaves a line, when the system refuses what the host cannot be
-    /// without: descriptors, above all.
+    /// Throws, and leaves a line, when the system refuses what the host cannot be without:
+    /// descriptors, above all (std::system_error), or memory.
     explicit LinuxHost(LinuxHostOptions options);
     ~LinuxHost();
 
     [[nodiscard]] Host interfaces();
+
+    /// Runs `program`, and returns what the process is to end with: what the program returned. When
+    /// the system has failed under it, so that it could not go on, that is EXIT_FAILURE, a line
+    /// says why, and what had failed to get onto disk was tried once more.
+    [[nodiscard]] int run(const std::function<int(const Host& host)>& program);
 
     /// Takes the run loop's sources away, as the end of an idle process does: no event is received
     /// any more, and the loop cannot be run once what was received is delivered. What waits in the

@@ -7,6 +7,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <exception>
 #include <sys/epoll.h>
 #include <system_error>
 #include <time.h>
@@ -73,9 +74,15 @@ void RunLoopSource::fireAfter(std::chrono::microseconds delay) {
 }
 
 int RunLoopSource::dispatch(void* self) {
-    // A copy, because the handler may destroy its source.
-    const Handler handler = static_cast<RunLoopSource*>(self)->handler_;
-    handler();
+    // Copies, because the handler may destroy its source.
+    LinuxRunLoop& loop = static_cast<RunLoopSource*>(self)->loop_;
+    try {
+        const Handler handler = static_cast<RunLoopSource*>(self)->handler_;
+        handler();
+    } catch (const std::exception& error) {
+        // What calls this is not C++ and lets nothing through.
+        loop.fail(error.what());
+    }
     return 0;
 }
 
@@ -89,18 +96,19 @@ LinuxRunLoop::~LinuxRunLoop() {
 
 bool LinuxRunLoop::runOnce(Date deadline) {
     // Without a source the library would wait for ever, and nothing in it counts them.
-    if (liveSources_ == 0) {
+    if (liveSources_ == 0 || hasFailed_) {
         return false;
     }
     const int result = sd_event_run(event_, microsecondsUntil(deadline));
     if (result < 0) {
-        log_.write(LogLevel::error,
-                   base::concat("kstd: MainRunLoop: cannot run: ",
-                                std::generic_category().message(-result), ".\n"),
-                   {});
-        return false;
+        fail(std::generic_category().message(-result));
     }
-    return true;
+    return !hasFailed_;
+}
+
+void LinuxRunLoop::fail(std::string_view reason) {
+    hasFailed_ = true;
+    log_.write(LogLevel::error, base::concat("kstd: MainRunLoop: cannot run: ", reason, ".\n"), {});
 }
 
 std::unique_ptr<RunLoopSource> LinuxRunLoop::addReadable(int descriptor,
@@ -140,9 +148,9 @@ std::unique_ptr<RunLoopSource> LinuxRunLoop::addPending(RunLoopSource::Handler h
     return source;
 }
 
-std::unique_ptr<RunLoopSource> LinuxRunLoop::addTimer(RunLoopSource::Handler handler) {
-    std::unique_ptr<RunLoopSource> source(
-        new RunLoopSource(*this, RunLoopSource::Keeps::nothing, std::move(handler)));
+std::unique_ptr<RunLoopSource> LinuxRunLoop::addTimer(RunLoopSource::Handler handler,
+                                                      RunLoopSource::Keeps keeps) {
+    std::unique_ptr<RunLoopSource> source(new RunLoopSource(*this, keeps, std::move(handler)));
     const auto callback = [](sd_event_source*, std::uint64_t, void* self) {
         return RunLoopSource::dispatch(self);
     };

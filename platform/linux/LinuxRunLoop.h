@@ -8,6 +8,7 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <string_view>
 
 struct sd_event;
 struct sd_event_source;
@@ -21,6 +22,8 @@ class LinuxRunLoop;
 class RunLoopSource : private base::NotCopied {
   public:
     using Handler = std::function<void()>;
+    /// Whether the loop has a reason to run while the source is enabled.
+    enum class Keeps { loopRunning, nothing };
 
     ~RunLoopSource();
 
@@ -31,8 +34,6 @@ class RunLoopSource : private base::NotCopied {
 
   private:
     friend class LinuxRunLoop;
-    /// Whether the loop has a reason to run while the source is enabled.
-    enum class Keeps { loopRunning, nothing };
 
     RunLoopSource(LinuxRunLoop& loop, Keeps keeps, Handler handler);
     void countAs(bool enabled);
@@ -46,13 +47,18 @@ class RunLoopSource : private base::NotCopied {
 };
 
 /// MainRunLoop on sd-event. The sources that it is given count as sources of the loop while they
-/// are enabled, except for timers and urgent ones.
+/// are enabled, except for urgent ones, and timers that are not said to.
+///
+/// A handler that throws ends the loop, with a line that says what: it runs no more.
 class LinuxRunLoop final : public MainRunLoop {
   public:
     explicit LinuxRunLoop(SystemLog& log);
     ~LinuxRunLoop() override;
 
     [[nodiscard]] bool runOnce(Date deadline) override;
+
+    /// Whether it has ended because it could not go on, and not for want of sources.
+    [[nodiscard]] bool hasFailed() const { return hasFailed_; }
 
     /// Calls `handler` whenever `descriptor` is readable. Enabled from the start. The descriptor
     /// stays the caller's and must be open for as long as the source lives.
@@ -69,7 +75,9 @@ class LinuxRunLoop final : public MainRunLoop {
     [[nodiscard]] std::unique_ptr<RunLoopSource> addPending(RunLoopSource::Handler handler);
 
     /// A timer on the clock that setting the time does not move. Disabled at first.
-    [[nodiscard]] std::unique_ptr<RunLoopSource> addTimer(RunLoopSource::Handler handler);
+    [[nodiscard]] std::unique_ptr<RunLoopSource>
+    addTimer(RunLoopSource::Handler handler,
+             RunLoopSource::Keeps keeps = RunLoopSource::Keeps::nothing);
 
   private:
     friend class RunLoopSource;
@@ -77,9 +85,12 @@ class LinuxRunLoop final : public MainRunLoop {
     [[nodiscard]] std::unique_ptr<RunLoopSource>
     addDescriptor(int descriptor, RunLoopSource::Keeps keeps, RunLoopSource::Handler handler);
 
+    void fail(std::string_view reason);
+
     SystemLog& log_;
     sd_event* event_ = nullptr;
     int liveSources_ = 0;
+    bool hasFailed_ = false;
 };
 
 } // namespace platform

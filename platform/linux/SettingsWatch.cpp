@@ -27,10 +27,13 @@ constexpr std::size_t kBufferSize = 4096;
 /// As many as the system follows.
 constexpr int kMaxLinks = 40;
 
-/// Where a link leads; none when the path is no link.
-std::optional<std::string> targetOf(const std::string& path) {
+/// Where a link leads; none when the path is no link, or when that cannot be known, with `error`.
+std::optional<std::string> targetOf(const std::string& path, int& error) {
     std::array<char, PATH_MAX> target{};
     const ssize_t length = ::readlink(path.c_str(), target.data(), target.size());
+    // What is no link is refused as an argument.
+    const bool isKnown = length >= 0 || errno == EINVAL || errno == ENOENT || errno == ENOTDIR;
+    error = isKnown ? 0 : errno;
     return length < 0 ? std::nullopt
                       : std::optional(std::string(target.data(), static_cast<std::size_t>(length)));
 }
@@ -105,7 +108,13 @@ SettingsWatch::Watches SettingsWatch::addWatches() {
         added[watch].insert(name);
         directories_.insert_or_assign(watch, directory);
         const std::string path = base::concat(directory, '/', name);
-        if (const auto target = targetOf(path)) {
+        int error = 0;
+        const auto target = targetOf(path, error);
+        if (error != 0) {
+            sayThatItCannotWatch(path, error);
+            return added;
+        }
+        if (target) {
             ++links;
             directory = target->starts_with('/') ? "/" : directory;
             way = base::concat(*target, '/', way);

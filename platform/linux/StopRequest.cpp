@@ -1,5 +1,6 @@
 #include "platform/linux/StopRequest.h"
 
+#include <cerrno>
 #include <csignal>
 #include <poll.h>
 #include <sys/signalfd.h>
@@ -14,6 +15,7 @@ StopRequest::StopRequest() {
     ::pthread_sigmask(SIG_BLOCK, &signals, nullptr);
     signal_ = base::FileDescriptor(::signalfd(-1, &signals, SFD_CLOEXEC | SFD_NONBLOCK));
     if (!signal_.isOpen()) {
+        failure_ = errno;
         ::pthread_sigmask(SIG_UNBLOCK, &signals, nullptr);
     }
 }

@@ -22,8 +22,12 @@ class StopRequest : private base::NotCopied {
     /// what a wait is for, and never read from. -1, which poll passes over, when there is none.
     [[nodiscard]] int descriptor() const { return signal_.get(); }
 
+    /// Why there is no descriptor, an errno value; otherwise 0.
+    [[nodiscard]] int failure() const { return failure_; }
+
   private:
     base::FileDescriptor signal_;
+    int failure_ = 0;
 };
 
 } // namespace platform

@@ -156,9 +156,18 @@ void HelpedAlarmWaker::ask() {
     auto [mine, helpers] = makePair();
     problem_ = mine.isOpen() ? tell(helperSocket_, helpers.get()) : systemReason();
     if (problem_.empty()) {
+        awaitAnswer(std::move(mine));
+    }
+}
+
+void HelpedAlarmWaker::awaitAnswer(base::FileDescriptor answers) {
+    try {
+        answersSource_ = loop_.addReadable(answers.get(), [this] { answerArrived(); });
+        answers_ = std::move(answers);
         problem_ = kNoAnswer;
-        answers_ = std::move(mine);
-        answersSource_ = loop_.addReadable(answers_.get(), [this] { answerArrived(); });
+    } catch (const std::system_error& error) {
+        // The answer finds nobody: this process waits itself, as if there were no helper.
+        problem_ = error.code().message();
     }
 }
 

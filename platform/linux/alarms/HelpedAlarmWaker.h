@@ -45,6 +45,7 @@ class HelpedAlarmWaker final : public AlarmWaker {
 
   private:
     void ask();
+    void awaitAnswer(base::FileDescriptor answers);
     void dropQuestion();
     void answerArrived();
     void take(const wire::AlarmAnswer& answer);

@@ -8,6 +8,7 @@
 
 #include <gmock/gmock.h>
 
+#include <chrono>
 #include <cstring>
 #include <fcntl.h>
 #include <string>
@@ -101,6 +102,25 @@ TEST_F(EventSocketTest, EveryTruncationIsDroppedAndTheNextEventIsTaken) {
         EXPECT_EQ(log.texts().back(), "kstd: EventSocket: dropped malformed datagram, " +
                                           std::to_string(length) + " bytes.");
     }
+}
+
+TEST_F(EventSocketTest, RefusalOfTheSystemIsSaidOnceAndWaitedOut) {
+    int ends[2];
+    ASSERT_EQ(::pipe2(ends, O_CLOEXEC), 0);
+    const base::FileDescriptor writer(ends[1]);
+    ASSERT_EQ(::write(writer.get(), "x", 1), 1);
+    socket.reset();
+    // Readable, but no socket.
+    socket = std::make_unique<EventSocket>(base::FileDescriptor(ends[0]), loop, log,
+                                           [](const wire::EventDatagram&) {});
+    ASSERT_TRUE(loop.runOnce(kDistantFuture));
+    const auto refused = std::chrono::steady_clock::now();
+    // The end of the pause, and another attempt.
+    ASSERT_TRUE(loop.runOnce(kDistantFuture));
+    EXPECT_GE(std::chrono::steady_clock::now() - refused, std::chrono::milliseconds(900));
+    ASSERT_TRUE(loop.runOnce(kDistantFuture));
+    EXPECT_THAT(log.texts(), ElementsAre("kstd: EventSocket: cannot receive: Socket operation on "
+                                         "non-socket."));
 }
 
 TEST_F(EventSocketTest, DescriptorsSentAlongAreClosed) {

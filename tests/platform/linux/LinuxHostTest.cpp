@@ -18,7 +18,9 @@
 #include <fcntl.h>
 #include <filesystem>
 #include <memory>
+#include <new>
 #include <string>
+#include <sys/resource.h>
 #include <sys/socket.h>
 #include <vector>
 
@@ -313,6 +315,48 @@ TEST_F(LinuxHostTest, HostWithoutAnEventSocketSaysSo) {
     EXPECT_THAT(
         standardError.text(),
         HasSubstr("kstd: EventSocket: no socket was handed over; no events will arrive.\n"));
+}
+
+TEST_F(LinuxHostTest, ProgramsOwnStatusIsTheProcesss) {
+    start();
+    EXPECT_EQ(host->run([](const Host&) { return 7; }), 7);
+}
+
+TEST_F(LinuxHostTest, ProgramThatCannotGoOnEndsWithALineAndAStatus) {
+    start();
+    support::StandardErrorCapture shown;
+    EXPECT_EQ(host->run([](const Host&) -> int { throw std::bad_alloc(); }), EXIT_FAILURE);
+    EXPECT_EQ(shown.text(), "kstd: cannot go on: std::bad_alloc.\n");
+}
+
+TEST_F(LinuxHostTest, LoopThatCannotGoOnIsAFailureWhateverTheProgramSays) {
+    start();
+    interfaces().events.setHandler("com.zerva.notifyd.matching",
+                                   [](const Event&) { throw std::bad_alloc(); });
+    send("com.zerva.notifyd.matching", "any");
+    support::StandardErrorCapture shown;
+    const auto program = [](const Host& interfaces) {
+        while (interfaces.runLoop.runOnce(kDistantFuture)) {
+        }
+        return EXIT_SUCCESS;
+    };
+    EXPECT_EQ(host->run(program), EXIT_FAILURE);
+    EXPECT_EQ(shown.text(), "kstd: MainRunLoop: cannot run: std::bad_alloc.\n");
+}
+
+TEST_F(LinuxHostTest, HostWhoseStopRequestHasNoDescriptorSaysSo) {
+    rlimit before{};
+    ASSERT_EQ(::getrlimit(RLIMIT_NOFILE, &before), 0);
+    const rlimit none{0, before.rlim_max};
+    ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &none), 0);
+    const StopRequest request;
+    ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &before), 0);
+    stop = &request;
+    support::StandardErrorCapture shown;
+    start();
+    EXPECT_EQ(shown.text(), "kstd: StopRequest: SIGTERM ends the daemon wherever it is: Too many "
+                            "open files.\n");
+    host.reset();
 }
 
 TEST_F(LinuxHostTest, HandlersAreDestroyedWhileTheInterfacesAreStillThere) {

@@ -6,10 +6,12 @@
 
 #include <gtest/gtest.h>
 
+#include <cerrno>
 #include <cstdint>
 #include <memory>
 #include <string>
 #include <sys/eventfd.h>
+#include <system_error>
 #include <unistd.h>
 
 namespace platform {
@@ -101,6 +103,30 @@ TEST_F(LinuxRunLoopTest, EnablingTwiceCountsOnce) {
     source->setEnabled(true);
     source->setEnabled(false);
     EXPECT_FALSE(loop.runOnce({0}));
+}
+
+TEST_F(LinuxRunLoopTest, HandlerThatThrowsEndsTheLoopWithALine) {
+    bool throws = true;
+    const auto source = loop.addReadable(signal.descriptor(), [&throws] {
+        if (throws) {
+            throw std::system_error(ENOSPC, std::generic_category(), "another source");
+        }
+    });
+    signal.signal();
+    EXPECT_FALSE(loop.hasFailed());
+    EXPECT_FALSE(loop.runOnce({0}));
+    EXPECT_TRUE(loop.hasFailed());
+    throws = false;
+    EXPECT_FALSE(loop.runOnce({0}));
+    EXPECT_EQ(log.texts(), (std::vector<std::string>{"kstd: MainRunLoop: cannot run: another "
+                                                     "source: No space left on device."}));
+}
+
+TEST_F(LinuxRunLoopTest, TimerMayBeAReasonToRun) {
+    const auto timer = loop.addTimer([] {}, RunLoopSource::Keeps::loopRunning);
+    EXPECT_FALSE(loop.runOnce({0}));
+    timer->fireAfter(std::chrono::microseconds(1));
+    EXPECT_TRUE(loop.runOnce(kDistantFuture));
 }
 
 TEST_F(LinuxRunLoopTest, SourceMayBeDestroyedInItsOwnHandler) {

@@ -59,6 +59,7 @@ TEST_F(StopRequestTest, WithoutADescriptorTheSignalEndsTheProcessAsEver) {
     const StopRequest stop;
     ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &before), 0);
     EXPECT_EQ(stop.descriptor(), -1);
+    EXPECT_EQ(stop.failure(), EMFILE);
     EXPECT_FALSE(stop.isMade());
     EXPECT_FALSE(TerminationSignal::isBlocked());
 }
