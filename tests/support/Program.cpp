@@ -27,7 +27,8 @@ struct Pipe {
     int ends[2] = {-1, -1};
 };
 
-[[noreturn]] void become(const std::vector<std::string>& arguments, int input, int output) {
+[[noreturn]] void become(const std::vector<std::string>& arguments, int input, int output,
+                         const std::function<void()>& prepare) {
     ::prctl(PR_SET_PDEATHSIG, SIGKILL);
     if (input >= 0) {
         ::dup2(input, STDIN_FILENO);
@@ -39,6 +40,9 @@ struct Pipe {
         words.push_back(const_cast<char*>(argument.c_str()));
     }
     words.push_back(nullptr);
+    if (prepare) {
+        prepare();
+    }
     ::execv(words[0], words.data());
     ::_exit(127);
 }
@@ -50,7 +54,8 @@ int millisecondsUntil(Clock::time_point deadline) {
 
 } // namespace
 
-Program::Program(const std::vector<std::string>& arguments, Input input) {
+Program::Program(const std::vector<std::string>& arguments, Input input,
+                 const std::function<void()>& prepare) {
     const Pipe output;
     int theirInput = -1;
     if (input == Input::pipe) {
@@ -60,7 +65,7 @@ Program::Program(const std::vector<std::string>& arguments, Input input) {
     }
     pid_ = ::fork();
     if (pid_ == 0) {
-        become(arguments, theirInput, output.ends[1]);
+        become(arguments, theirInput, output.ends[1], prepare);
     }
     ::close(output.ends[1]);
     output_ = output.ends[0];

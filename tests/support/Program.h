@@ -3,6 +3,7 @@
 #include "base/NotCopied.h"
 
 #include <chrono>
+#include <functional>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -21,7 +22,9 @@ class Program : private base::NotCopied {
   public:
     enum class Input { ofTest, pipe };
 
-    explicit Program(const std::vector<std::string>& arguments, Input input = Input::ofTest);
+    /// `prepare` is run in the new process before it becomes the program.
+    explicit Program(const std::vector<std::string>& arguments, Input input = Input::ofTest,
+                     const std::function<void()>& prepare = {});
     ~Program();
 
     [[nodiscard]] pid_t pid() const { return pid_; }

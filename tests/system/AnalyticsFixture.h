@@ -25,6 +25,8 @@ struct UploadSettings {
 /// what it says about both.
 class AnalyticsFixture : public SystemFixture {
   protected:
+    using SystemFixture::SystemFixture;
+
     /// Starts a daemon in the place of the last one.
     void launch(const std::vector<std::string>& options = {});
 

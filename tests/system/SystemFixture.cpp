@@ -42,7 +42,8 @@ std::optional<Request> parseControl(const std::string& line) {
 
 } // namespace
 
-SystemFixture::SystemFixture() : sender_(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)) {
+SystemFixture::SystemFixture(const std::filesystem::path& parent)
+    : root(parent), sender_(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)) {
     for (const char* const directory : {"run/kstd", "etc/kstd", "var/root"}) {
         std::filesystem::create_directories(root.path() / directory);
     }

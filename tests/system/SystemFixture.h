@@ -7,6 +7,7 @@
 #include <gtest/gtest.h>
 
 #include <cstdint>
+#include <filesystem>
 #include <memory>
 #include <optional>
 #include <string>
@@ -33,7 +34,9 @@ struct Request {
 /// The real programs under a private root directory: the kernel side, the daemon, its supervisor.
 class SystemFixture : public testing::Test {
   protected:
-    SystemFixture();
+    SystemFixture() : SystemFixture(std::filesystem::temp_directory_path()) {}
+    /// With the root directory below `parent`.
+    explicit SystemFixture(const std::filesystem::path& parent);
 
     /// Starts the kernel side and connects to its control socket. It publishes nothing but what a
     /// test asks for, unless the options say otherwise.
