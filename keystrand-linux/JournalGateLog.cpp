@@ -1,59 +1,13 @@
 #include "keystrand-linux/JournalGateLog.h"
 
-#include "base/Concat.h"
-
-#include <cerrno>
-#include <sys/uio.h>
-#include <unistd.h>
-
-// Where in this file the line was written tells nobody anything.
-#define SD_JOURNAL_SUPPRESS_LOCATION
-#include <systemd/sd-journal.h>
-
 namespace keystrand::usb {
 
-namespace {
-
-bool sendToJournal(const GateLineClass& about, const std::string& text) {
-    const std::string fields[] = {
-        base::concat("MESSAGE=", text), base::concat("MESSAGE_ID=", about.messageId),
-        base::concat("PRIORITY=", static_cast<int>(about.level)), "SYSLOG_IDENTIFIER=keystrand"};
-    iovec parts[std::size(fields)];
-    for (std::size_t i = 0; i < std::size(fields); ++i) {
-        // The library only reads from it.
-        parts[i] = {const_cast<char*>(fields[i].data()), fields[i].size()};
-    }
-    return ::sd_journal_sendv(parts, std::size(parts)) >= 0;
-}
-
-/// One line in one write where the system takes it whole. What cannot be written is lost.
-void writeToStandardError(std::string line) {
-    line += '\n';
-    std::string_view rest = line;
-    while (!rest.empty()) {
-        const ssize_t written = ::write(STDERR_FILENO, rest.data(), rest.size());
-        if (written < 0 && errno == EINTR) {
-            continue;
-        }
-        if (written <= 0) {
-            return;
-        }
-        rest.remove_prefix(static_cast<std::size_t>(written));
-    }
-}
-
-} // namespace
-
-JournalGateLog::Target JournalGateLog::targetFor(const std::string& root,
-                                                 const char* journalSocket) {
-    return root == "/" && ::access(journalSocket, F_OK) == 0 ? Target::journal
-                                                             : Target::standardError;
-}
-
 void JournalGateLog::write(GateLine about, const std::string& text) {
-    if (target_ != Target::journal || !sendToJournal(classOf(about), text)) {
-        writeToStandardError(text);
-    }
+    const GateLineClass& is = classOf(about);
+    writeLine(target_, {.program = "keystrand",
+                        .messageId = is.messageId,
+                        .level = static_cast<int>(is.level),
+                        .text = text});
 }
 
 } // namespace keystrand::usb

@@ -189,8 +189,21 @@ KeystrandService::KeystrandService(const std::string& root, GateLog& log,
       dateWatch_(*loop_, [this] { keystrand_.clockWasSet(); }),
       terminate_(loop_->signal(SIGTERM, [this] { stop(); })),
       interrupt_(loop_->signal(SIGINT, [this] { stop(); })) {
-    // The init system's watchdog, if it set one.
-    sd_event_set_watchdog(loop_->handle(), 1);
+    watchWork(*loop_);
+}
+
+void KeystrandService::watchWork(EventLoop& loop) {
+    std::uint64_t microseconds = 0;
+    if (sd_watchdog_enabled(0, &microseconds) <= 0) {
+        return;
+    }
+    loop.setTurns({.work = [start = base::concat(
+                                "WATCHDOG=1\nWATCHDOG_USEC=",
+                                std::to_string(microseconds))] { sd_notify(0, start.c_str()); },
+                   .rest =
+                       [stop = base::concat("WATCHDOG_USEC=", std::to_string(UINT64_MAX))] {
+                           sd_notify(0, stop.c_str());
+                       }});
 }
 
 bool KeystrandService::run() {

@@ -30,6 +30,10 @@ class KeystrandService {
     /// Serves until SIGTERM or SIGINT. A closed gate stays closed. False when the loop failed.
     [[nodiscard]] bool run();
 
+    /// Has the init system's watchdog, if it set one, watch the loop while that works, and not
+    /// while it waits: nothing hangs then, and nothing has to wake up only to say so.
+    static void watchWork(EventLoop& loop);
+
     /// Puts back what a service that is not there any more has written, and lets in what it
     /// refused. False, with lines that say why, when something could not be put back.
     [[nodiscard]] static bool restore(const std::string& root, GateLog& log);

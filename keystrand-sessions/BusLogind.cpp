@@ -145,7 +145,7 @@ bool readProperties(sd_bus_message* message, Session& session) {
 
 } // namespace
 
-BusLogind::BusLogind(EventLoop& loop, Timers& timers, Places places, Log log)
+BusLogind::BusLogind(EventLoop& loop, Timers& timers, Places places, SessionsLog log)
     : loop_(loop),
       places_(std::move(places)),
       log_(std::move(log)),
@@ -173,8 +173,9 @@ void BusLogind::tryAgain() {
         disconnect();
         if (const std::string trouble = textOf(result); trouble != busTrouble_) {
             busTrouble_ = trouble;
-            log_(base::concat(
-                "the message bus cannot be reached, and is tried again and again: ", trouble, "."));
+            log_(SessionsLine::noBus,
+                 base::concat("the message bus cannot be reached, and is tried again and again: ",
+                              trouble, "."));
         }
         backoff_->startFor(kBackoff);
     }
@@ -516,7 +517,8 @@ void BusLogind::readDelay(sd_bus_message* reply) {
     if (isError(reply)) {
         if (const std::string trouble = errorText(reply); trouble != delayTrouble_) {
             delayTrouble_ = trouble;
-            log_(base::concat("sleep cannot be delayed until USB is closed: ", trouble));
+            log_(SessionsLine::noDelay,
+                 base::concat("sleep cannot be delayed until USB is closed: ", trouble));
         }
     } else if (wantsDelay_ && sd_bus_message_read(reply, "h", &fd) > 0) {
         delayTrouble_.clear();

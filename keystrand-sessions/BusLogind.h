@@ -2,6 +2,7 @@
 
 #include "base/FileDescriptor.h"
 #include "keystrand-sessions/Logind.h"
+#include "keystrand-sessions/SessionsLog.h"
 #include "keystrand/EventLoop.h"
 #include "keystrand/Timers.h"
 
@@ -34,11 +35,9 @@ class BusLogind : public Logind {
         /// The directory of the sessions' files.
         std::string sessions;
     };
-    /// Takes a line for the log, without the name of the program.
-    using Log = std::function<void(const std::string& line)>;
 
     /// The loop and the timers outlive it.
-    BusLogind(EventLoop& loop, Timers& timers, Places places, Log log);
+    BusLogind(EventLoop& loop, Timers& timers, Places places, SessionsLog log);
     ~BusLogind() override;
 
     void start(LogindListener& listener) override;
@@ -85,7 +84,7 @@ class BusLogind : public Logind {
 
     EventLoop& loop_;
     Places places_;
-    Log log_;
+    SessionsLog log_;
     LogindListener* listener_ = nullptr;
     sd_bus* bus_ = nullptr;
     std::unique_ptr<Timer> backoff_;

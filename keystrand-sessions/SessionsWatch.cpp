@@ -6,17 +6,20 @@
 
 namespace keystrand::sessions {
 
-SessionsWatch::SessionsWatch(Logind& logind, KeystrandLink& keystrand, Timers& timers, Log log)
+SessionsWatch::SessionsWatch(Logind& logind, KeystrandLink& keystrand, Timers& timers,
+                             SessionsLog log)
     : logind_(logind),
       keystrand_(keystrand),
       log_(std::move(log)),
       logindPatience_(timers.timer([this] {
-          log_("logind was away for a minute; the machine counts as locked.");
+          log_(SessionsLine::logindAway,
+               "logind was away for a minute; the machine counts as locked.");
           model_.logindWasAwayTooLong();
           stateIsKnown();
       })),
       answerPatience_(timers.timer([this] {
-          log_("keystrand does not answer; the machine goes to sleep without it.");
+          log_(SessionsLine::asleepUntold,
+               "keystrand does not answer; the machine goes to sleep without it.");
           letSleep();
       })) {}
 
@@ -37,7 +40,7 @@ void SessionsWatch::isThere(const LogindProcess& process, const std::vector<Sess
     stateIsKnown();
     prepareForSleep(isPreparingForSleep);
     if (std::exchange(isLogindAway_, false)) {
-        log_("logind is back.");
+        log_(SessionsLine::logindBack, "logind is back.");
     }
 }
 
@@ -52,9 +55,11 @@ void SessionsWatch::stateIsKnown() {
 void SessionsWatch::isAway() {
     isLogindAway_ = true;
     logindPatience_->startFor(kPatienceWithLogind);
-    log_(base::concat(
-        "logind is away; the machine stays ",
-        model_.isLocked() ? "locked" : "unlocked until it is back, for a minute at the most", "."));
+    log_(SessionsLine::logindAway,
+         base::concat("logind is away; the machine stays ",
+                      model_.isLocked() ? "locked"
+                                        : "unlocked until it is back, for a minute at the most",
+                      "."));
 }
 
 void SessionsWatch::sessionIs(const Session& session) {
@@ -75,7 +80,8 @@ void SessionsWatch::prepareForSleep(bool isAboutTo) {
 
 void SessionsWatch::goToSleep() {
     if (!keystrand_.isConnected()) {
-        log_("the machine goes to sleep, and keystrand is not there to be told.");
+        log_(SessionsLine::asleepUntold,
+             "the machine goes to sleep, and keystrand is not there to be told.");
         letSleep();
         return;
     }

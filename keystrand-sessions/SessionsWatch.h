@@ -2,6 +2,7 @@
 
 #include "keystrand-sessions/KeystrandLink.h"
 #include "keystrand-sessions/Logind.h"
+#include "keystrand-sessions/SessionsLog.h"
 #include "keystrand-sessions/SessionsModel.h"
 #include "keystrand/Timers.h"
 
@@ -28,11 +29,8 @@ class SessionsWatch : private LogindListener {
     /// Less than the five seconds after which logind goes on by itself.
     static constexpr std::chrono::seconds kPatienceWithKeystrand{4};
 
-    /// Takes a line for the log, without the name of the program.
-    using Log = std::function<void(const std::string& line)>;
-
     /// All that it is given outlives it.
-    SessionsWatch(Logind& logind, KeystrandLink& keystrand, Timers& timers, Log log);
+    SessionsWatch(Logind& logind, KeystrandLink& keystrand, Timers& timers, SessionsLog log);
 
     /// Once.
     void start();
@@ -55,7 +53,7 @@ class SessionsWatch : private LogindListener {
 
     Logind& logind_;
     KeystrandLink& keystrand_;
-    Log log_;
+    SessionsLog log_;
     SessionsModel model_;
     /// Whether logind was there since the start, or its minute is over.
     bool isStateKnown_ = false;

@@ -5,6 +5,7 @@
 #include "keystrand-sessions/KeystrandLink.h"
 #include "keystrand-sessions/SessionsWatch.h"
 #include "keystrand/EventLoop.h"
+#include "keystrand/JournalLines.h"
 #include "keystrand/Timers.h"
 
 #include <csignal>
@@ -22,25 +23,29 @@ constexpr char kHelp[] =
     "  --root DIR  the directory under which the sockets and logind's files are\n"
     "  --help      print this and exit\n";
 
-void writeLine(const std::string& line) {
-    static_cast<void>(std::fprintf(stderr, "keystrand-sessions: %s\n", line.c_str()));
-}
-
 int listen(const std::string& root) {
     using namespace keystrand;
     const auto loop = EventLoop::create();
     if (!loop) {
-        writeLine("there is no room to run.");
+        std::fputs("keystrand-sessions: there is no room to run.\n", stderr);
         return 1;
     }
+    const LineTarget target = lineTargetFor(root.empty() ? "/" : root);
+    const auto writeTo = [target](sessions::SessionsLine about, const std::string& text) {
+        const sessions::SessionsLineClass& is = sessions::classOf(about);
+        writeLine(target, {.program = "keystrand-sessions",
+                           .messageId = is.messageId,
+                           .level = is.level,
+                           .text = base::concat("keystrand-sessions: ", text)});
+    };
     LoopTimers timers(*loop);
     sessions::BusLogind logind(*loop, timers,
                                {base::concat(root, "/run/dbus/system_bus_socket"),
                                 base::concat(root, "/run/systemd/sessions")},
-                               writeLine);
+                               writeTo);
     sessions::SocketLink keystrand(*loop, timers,
                                    base::concat(root, "/run/keystrand/sessions.sock"));
-    sessions::SessionsWatch watch(logind, keystrand, timers, writeLine);
+    sessions::SessionsWatch watch(logind, keystrand, timers, writeTo);
     const EventSource termination = loop->signal(SIGTERM, [&loop] { loop->stop(); });
     const EventSource interruption = loop->signal(SIGINT, [&loop] { loop->stop(); });
     watch.start();

@@ -96,7 +96,27 @@ EventSource EventLoop::signal(int number, Handler handler) {
 }
 
 bool EventLoop::run() {
-    return sd_event_loop(event_.get()) >= 0;
+    if (!turns_.work) {
+        return sd_event_loop(event_.get()) >= 0;
+    }
+    while (sd_event_get_state(event_.get()) != SD_EVENT_FINISHED) {
+        int ready = wait(0);
+        if (ready == 0) {
+            turns_.rest();
+            ready = wait(UINT64_MAX);
+            turns_.work();
+        }
+        if (ready < 0 || (ready > 0 && sd_event_dispatch(event_.get()) < 0)) {
+            return false;
+        }
+    }
+    return true;
+}
+
+/// Positive when something is to be dispatched.
+int EventLoop::wait(std::uint64_t microseconds) {
+    const int ready = sd_event_prepare(event_.get());
+    return ready == 0 ? sd_event_wait(event_.get(), microseconds) : ready;
 }
 
 void EventLoop::stop() {

@@ -7,6 +7,7 @@
 #include <ctime>
 #include <functional>
 #include <memory>
+#include <utility>
 
 namespace keystrand {
 
@@ -53,6 +54,15 @@ class EventLoop {
     /// Blocks the signal for the process and has the handler called for it.
     [[nodiscard]] EventSource signal(int number, Handler handler);
 
+    struct Turns {
+        /// Something has come, and its handlers are called next.
+        Handler work;
+        /// All is done; whatever comes next is waited for.
+        Handler rest;
+    };
+    /// To be told of the turns of `run`. Before it runs.
+    void setTurns(Turns turns) { turns_ = std::move(turns); }
+
     /// Runs until `stop`. False when the loop itself failed.
     [[nodiscard]] bool run();
     void stop();
@@ -65,8 +75,10 @@ class EventLoop {
         void operator()(sd_event* event) const { sd_event_unref(event); }
     };
     explicit EventLoop(sd_event* event) : event_(event) {}
+    [[nodiscard]] int wait(std::uint64_t microseconds);
 
     std::unique_ptr<sd_event, Release> event_;
+    Turns turns_;
 };
 
 } // namespace keystrand

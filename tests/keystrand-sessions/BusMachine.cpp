@@ -151,7 +151,7 @@ BusMachine::BusMachine(At bus) {
     }
     logind_ = std::make_unique<BusLogind>(
         *loop_, timers, BusLogind::Places{directory_.file("bus"), directory_.file("sessions")},
-        [this](const std::string& line) { lines_.push_back(line); });
+        [this](SessionsLine, const std::string& line) { lines_.push_back(line); });
 }
 
 BusMachine::~BusMachine() {

@@ -6,6 +6,7 @@
 
 #include <gtest/gtest.h>
 
+#include <set>
 #include <string>
 #include <utility>
 #include <vector>
@@ -79,7 +80,7 @@ class SessionsWatchTest : public testing::Test {
     FakeLink link_;
     FakeTimers timers_;
     Lines lines_;
-    SessionsWatch watch_{logind_, link_, timers_, [this](const std::string& line) {
+    SessionsWatch watch_{logind_, link_, timers_, [this](SessionsLine, const std::string& line) {
                              lines_.push_back(line);
                          }};
 };
@@ -253,6 +254,17 @@ TEST_F(SessionsWatchTest, LogindThatIsFoundOnTheWayToSleepIsToldOf) {
     logind_.startLogind(1000);
     logind_.happen();
     EXPECT_EQ(link_.said(), (Words{Word::locked, Word::awake})) << "the new one knows of no sleep";
+}
+
+TEST(SessionsLineClasses, EachClassIsInItsPlaceWithAnIdentifierOfItsOwn) {
+    std::set<std::string_view> identifiers;
+    for (std::size_t i = 0; i < kSessionsLineClasses.size(); ++i) {
+        EXPECT_EQ(static_cast<std::size_t>(kSessionsLineClasses[i].about), i);
+        EXPECT_EQ(kSessionsLineClasses[i].messageId.size(), 32U);
+        identifiers.insert(kSessionsLineClasses[i].messageId);
+    }
+    EXPECT_EQ(identifiers.size(), kSessionsLineClasses.size());
+    EXPECT_EQ(static_cast<std::size_t>(SessionsLine::noBus) + 1, kSessionsLineClasses.size());
 }
 
 } // namespace
