@@ -129,6 +129,9 @@ void UsbGate::setClosed(bool closed) {
         } else {
             parts_.rearm();
         }
+    } else if (closed && !hasSettled_) {
+        // An earlier service has closed it; what came since is looked at like new.
+        settle();
     }
     watchAsNeeded();
 }
@@ -258,6 +261,7 @@ std::optional<BusView> UsbGate::lookAtBus(Look at) {
 }
 
 void UsbGate::settle() {
+    hasSettled_ = true;
     // A write may be told to be an event before it has returned.
     if (std::exchange(settling_, true)) {
         return;

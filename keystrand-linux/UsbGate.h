@@ -119,6 +119,7 @@ class UsbGate : private base::NotCopied {
     bool wantsClosed_ = false;
     bool watching_ = false;
     bool settling_ = false;
+    bool hasSettled_ = false;
 };
 
 /// "08/06/50", one after the other, at most fifty.

@@ -406,6 +406,21 @@ TEST_F(UsbGateTest, NothingIsWatchedWhileTheMachineIsUnlocked) {
     EXPECT_EQ(gate->nextLook(), std::nullopt);
 }
 
+TEST_F(UsbGateTest, WhatCameWithoutAServiceIsLookedAtByTheNextOne) {
+    gate->setClosed(true);
+    gate.reset();
+    bus.plug("1-1", aDisk());
+    bus.setAuthorized("1-1", true);
+    bus.plug("1-2", aDisk());
+    log.take();
+    start();
+    gate->setClosed(true);
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+    EXPECT_EQ(log.take(),
+              (Lines{R"(keystrand: refused 1-1 (1111:2222 "maker" "disk", classes 08/06/50))",
+                     R"(keystrand: refused 1-2 (1111:2222 "maker" "disk", classes 08/06/50))"}));
+}
+
 TEST_F(UsbGateTest, WhatAnEarlierServiceBeganToOpenIsOpened) {
     gate->setClosed(true);
     bus.plug("1-1", aDisk());
