@@ -58,9 +58,9 @@ class Lines:
 class Machine:
     """One start of a machine, from power on to power off. What outlives it is its disk.
 
-    With a root_port, the disk is a USB disk in that port. Its clock says our time, and some hours more; it counts
-    the instructions that the machine executes, and goes on while that has nothing to do. So no time inside
-    depends on how busy we are.
+    With a root_port, the disk is a USB disk in that port. When it starts its clock says our time, and some hours
+    more. From then on it counts the instructions that are executed, and goes on while there are none, so no time
+    inside depends on how busy we are; but for that of its sleep, which is ours.
     """
 
     def __init__(self, base, disk, console, *, root_port=None, sleeps=False, words="", hours_later=0):
@@ -89,7 +89,7 @@ class Machine:
                  for word in ("-device", f"pcie-root-port,id=slot{number},chassis={number + 1},slot={number + 1}")]
         return ["qemu-system-x86_64", "-nodefaults", "-no-user-config", "-no-reboot", "-S",
                 "-machine", "q35,sata=off,smbus=off,i8042=off", "-accel", "tcg,tb-size=128", "-m", "384",
-                "-icount", "shift=1", "-rtc", f"base={self.date.isoformat(timespec='seconds')},clock=vm",
+                "-icount", "shift=1", "-rtc", f"base={self.date.isoformat(timespec='seconds')},clock=host",
                 "-display", "none", "-vga", "none", "-serial", f"file:{self.console}",
                 "-chardev", f"socket,id=qmp,fd={far[0]}", "-mon", "chardev=qmp,mode=control",
                 "-kernel", f"{base}/{kernel}", "-initrd", f"{base}/initrd",
