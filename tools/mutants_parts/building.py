@@ -52,15 +52,15 @@ def room_of(path):
 def analyse(task):
     root, path, arguments = task
     os.chdir(root)
-    return path, [(point.start, point.end, point.form, [tuple(change) for change in point.changes])
-                  for point in source.points_of(path, arguments)]
+    return [(point.start, point.end, point.form, [tuple(change) for change in point.changes])
+            for point in source.points_of(path, arguments)]
 
 
 class Build:
     """`root` is the tree, `directory` what this tool may write in."""
 
-    def __init__(self, root, directory):
-        self.root, self.directory = root, directory
+    def __init__(self, root, directory, jobs=2):
+        self.root, self.directory, self.jobs = root, directory, jobs
         self.tree = os.path.join(directory, "tree")
         self.binary = os.path.join(directory, "build")
         self.state_file = os.path.join(directory, "numbers.json")
@@ -113,15 +113,29 @@ class Build:
         kept_file = os.path.join(self.directory, "points.json")
         kept = json.loads(read(kept_file)) if os.path.exists(kept_file) else {}
         program = read(os.path.join(HERE, "source.py"))
-        hashes = {path: hashlib.sha256(program + read(os.path.join(self.root, path))).hexdigest() for path in paths}
-        points = {path: kept[path][1] for path in paths if path in kept and kept[path][0] == hashes[path]}
+        points, tasks = {}, {}
         arguments, definitions = self.arguments(), self.definitions()
-        tasks = [(self.root, path, arguments + definitions.get(path, [])) for path in paths if path not in points]
-        with concurrent.futures.ProcessPoolExecutor(2) as pool:
-            points.update(pool.map(analyse, tasks))
-        write_if_different(kept_file, json.dumps({path: (hashes[path], points[path]) for path in paths}).encode())
+        with concurrent.futures.ProcessPoolExecutor(self.jobs) as pool:
+            for path in paths:
+                stamp = hashlib.sha256(program + self.texts[path]).hexdigest()
+                if path in kept and kept[path][0] == stamp:
+                    points[path] = kept[path]
+                else:
+                    task = (self.root, path, arguments + definitions.get(path, []))
+                    tasks[pool.submit(analyse, task)] = path, stamp
+            try:
+                for task in concurrent.futures.as_completed(tasks):
+                    path, stamp = tasks[task]
+                    points[path] = stamp, task.result()
+            finally:
+                # What is known is kept, even when another source does not compile.
+                pool.shutdown(cancel_futures=True)
+                write_if_different(kept_file, json.dumps({**kept, **points}).encode())
+        for path in paths:
+            if read(os.path.join(self.root, path)) != self.texts[path]:
+                raise SystemExit(f"mutants: {path} has changed meanwhile; once more, please")
         return {path: [source.Point(start, end, form, shared(changes)) for start, end, form, changes in each]
-                for path, each in points.items()}
+                for path, (_, each) in points.items()}
 
     def numbers(self, path):
         """Of every mutant of the source that can be compiled."""
@@ -163,9 +177,10 @@ class Build:
 
     def rewrite(self):
         """Knows all mutants, as the build has them."""
-        for path, points in self.find_points(self.sources(self.files_of_tree())).items():
-            text = read(os.path.join(self.root, path)).decode("latin-1")
-            self.rewritings[path] = Rewriting(path, text, points)
+        paths = self.sources(self.files_of_tree())
+        self.texts = {path: read(os.path.join(self.root, path)) for path in paths}
+        for path, points in self.find_points(paths).items():
+            self.rewritings[path] = Rewriting(path, self.texts[path].decode("latin-1"), points)
 
     def write(self, path):
         text = self.rewritings[path].write(self.numbers(path))
@@ -219,7 +234,7 @@ class Build:
         arguments = [each for each in self.arguments() if each != "-w"]
         command = ["clang++", *arguments[:2], f"-I{self.tree}", *arguments[3:-2], "-w", "-Wno-c++11-narrowing",
                    "-ferror-limit=0", "-include", os.path.join(HERE, "Mutants.h"), "-fsyntax-only"]
-        with concurrent.futures.ThreadPoolExecutor(2) as pool:
+        with concurrent.futures.ThreadPoolExecutor(self.jobs) as pool:
             def complaints(path):
                 return subprocess.run(command + [os.path.join(self.tree, path)], stderr=subprocess.PIPE,
                                       text=True).stderr
@@ -231,9 +246,9 @@ class Build:
         self.state["headers"] = written()
         self.save()
 
-    def compile(self, targets, jobs=2):
+    def compile(self, targets):
         while True:
-            done = subprocess.run(["ninja", "-C", self.binary, "-k", "0", f"-j{jobs}", "--quiet", *targets],
+            done = subprocess.run(["ninja", "-C", self.binary, "-k", "0", f"-j{self.jobs}", "--quiet", *targets],
                                   stdout=subprocess.PIPE, stderr=subprocess.STDOUT, text=True)
             if done.returncode == 0:
                 return
@@ -243,7 +258,7 @@ class Build:
                 sys.stderr.write(done.stdout[-6000:])
                 raise SystemExit("mutants: the copy does not compile")
 
-    def make(self, targets, jobs=2):
+    def make(self, targets):
         self.copy()
         self.configure()
         self.rewrite()
@@ -251,7 +266,7 @@ class Build:
             self.write(path)
         self.check_headers()
         self.save()
-        self.compile(targets, jobs)
+        self.compile(targets)
         self.save()
 
 

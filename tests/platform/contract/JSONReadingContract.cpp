@@ -258,6 +258,9 @@ TEST_P(JSONContract, DepthIsCountedForWhatIsOpen) {
     const std::string list = nested(kMaxJSONDepth - 1, "[", "]");
     EXPECT_TRUE(read(base::concat("[", list, ",", list, "]")));
     EXPECT_FALSE(read(base::concat("[", list, ",[", list, "]]")));
+    const std::string map = nested(kMaxJSONDepth - 1, "{\"a\":", "}", "null");
+    EXPECT_TRUE(read(base::concat("[", map, ",", map, "]")));
+    EXPECT_FALSE(read(base::concat("[", map, ",[", map, "]]")));
 }
 
 TEST_P(JSONContract, Size) {
