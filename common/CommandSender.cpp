@@ -63,8 +63,9 @@ KSTStatus sendNumbers(const CommandSender& sender, std::uint32_t code, KSTContex
         return fail(sender.context, "inputBuffer", 0, kKSTErrorOutOfMemory);
     }
     base::ByteWriter writer(inputBuffer.bytes(), inputBuffer.size());
-    static_cast<void>(writeHandle(writer, handleOf(context)) && writer.writeU32(first) &&
-                      writer.writeU32(second));
+    static_cast<void>(writeHandle(writer, handleOf(context)));
+    static_cast<void>(writer.writeU32(first));
+    static_cast<void>(writer.writeU32(second));
     return sender.send(code, inputBuffer.bytes(), inputBuffer.size(), outData, outSize);
 }
 
@@ -82,7 +83,7 @@ KSTStatus readAnswer(const AssertionContext& context, const AllocatedMemory& req
         return fail(context, "reqBufferSize >= sizeof(uint32_t)", 0, kKSTErrorUnexpected);
     }
     KSTRequirement* requirement = nullptr;
-    if (wanted && !(satisfied != 0 && reader.left() == 0)) {
+    if (wanted && (satisfied == 0 || reader.left() > 0)) {
         std::size_t consumed = 0;
         const KSTStatus err =
             DeserializeRequirement(reader.rest().data(), reader.left(), &requirement, &consumed);

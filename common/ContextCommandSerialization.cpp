@@ -112,8 +112,9 @@ KSTStatus DeserializeAddCredential(const void* buffer, std::size_t size, KSTHand
     if (err != kKSTErrorSuccess) {
         return kst::failCall(context, err);
     }
+    static_cast<void>(reader.skip(consumed));
     KSTScope scope = 0;
-    if (!reader.skip(consumed) || !reader.readU32(scope)) {
+    if (!reader.readU32(scope)) {
         DeallocCredential(credential);
         return kst::fail(context, "size - offset >= sizeof(KSTScope)", 0, kKSTErrorBadParameter);
     }

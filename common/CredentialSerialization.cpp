@@ -35,7 +35,9 @@ KSTStatus checkHeader(const void* buffer, std::size_t size, std::uint32_t& dataL
     const kst::AssertionContext context = kst::serializationContext();
     base::ByteReader reader(buffer, size);
     std::uint32_t number = 0;
-    if (size < sizeof(KSTCredential) || !reader.readU32(number) ||
+    // The length is the header's last field: whoever has that has the whole header.
+    static_assert(offsetof(KSTCredential, dataLength) + sizeof dataLength == sizeof(KSTCredential));
+    if (!reader.readU32(number) ||
         !reader.skip(offsetof(KSTCredential, dataLength) - sizeof number) ||
         !reader.readU32(dataLength)) {
         return kst::fail(context, "size >= sizeof(KSTCredential)", 0, kKSTErrorBadParameter);

@@ -139,14 +139,10 @@ KSTStatus checkWriter(const KSTParameter* parameters, std::uint32_t parametersCo
                                                                });
 }
 
-KSTStatus checkParameters(const KSTParameter* parameters, std::uint32_t parametersCount) noexcept {
+KSTStatus checkParameterData(const KSTParameter* parameters,
+                             std::uint32_t parametersCount) noexcept {
     for (std::uint32_t i = 0; i < parametersCount; ++i) {
-        const KSTParameter& param = parameters[i];
-        const KSTStatus err = ValidateParameter(&param);
-        if (err != kKSTErrorSuccess) {
-            return failCall(serializationContext(), err);
-        }
-        if (param.parameterData == nullptr && param.parameterDataLength != 0) {
+        if (parameters[i].parameterData == nullptr) {
             return fail(serializationContext(),
                         "param->parameterData || !param->parameterDataLength", 0,
                         kKSTErrorBadParameter);
@@ -205,9 +201,8 @@ KSTStatus ReceivedParameters::readElement(base::ByteReader& reader,
         return fail(context, "(size - offset) >= sizeof(KSTParameterType) + sizeof(uint32_t)", 0,
                     kKSTErrorBadParameter);
     }
-    if (!reader.readU32(param.type) || !reader.readU32(param.parameterDataLength)) {
-        return fail(context, kWordCheck, 0, kKSTErrorBadParameter);
-    }
+    static_cast<void>(reader.readU32(param.type));
+    static_cast<void>(reader.readU32(param.parameterDataLength));
     if (reader.left() < param.parameterDataLength) {
         return fail(context, "(size - offset) >= params[i].parameterDataLength", 0,
                     kKSTErrorBadParameter);

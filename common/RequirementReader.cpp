@@ -30,8 +30,8 @@ KSTStatus readCompositeSizes(Bytes bytes, const wire::CompositeLayout& layout,
     const kst::AssertionContext context = kst::serializationContext();
     base::ByteReader reader(bytes);
     std::uint32_t count = 0;
-    if (bytes.size() < layout.childrenOffset || !reader.skip(layout.countOffset) ||
-        !reader.readU32(count) || wire::compositeSize(layout, count) > bytes.size()) {
+    if (!reader.skip(layout.countOffset) || !reader.readU32(count) ||
+        wire::compositeSize(layout, count) > bytes.size()) {
         return kst::fail(context, kFitsCheck, 0, kKSTErrorBadParameter);
     }
     announcement = {wire::compositeSize(layout, count), layout.childrenOffset, count};

@@ -1,5 +1,4 @@
 #include "KSTLib/Command.h"
-#include "KSTLib/CredentialSerialization.h"
 #include "keystrand/Commands.h"
 
 #include <iterator>
@@ -48,13 +47,9 @@ CommandResult getExternalForm(KernelState& kernel, Payload payload) {
 }
 
 CommandResult getProperty(KernelState& kernel, Payload payload) {
-    KSTHandle handle{};
-    KSTContextProperty property = 0;
-    if (DeserializeGetContextProperty(payload.data(), payload.size(), &handle, &property) !=
-        kKSTErrorSuccess) {
-        return endedWith(kKernelBadPayload);
-    }
-    const Context* context = kernel.contexts.find(handle);
+    HandlePayload fields(payload);
+    const KSTContextProperty property = fields.number();
+    const Context* context = kernel.contexts.find(fields.handle);
     if (context == nullptr) {
         return endedWith(kKernelNoSuchContext);
     }

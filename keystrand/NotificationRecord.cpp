@@ -75,10 +75,9 @@ StateBytes encodeState(const TimerState& state) {
 TimerState decodeState(const StateBytes& bytes) {
     TimerState state;
     base::ByteReader reader(bytes);
-    [[maybe_unused]] const bool fits = reader.readU32(state.version) &&
-                                       reader.readU64(state.standardModeStart) &&
-                                       reader.readU8(state.lockedInRestrictedMode);
-    assert(fits);
+    static_cast<void>(reader.readU32(state.version));
+    static_cast<void>(reader.readU64(state.standardModeStart));
+    static_cast<void>(reader.readU8(state.lockedInRestrictedMode));
     return state;
 }
 
@@ -105,11 +104,13 @@ std::optional<AnalyticsFigures> decodeFigures(const AnalyticsBytes& bytes) {
     std::uint32_t version = 0;
     std::uint32_t reserved = 0;
     base::ByteReader reader(bytes);
-    const bool fits =
-        reader.readU64(figures.periodStart) && reader.readU32(figures.restrictedInPeriod) &&
-        reader.readU32(figures.totalRestricted) && reader.readU64(figures.restrictedSince) &&
-        reader.readU32(version) && reader.readU32(reserved);
-    if (!fits || version != kBlobVersion || reserved != kReserved) {
+    static_cast<void>(reader.readU64(figures.periodStart));
+    static_cast<void>(reader.readU32(figures.restrictedInPeriod));
+    static_cast<void>(reader.readU32(figures.totalRestricted));
+    static_cast<void>(reader.readU64(figures.restrictedSince));
+    static_cast<void>(reader.readU32(version));
+    static_cast<void>(reader.readU32(reserved));
+    if (version != kBlobVersion || reserved != kReserved) {
         return std::nullopt;
     }
     return figures;

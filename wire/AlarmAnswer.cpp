@@ -32,9 +32,10 @@ std::optional<AlarmAnswer> decodeAlarmAnswer(std::span<const std::uint8_t> bytes
     std::uint64_t date = 0;
     std::string_view reason;
     if (!reader.readU8(version) || !reader.readU8(timer) || !reader.readU8(wakesMachine) ||
-        !reader.readU64(date) || !reader.readText(reason, reader.left())) {
+        !reader.readU64(date)) {
         return std::nullopt;
     }
+    static_cast<void>(reader.readText(reason, reader.left()));
     if (version != kVersion || timer > static_cast<std::uint8_t>(AlarmAnswer::Timer::failed) ||
         wakesMachine > 1 || reason.size() > kAlarmReasonMaxSize) {
         return std::nullopt;

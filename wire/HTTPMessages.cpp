@@ -192,9 +192,13 @@ std::optional<HTTPHeader> decodeHTTPHeader(std::span<const std::uint8_t, kHTTPHe
     std::uint8_t type = 0;
     std::uint16_t reserved = 0;
     HTTPHeader header;
-    if (!reader.readText(magic, sizeof kHTTPMagic) || !reader.readU8(version) ||
-        !reader.readU8(type) || !reader.readU16(reserved) || !reader.readU32(header.size) ||
-        magic != std::string_view(kHTTPMagic, sizeof kHTTPMagic) || version != kHTTPVersion ||
+    // There are as many bytes as a header has.
+    static_cast<void>(reader.readText(magic, sizeof kHTTPMagic));
+    static_cast<void>(reader.readU8(version));
+    static_cast<void>(reader.readU8(type));
+    static_cast<void>(reader.readU16(reserved));
+    static_cast<void>(reader.readU32(header.size));
+    if (magic != std::string_view(kHTTPMagic, sizeof kHTTPMagic) || version != kHTTPVersion ||
         reserved != 0) {
         return std::nullopt;
     }

@@ -7,8 +7,9 @@
 #include <array>
 #include <bit>
 #include <limits>
+#include <map>
 #include <string>
-#include <vector>
+#include <utility>
 
 namespace platform {
 
@@ -247,7 +248,8 @@ class Reader {
     }
 
     bool readOtherEntries(const Entries& entries) {
-        std::vector<std::pair<std::string, std::uint64_t>> sorted;
+        // Of two equal keys the last one counts.
+        std::map<std::string, std::uint64_t> sorted;
         for (std::size_t i = 0; i < entries.count; ++i) {
             FileText key;
             std::string text;
@@ -259,17 +261,11 @@ class Reader {
             } else if (!appendUTF8(key.bytes, text)) {
                 return false;
             }
-            sorted.emplace_back(std::move(text), objects_.reference(entries.values, i));
+            sorted.insert_or_assign(std::move(text), objects_.reference(entries.values, i));
         }
-        std::stable_sort(sorted.begin(), sorted.end(), [](const auto& left, const auto& right) {
-            return left.first < right.first;
-        });
-        for (std::size_t i = 0; i < sorted.size(); ++i) {
-            if (i + 1 < sorted.size() && sorted[i].first == sorted[i + 1].first) {
-                continue;
-            }
-            sink_.key(sorted[i].first);
-            if (!readObject(sorted[i].second)) {
+        for (const auto& [key, value] : sorted) {
+            sink_.key(key);
+            if (!readObject(value)) {
                 return false;
             }
         }

@@ -117,10 +117,18 @@ class Handler : public rapidjson::BaseReaderHandler<Encoding, Handler> {
     }
 
     bool isText(std::string_view text) {
-        return !holdsSurrogate(text) || objectTo("Half of a surrogate pair in string.");
+        if (holdsSurrogate(text)) {
+            return objectTo("Half of a surrogate pair in string.");
+        }
+        return true;
     }
 
-    bool isDepthLeft() { return ++depth_ <= kMaxJSONDepth || objectTo("Nested too deep."); }
+    bool isDepthLeft() {
+        if (++depth_ > kMaxJSONDepth) {
+            return objectTo("Nested too deep.");
+        }
+        return true;
+    }
 
     bool objectTo(std::string_view what) {
         objection_ = what;

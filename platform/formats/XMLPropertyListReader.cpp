@@ -181,8 +181,7 @@ class Walk {
         std::uint32_t size = 0;
         libplist().to_bin(node, &binary, &size);
         const std::unique_ptr<char, Release> owner(binary);
-        return binary != nullptr &&
-               readBinaryPropertyList({reinterpret_cast<const std::uint8_t*>(binary), size}, sink_);
+        return readBinaryPropertyList({reinterpret_cast<const std::uint8_t*>(binary), size}, sink_);
     }
 
     bool readContainer(plist_t node) {
@@ -238,7 +237,7 @@ class Walk {
             plist_t value = nullptr;
             libplist().dict_next_item(map, iterator, &key, &value);
             const std::unique_ptr<char, Release> keyOwner(key);
-            if (key == nullptr || value == nullptr) {
+            if (key == nullptr) {
                 break;
             }
             entries.emplace_back(key, value);

@@ -43,7 +43,7 @@ ServiceHandle LinuxServiceRegistry::findByClassName(std::string_view name) {
 }
 
 bool LinuxServiceRegistry::isWithheld(Outcome outcome) {
-    return outcome != kSuccess && outcome != kNoEntry && outcome != statusFromErrno(ENOENT) &&
+    return outcome != kNoEntry && outcome != statusFromErrno(ENOENT) &&
            outcome != statusFromErrno(ENOTDIR);
 }
 

@@ -87,7 +87,7 @@ class LinuxServiceRegistry final : public ServiceRegistry {
     };
 
     [[nodiscard]] Lookup lookUp(wire::KernelOperation operation, std::string_view key);
-    /// Whether the kernel service is there and could not be asked.
+    /// Whether a lookup that failed says that the kernel service is there and could not be asked.
     [[nodiscard]] static bool isWithheld(Outcome outcome);
     [[nodiscard]] ServiceHandle hold(const std::optional<RegistryPath>& path, Status status);
     [[nodiscard]] const Entry* find(ServiceHandle entry) const;
