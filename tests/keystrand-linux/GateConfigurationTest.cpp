@@ -1,12 +1,15 @@
 #include "keystrand-linux/GateConfiguration.h"
 
 #include "base/Concat.h"
+#include "tests/support/FailingCalls.h"
 #include "tests/support/TemporaryDirectory.h"
 
 #include <gtest/gtest.h>
 
+#include <cerrno>
 #include <filesystem>
 #include <fstream>
+#include <sys/stat.h>
 #include <unistd.h>
 
 namespace keystrand::usb {
@@ -95,7 +98,7 @@ TEST(GateConfigurationTest, PeriodsAtTheLimits) {
 TEST(GateConfigurationTest, WordsThatAreNotUnderstoodChangeNothing) {
     const GateConfiguration configuration =
         parse("internal = No\n\nkeyboards = sometimes\non-unlock =\n"
-              "period 5\ncolour = red\nnot-keyboards = 046d 046d:c31c 046g:c31c\n");
+              "period 5\ncolour = red\nnot-keyboards = 046d 046d:c31c 046g:c31c 046d-c31c\n");
     Keystrand::Settings settings = configuration.settings;
     EXPECT_EQ(settings.rules.notKeyboards, (std::vector<GateRules::Product>{{0x046D, 0xC31C}}));
     settings.rules.notKeyboards.clear();
@@ -113,6 +116,8 @@ TEST(GateConfigurationTest, WordsThatAreNotUnderstoodChangeNothing) {
             "keystrand: FILE: line 6: unknown key \"colour\"; ignored.",
             "keystrand: FILE: line 7: \"046d\" in not-keyboards is no ID like 046d:c31c; ignored.",
             "keystrand: FILE: line 7: \"046g:c31c\" in not-keyboards is no ID like 046d:c31c; "
+            "ignored.",
+            "keystrand: FILE: line 7: \"046d-c31c\" in not-keyboards is no ID like 046d:c31c; "
             "ignored."}));
 }
 
@@ -125,8 +130,8 @@ TEST(GateConfigurationTest, KeyThatIsGivenTwiceIsNotSet) {
 }
 
 TEST(GateConfigurationTest, LinesForTheLogStaySmallAndPlain) {
-    EXPECT_EQ(remarkOf("\x1B[1m\"\\ = 1"),
-              "keystrand: FILE: line 1: unknown key \"?[1m??\"; ignored.");
+    EXPECT_EQ(remarkOf("\x1B[1m\"\\\x7F~ = 1"),
+              "keystrand: FILE: line 1: unknown key \"?[1m???~\"; ignored.");
     const std::string longest(64, 'k');
     EXPECT_EQ(remarkOf(longest + "=1"),
               base::concat("keystrand: FILE: line 1: unknown key \"", longest, "\"; ignored."));
@@ -193,6 +198,37 @@ TEST_F(GateConfigurationFileTest, FileThatOthersMayWriteCountsForNothing) {
     expectDistrusted("owned by user 4711, neither root nor the service's own");
 }
 
+TEST_F(GateConfigurationFileTest, FileOfTheServicesOwnUserIsRead) {
+    write("period = 5\n");
+    constexpr uid_t kSomebody = 4711;
+    for (fs::path open = path_.parent_path(); open != directory_.path().parent_path();
+         open = open.parent_path()) {
+        fs::permissions(open, fs::perms::group_exec | fs::perms::others_exec,
+                        fs::perm_options::add);
+    }
+    fs::permissions(path_, fs::perms::owner_read);
+    if (::chown(path_.c_str(), kSomebody, static_cast<gid_t>(-1)) != 0) {
+        GTEST_SKIP() << "a file cannot be given away here";
+    }
+    ASSERT_EQ(::seteuid(kSomebody), 0);
+    const GateConfiguration configuration = read();
+    ASSERT_EQ(::seteuid(0), 0);
+    EXPECT_EQ(configuration.remarks, Remarks());
+    EXPECT_EQ(configuration.settings.period, 5U);
+}
+
+TEST_F(GateConfigurationFileTest, ReadsThatFail) {
+    write("period = 5\n");
+    support::FailingCalls::read = {EINTR, EINTR};
+    EXPECT_EQ(read().settings.period, 5U);
+    support::FailingCalls::read = {EIO};
+    expectDistrusted("cannot be read: Input/output error");
+    support::FailingCalls::fstat = {EIO};
+    expectDistrusted("cannot be read: Input/output error");
+    EXPECT_TRUE(support::FailingCalls::read.empty());
+    EXPECT_TRUE(support::FailingCalls::fstat.empty());
+}
+
 TEST_F(GateConfigurationFileTest, SizeHasALimit) {
     const std::string line = "period = 5\n";
     write(line + std::string(GateConfiguration::kMaxSize - line.size(), '\n'));
@@ -203,6 +239,9 @@ TEST_F(GateConfigurationFileTest, SizeHasALimit) {
 
 TEST_F(GateConfigurationFileTest, WhatIsNoFileCountsForNothing) {
     fs::create_directory(path_);
+    expectDistrusted("not a regular file");
+    fs::remove(path_);
+    ASSERT_EQ(::mkfifo(path_.c_str(), 0600), 0);
     expectDistrusted("not a regular file");
     fs::remove(path_);
     fs::create_symlink(path_.filename(), path_);

@@ -1,10 +1,12 @@
 #include "keystrand-linux/GateRecord.h"
 
 #include "keystrand-linux/StateFile.h"
+#include "tests/support/FailingCalls.h"
 #include "tests/support/TemporaryDirectory.h"
 
 #include <gtest/gtest.h>
 
+#include <cerrno>
 #include <filesystem>
 #include <fstream>
 #include <sys/stat.h>
@@ -118,6 +120,36 @@ TEST(KnownDevicesTest, ComeBackTheSame) {
     EXPECT_EQ(decodeKnownDevices(encodeKnownDevices({})), KnownDevices());
 }
 
+TEST(KnownDevicesTest, AnythingElseIsNone) {
+    const auto read = [](const std::string& line) {
+        return decodeKnownDevices("keystrand-devices 1\n" + line + "\nend\n");
+    };
+    const KnownAcrossStarts device{.controller = "xy",
+                                   .path = "1",
+                                   .vendor = 1,
+                                   .product = 2,
+                                   .descriptorsHash = 3,
+                                   .serial = "z"};
+    ASSERT_EQ(read("device 7879 1 1 2 3 7a"), KnownDevices{device});
+    for (const char* line : {
+             "gadget 7879 1 1 2 3 7a",
+             "device g879 1 1 2 3 7a",
+             "device 7g79 1 1 2 3 7a",
+             "device 787 1 1 2 3 7a",
+             "device 7879 1 65536 2 3 7a",
+             "device 7879 1 1 2 3 7A",
+             "device 7879 1 1 2 3 7a0",
+             "device 7879 1 1 2 3 7a more",
+             "device 7879 1 1 2 3",
+             "device  1 1 2 3 7a",
+             "",
+         }) {
+        EXPECT_EQ(read(line), std::nullopt) << line;
+    }
+    EXPECT_EQ(decodeKnownDevices("end\n"), std::nullopt);
+    EXPECT_EQ(decodeKnownDevices("keystrand-devices 2\nend\n"), std::nullopt);
+}
+
 TEST(KnownDevicesTest, PlaceIsBehindTheController) {
     UsbDevice device;
     device.attachment.port = "3-1.4";
@@ -174,6 +206,19 @@ TEST_P(StateFileTest, LinkIsNotFollowed) {
     EXPECT_EQ(problem, file.path() + ": cannot be opened: Too many levels of symbolic links");
     EXPECT_TRUE(file.replace("x", problem));
     EXPECT_FALSE(std::filesystem::is_symlink(file.path()));
+}
+
+TEST_P(StateFileTest, ReadsThatFail) {
+    ASSERT_TRUE(file.replace("one", problem));
+    support::FailingCalls::read = {EINTR};
+    EXPECT_EQ(file.read(problem), "one");
+    EXPECT_EQ(problem, "");
+    support::FailingCalls::read = {EIO};
+    EXPECT_EQ(file.read(problem), std::nullopt);
+    EXPECT_EQ(problem, file.path() + ": cannot be read: Input/output error");
+    support::FailingCalls::fstat = {EIO};
+    EXPECT_EQ(file.read(problem), std::nullopt);
+    EXPECT_EQ(problem, file.path() + ": not a regular file");
 }
 
 TEST_P(StateFileTest, SizeHasALimit) {

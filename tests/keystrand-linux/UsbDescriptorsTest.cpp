@@ -64,6 +64,13 @@ TEST(UsbDescriptorsTest, KeyboardInOneConfigurationAndDiskInAnother) {
     EXPECT_FALSE(functions.isOnlyKeyboard);
 }
 
+TEST(UsbDescriptorsTest, KeyboardBehindTheDisk) {
+    const UsbFunctions functions =
+        readExactly(descriptorsOf(std::vector<UsbClass>{{8, 6, 0x50}, {3, 1, 1}}));
+    EXPECT_TRUE(functions.isKeyboard);
+    EXPECT_FALSE(functions.isOnlyKeyboard);
+}
+
 TEST(UsbDescriptorsTest, AlternateSettingCounts) {
     // The second interface is another setting of the first one.
     Bytes bytes =
@@ -125,6 +132,10 @@ TEST(UsbDescriptorsTest, WhatContradictsItselfIsNotUnderstood) {
     for (const std::uint8_t type : Bytes{1, 2}) {
         expectNotUnderstood(with(keyboard, kInterface + 1, type));
     }
+    // A single byte behind the last descriptor, which the configuration counts as its own.
+    Bytes longer = with(keyboard, kTotal, static_cast<std::uint8_t>(keyboard.size() + 1 - kDevice));
+    longer.push_back(2);
+    expectNotUnderstood(longer);
 }
 
 TEST(UsbDescriptorsTest, DeviceWithoutInterfacesIsNotUnderstood) {

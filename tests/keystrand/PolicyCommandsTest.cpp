@@ -188,6 +188,17 @@ TEST_F(PolicyCommandsTest, LengthsThatNobodySent) {
     }
 }
 
+TEST_F(PolicyCommandsTest, ParametersThatDisagreeAboutTheUser) {
+    const ByteVector five = parameter(4, Bytes().u32(5));
+    const ByteVector six = parameter(4, Bytes().u32(6));
+    const Question one{.parameters = {five, five}};
+    const Question two{.parameters = {five, six}};
+    EXPECT_EQ(run(3, policy(handle(1), "door", one)), 0);
+    EXPECT_EQ(run(3, policy(handle(1), "door", two)), -6007);
+    EXPECT_EQ(run(11, constraint(handle(1), "policy door", one)), 0);
+    EXPECT_EQ(run(11, constraint(handle(1), "policy door", two)), -6007);
+}
+
 TEST_F(PolicyCommandsTest, AnswerHasToFit) {
     add(plainCredential(5));
     const ByteVector question = policy(handle(1), "window", {});
@@ -232,6 +243,16 @@ TEST_F(AccessListCommandTest, Refusals) {
     padded.resize(4096, ' ');
     EXPECT_EQ(run(20, acl(kNoHandle, padded)), 0);
     EXPECT_EQ(run(20, acl(kNoHandle, padded + " ")), -6007);
+}
+
+TEST_F(AccessListCommandTest, ParametersThatDisagreeAboutTheUser) {
+    const auto withUsers = [&](std::uint32_t first, std::uint32_t second) {
+        ByteVector bytes = acl(handle(1), kList);
+        bytes.resize(bytes.size() - 4);
+        return Bytes().bytes(bytes).u32(2).u32(4).u32(4).u32(first).u32(4).u32(4).u32(second).get();
+    };
+    EXPECT_EQ(run(20, withUsers(5, 5)), 0);
+    EXPECT_EQ(run(20, withUsers(5, 6)), -6007);
 }
 
 TEST_F(AccessListCommandTest, PayloadsThatAreNotExact) {

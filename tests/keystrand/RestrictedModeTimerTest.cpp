@@ -382,7 +382,10 @@ TEST_F(RestrictedModeTimerTest, FiguresThatCannotBeTrueAreLeftAlone) {
     const AnalyticsFigures before = timer_.figures();
     const std::vector<ByteVector> blobs = {
         figuresBlob(kStart + 1, 1, 2, 0), figuresBlob(kStart, 1, 2, kStart + 1),
-        figuresBlob(0, 1, 2, 0), Bytes().fill(32, 0xff).get(), Bytes().fill(32, 0).get()};
+        figuresBlob(0, 1, 2, 0), Bytes().fill(32, 0xff).get(), Bytes().fill(32, 0).get(),
+        // Of another version, and with something where nothing is to be.
+        Bytes().u64(kStart - 400).u32(1).u32(2).u64(0).u32(2).u32(0).get(),
+        Bytes().u64(kStart - 400).u32(1).u32(2).u64(0).u32(1).u32(1).get()};
     for (const ByteVector& blob : blobs) {
         EXPECT_THAT(timer_.restoreAnalytics(kStart, arrayOf<32>(blob)), IsEmpty());
         EXPECT_EQ(timer_.figures(), before);

@@ -51,6 +51,7 @@ TEST(LinkTest, WhatIsNoAbsoluteLink) {
                                         "https://a/%2",
                                         "https://a/%2G",
                                         "https://a/%G2",
+                                        "https://a/%g2",
                                         "https://a/%%20",
                                         "https://a/<",
                                         "https://a/>",

@@ -132,7 +132,8 @@ TEST(GateMessagesTest, NothingShorterAndNothingElseIsAnAnswer) {
     for (const char* text :
          {"", "\n", "ok", "ok\n\n", "error ", "error", "devices\n1-1\n",
           "devices\n2-1 0 0 0 0 - - - - maybe - 0\n", "devices\n2-1 0 0 0 0 6 - - - in - 0\n",
-          "devices\n2-1 0 0 0 0 6g - - - in - 0\n", "devices\n2-1 0 0 65536 0 - - - - in - 0\n",
+          "devices\n2-1 0 0 0 0 6g - - - in - 0\n", "devices\n2-1 0 0 0 0 g6 - - - in - 0\n",
+          "devices\n2-1 x 0 0 0 61 - - - in - 0\n", "devices\n2-1 0 0 65536 0 - - - - in - 0\n",
           "status\nother yes\n", "status\nlocked maybe\n"}) {
         EXPECT_EQ(decodeGateAnswer(text), std::nullopt) << text;
     }

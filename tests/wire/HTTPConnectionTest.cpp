@@ -1,8 +1,11 @@
 #include "wire/HTTPConnection.h"
 
+#include "tests/support/FailingCalls.h"
+
 #include <gtest/gtest.h>
 
 #include <array>
+#include <cerrno>
 #include <string>
 #include <sys/socket.h>
 #include <thread>
@@ -82,6 +85,26 @@ TEST_F(HTTPConnectionTest, PeerThatHangsUp) {
     EXPECT_EQ(receive(), State::open) << "what came before is there";
     EXPECT_EQ(receive(), State::hungUp) << "half a message is none";
     EXPECT_EQ(connection_->send(message), State::hungUp);
+}
+
+TEST_F(HTTPConnectionTest, NothingIsReceivedAfterTheEnd) {
+    write(wire::encodeHTTPBodyWanted(7));
+    connection_->endAt(HTTPConnection::Clock::now() + 1h);
+    EXPECT_EQ(receive(), State::open);
+    write(wire::encodeHTTPBodyWanted(8));
+    connection_->endAt(HTTPConnection::Clock::now() - 1ms);
+    EXPECT_EQ(receive(), State::timedOut);
+    EXPECT_EQ(wire::decodeHTTPBodyWanted(message_.fields), 7U) << "the message is as before";
+}
+
+TEST_F(HTTPConnectionTest, ReceiveThatIsInterruptedIsDoneAgainAndOneThatFailsIsAHangUp) {
+    write(wire::encodeHTTPBodyWanted(7));
+    support::FailingCalls::recv = {EINTR, EINTR};
+    EXPECT_EQ(receive(), State::open);
+    EXPECT_EQ(wire::decodeHTTPBodyWanted(message_.fields), 7U);
+    write(wire::encodeHTTPBodyWanted(8));
+    support::FailingCalls::recv = {ECONNRESET};
+    EXPECT_EQ(receive(), State::hungUp);
 }
 
 TEST_F(HTTPConnectionTest, WhatIsNoMessage) {

@@ -147,6 +147,7 @@ TEST_F(ConfigurationTest, AddressesThatAreUsedAndInDoubt) {
         {"file:///etc/hostname", kOther},
         {"httpss://collector.example", kOther},
         {"x:y", kOther},
+        {"h2+s://collector.example", kOther},
     };
     for (const auto& [address, reason] : kCases) {
         SCOPED_TRACE(address);

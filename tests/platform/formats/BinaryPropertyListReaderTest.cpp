@@ -378,6 +378,17 @@ TEST(BinaryPropertyListReaderTest, WorkIsBounded) {
     text[0] = 0x4f;
     EXPECT_TRUE(readsSharedObject(mostTexts, {text}));
     EXPECT_FALSE(readsSharedObject(mostTexts + 1, {text}));
+    // A key is read twice. It depends on its length which of the two is too much.
+    for (std::size_t length = kElements; length < kElements + 8; ++length) {
+        Bytes key = {0x5f, 0x11, static_cast<std::uint8_t>(length >> 8U),
+                     static_cast<std::uint8_t>(length)};
+        append(key, Bytes(length, 'x'));
+        const std::vector<Bytes> maps = {map({2, 3}), key, fromHex("09")};
+        const std::size_t mostMaps =
+            most(kFrame + maps[0].size() + key.size() + 1 + 4 * 4, 16 + 2 * 16 + 2 * length);
+        EXPECT_TRUE(readsSharedObject(mostMaps, maps)) << length;
+        EXPECT_FALSE(readsSharedObject(mostMaps + 1, maps)) << length;
+    }
 }
 
 TEST(BinaryPropertyListReaderTest, ObjectsOfOneFileMayBeSharedByUsualMeasure) {

@@ -4,10 +4,12 @@
 #include "platform/fake/FakeSystemLog.h"
 #include "tests/platform/linux/OpenDescriptors.h"
 #include "tests/support/ChildProcess.h"
+#include "tests/support/FailingCalls.h"
 #include "tests/support/TemporaryDirectory.h"
 
 #include <gmock/gmock.h>
 
+#include <cerrno>
 #include <chrono>
 #include <cstring>
 #include <fcntl.h>
@@ -163,6 +165,48 @@ TEST_F(EventSocketTest, AnotherUserIsRefused) {
     runAll(2);
     EXPECT_THAT(received, ElementsAre("s own 0"));
     EXPECT_THAT(log.texts(), ElementsAre("kstd: EventSocket: dropped datagram of user 65534."));
+}
+
+/// A datagram with control data that a test makes up, in the place of what is in the socket.
+std::function<ssize_t(msghdr&)> withControl(int level, int type, std::size_t length) {
+    return [=](msghdr& message) {
+        auto* const control = CMSG_FIRSTHDR(&message);
+        control->cmsg_level = level;
+        control->cmsg_type = type;
+        control->cmsg_len = length;
+        return static_cast<ssize_t>(message.msg_iov->iov_len);
+    };
+}
+
+TEST_F(EventSocketTest, DatagramWithoutItsSendersCredentialsIsDropped) {
+    support::FailingCalls::recvmsg = {
+        [](msghdr& message) {
+            message.msg_controllen = 0;
+            return ssize_t{1};
+        },
+        withControl(SOL_SOCKET + 1, SCM_CREDENTIALS, CMSG_LEN(sizeof(ucred))),
+        withControl(SOL_SOCKET, SCM_RIGHTS, CMSG_LEN(sizeof(ucred))),
+        withControl(SOL_SOCKET, SCM_CREDENTIALS, CMSG_LEN(sizeof(ucred)) - 1),
+    };
+    ASSERT_TRUE(send(event("after")));
+    runAll(5);
+    EXPECT_THAT(received, ElementsAre("s after 0"));
+    const std::string line = "kstd: EventSocket: dropped datagram of unknown sender.";
+    EXPECT_THAT(log.texts(), ElementsAre(line, line, line, line));
+}
+
+TEST_F(EventSocketTest, ReceivingThatIsInterruptedIsTriedAgainSilently) {
+    const auto failure = [](int error) {
+        return [error](msghdr& /*message*/) {
+            errno = error;
+            return ssize_t{-1};
+        };
+    };
+    support::FailingCalls::recvmsg = {failure(EAGAIN), failure(EINTR)};
+    ASSERT_TRUE(send(event("after")));
+    runAll(3);
+    EXPECT_THAT(received, ElementsAre("s after 0"));
+    EXPECT_THAT(log.texts(), ElementsAre());
 }
 
 TEST_F(EventSocketTest, TheOwnerOfTheSocketMaySend) {

@@ -727,6 +727,19 @@ TEST_F(LinuxKernelChannelTest, ScalarReplyThatDoesNotFitIsNotStoredAndOneThatDoe
     EXPECT_EQ(count, 1U);
 }
 
+TEST_F(LinuxKernelChannelTest, ScalarCallThatFailsLeavesItsOutput) {
+    serveAnswers([](const Packet& request) { return reply(request, -6004, 0, ""); });
+    ASSERT_EQ(open(), kSuccess);
+    std::uint64_t scalar = 9;
+    std::uint32_t count = 1;
+    EXPECT_EQ(channel.scalarCall(connection, 2, nullptr, 0, &scalar, &count), -6004);
+    server.reset();
+    EXPECT_EQ(channel.scalarCall(connection, 2, nullptr, 0, &scalar, &count),
+              statusFromErrno(ECONNREFUSED));
+    EXPECT_EQ(scalar, 9U);
+    EXPECT_EQ(count, 1U);
+}
+
 TEST_F(LinuxKernelChannelTest, SixteenScalarsAreTheLimit) {
     serveAnswers([](const Packet& request) { return reply(request, 0, 0, ""); });
     ASSERT_EQ(open(), kSuccess);

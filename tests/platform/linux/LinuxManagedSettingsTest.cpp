@@ -120,6 +120,22 @@ TEST_F(LinuxManagedSettingsTest, OwnerOtherThanRootOrTheProcessIsDoubt) {
     expectDoubt("owned by user 12345, neither root nor the daemon's own");
 }
 
+TEST_F(LinuxManagedSettingsTest, FileOfTheProcesssOwnUserCounts) {
+    if (::geteuid() != 0) {
+        GTEST_SKIP() << "only root can become another user";
+    }
+    root_.put(kPath, kNo, 0644);
+    ASSERT_EQ(::chown(root_.real(kPath).c_str(), 12345, 12345), 0);
+    for (const char* const directory : {"/", "/etc", "/etc/kstd"}) {
+        root_.setMode(directory, 0711);
+    }
+    ASSERT_EQ(::seteuid(12345), 0);
+    const bool isAllowed = allowed();
+    ASSERT_EQ(::seteuid(0), 0);
+    EXPECT_FALSE(isAllowed);
+    EXPECT_THAT(log_.texts(), IsEmpty());
+}
+
 TEST_F(LinuxManagedSettingsTest, LinkIsJudgedByTheFileBehindIt) {
     if (::geteuid() != 0) {
         GTEST_SKIP() << "only root can give a link away";

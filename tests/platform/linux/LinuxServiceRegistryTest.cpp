@@ -9,6 +9,7 @@
 
 #include <atomic>
 #include <filesystem>
+#include <fstream>
 #include <optional>
 #include <string>
 
@@ -65,6 +66,25 @@ TEST_F(LinuxServiceRegistryTest, SameEntryHasOneHandleAndCountedReferences) {
     EXPECT_EQ(registry.pathOf(second), "");
     registry.release(second);
     registry.release(kNoService);
+}
+
+TEST_F(LinuxServiceRegistryTest, EntryThatIsWithheldHasNoPathAndNoProperties) {
+    serve([](const Packet& request) { return support::reply(request, -6002, 0, ""); });
+    const ServiceHandle withheld = registry.findByClassName("Keystrand");
+    ASSERT_NE(withheld, kNoService);
+    EXPECT_EQ(registry.pathOf(withheld), "");
+    EXPECT_EQ(registry.statusOf(withheld), -6002);
+    EXPECT_EQ(registry.copyProperty(withheld, "N"), std::nullopt);
+    registry.release(withheld);
+    EXPECT_EQ(registry.statusOf(withheld), kSuccess);
+}
+
+TEST_F(LinuxServiceRegistryTest, NoServiceIsWithheldWhereNoSocketCanBe) {
+    LinuxServiceRegistry missing(directory.file("missing"), log);
+    EXPECT_EQ(missing.findByClassName("Keystrand"), kNoService);
+    std::ofstream(directory.file("file")) << "no directory";
+    LinuxServiceRegistry below(directory.file("file/service.sock"), log);
+    EXPECT_EQ(below.findByClassName("Keystrand"), kNoService);
 }
 
 TEST_F(LinuxServiceRegistryTest, PathsInRepliesAtTheirLimits) {

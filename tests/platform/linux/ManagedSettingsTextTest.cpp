@@ -54,9 +54,10 @@ TEST(ManagedSettingsTextTest, ValueWithAZeroByteIsAProblem) {
 }
 
 TEST(ManagedSettingsTextTest, LinesOfAnotherFormAreAProblem) {
-    for (const char* line : {"restricted-mode-allowed", "no", "= no", "=", "[section]",
-                             "Restricted-Mode-Allowed = no", "restricted mode allowed = no",
-                             "restricted_mode_allowed = no", "\xef\xbb\xbfkey = value", "\r"}) {
+    for (const char* line :
+         {"restricted-mode-allowed", "no", "= no", "=", "[section]", "Restricted-Mode-Allowed = no",
+          "restricted mode allowed = no", "restricted_mode_allowed = no", "\xef\xbb\xbfkey = value",
+          "\r", "a.b = no", "a:b = no", "a{b = no"}) {
         expectProblem(std::string("# comment\n") + line + "\nrestricted-mode-allowed = no\n",
                       "line 2: is not of the form \"key = value\"");
     }
@@ -80,6 +81,10 @@ TEST(ManagedSettingsTextTest, UnknownKeysAreRemarkedOnAndTheRestCounts) {
     EXPECT_FALSE(settings.restrictedModeAllowed);
     EXPECT_EQ(settings.problem, "");
     EXPECT_EQ(settings.remark, "line 2: unknown key colour");
+
+    settings = parseManagedSettings("0-9az = 1\n");
+    EXPECT_EQ(settings.problem, "");
+    EXPECT_EQ(settings.remark, "line 1: unknown key 0-9az");
 
     settings = parseManagedSettings("a = 1\na = 2\nrestricted-mode-allowed = no\nb = 3\n");
     EXPECT_FALSE(settings.restrictedModeAllowed);

@@ -1,6 +1,7 @@
 #include "platform/linux/RegularFile.h"
 
 #include "tests/platform/linux/RootDirectory.h"
+#include "tests/support/FailingCalls.h"
 
 #include <gtest/gtest.h>
 
@@ -56,6 +57,7 @@ TEST_F(RegularFileTest, TellsModeAndOwner) {
 TEST_F(RegularFileTest, MissingFileIsToldFromUnreadable) {
     EXPECT_EQ(read(10).failure, ReadFailure::missing);
     EXPECT_EQ(read(10).error, ENOENT);
+    EXPECT_EQ(distrust(read(10), 10), "cannot be read: No such file or directory");
     root_.put("/file", Bytes());
     const RegularFile below = readRegularFile(root_.real("/file/below"), 10);
     EXPECT_EQ(below.failure, ReadFailure::unreadable);
@@ -67,6 +69,22 @@ TEST_F(RegularFileTest, FailedReadIsUnreadable) {
     EXPECT_EQ(file.failure, ReadFailure::unreadable);
     EXPECT_EQ(file.error, EIO);
     EXPECT_TRUE(file.bytes.empty());
+}
+
+TEST_F(RegularFileTest, InterruptedReadIsDoneAgain) {
+    root_.put("/file", Bytes(3, 5));
+    support::FailingCalls::read = {EINTR, EINTR};
+    EXPECT_EQ(read(10).bytes, Bytes(3, 5));
+    EXPECT_TRUE(support::FailingCalls::read.empty());
+}
+
+TEST_F(RegularFileTest, FileThatCannotBeLookedAtIsUnreadable) {
+    root_.put("/file", Bytes(3, 5));
+    support::FailingCalls::fstat = {EIO};
+    const RegularFile file = read(10);
+    EXPECT_EQ(file.failure, ReadFailure::unreadable);
+    EXPECT_EQ(file.error, EIO);
+    EXPECT_EQ(distrust(file, 10), "cannot be read: Input/output error");
 }
 
 TEST_F(RegularFileTest, OtherKindsOfFileAreNotRead) {

@@ -205,6 +205,17 @@ TEST_F(AlarmStoreTest, DirectoryThatCannotBeReadStandsForAlarmsThatAreDue) {
                                          path + "/stream: Not a directory."));
 }
 
+TEST_F(AlarmStoreTest, NothingIsClearedInAStreamThatIsNone) {
+    std::filesystem::create_directories(path);
+    std::ofstream(path + "/a") << "00000000000000000001\n";
+    for (const std::string stream : {"", ".", "..", "stream/..", "/"}) {
+        store.clear(stream, "a");
+    }
+    std::ifstream file(path + "/a");
+    EXPECT_EQ(std::string(std::istreambuf_iterator<char>(file), {}), "00000000000000000001\n");
+    EXPECT_THAT(log.texts(), ElementsAre());
+}
+
 TEST_F(AlarmStoreTest, FilesThatAreNoAlarmsAreLeftAloneAndNamed) {
     EXPECT_TRUE(store.save("stream", "a", {5}));
     const std::string foreign[] = {"a.bak", ".a.swp", "A", "x"};
