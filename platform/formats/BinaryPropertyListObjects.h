@@ -86,7 +86,11 @@ using Span = std::span<const std::uint8_t>;
     if (count == kCountFollows && !readLargeCount(reader, count)) {
         return false;
     }
-    return count <= reader.left() / width && reader.readSpan(elements, count * width);
+    if (count > reader.left() / width) {
+        return false;
+    }
+    static_cast<void>(reader.readSpan(elements, count * width));
+    return true;
 }
 
 /// The objects of a file, which must outlive it.
