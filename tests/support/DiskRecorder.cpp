@@ -142,7 +142,7 @@ void DiskRecorder::add(DiskStep step) {
     if (!isInside(step.path)) {
         return;
     }
-    step.path.erase(0, root_.size());
+    step.path = step.path == root_ ? "/" : step.path.substr(root_.size());
     if (step.what == What::rename) {
         step.other.erase(0, root_.size());
     }

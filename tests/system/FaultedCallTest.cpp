@@ -186,6 +186,7 @@ class FaultedCallTest : public RelaunchFixture {
     }
 
     void arrange(const Scenario& scenario) {
+        dropEvents();
         for (const char* const suffix : {"-wal", "-shm"}) {
             fs::remove(database() + suffix);
         }

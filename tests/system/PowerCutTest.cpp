@@ -13,6 +13,7 @@
 #include "tests/system/AnalyticsFixture.h"
 #include "wire/EventDatagram.h"
 
+#include <atomic>
 #include <cerrno>
 #include <csignal>
 #include <filesystem>
@@ -175,7 +176,7 @@ class PowerCutTest : public AnalyticsFixture {
   private:
     /// Whether the daemon was killed. `next` is the record to be published next.
     bool runDaemon(support::DiskRecorder& recorder, std::size_t killAt, std::size_t& next) {
-        bool wasKilled = false;
+        std::atomic<bool> wasKilled = false;
         const auto judge = [&](const support::SystemCall& call) {
             const std::size_t steps = recorder.steps().size();
             recorder.note(call);
@@ -206,7 +207,8 @@ class PowerCutTest : public AnalyticsFixture {
             kernel("wait acks=" + std::to_string(acknowledgements_ + static_cast<int>(next)));
         }
         gate.program().signal(SIGTERM);
-        EXPECT_EQ(gate.program().awaitEnd(), wasKilled ? 128 + SIGKILL : 0);
+        const auto status = gate.program().awaitEnd();
+        EXPECT_EQ(status, wasKilled ? 128 + SIGKILL : 0);
         return wasKilled;
     }
 
