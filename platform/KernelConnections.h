@@ -23,8 +23,8 @@ inline constexpr Status kPlatformStatusBase = -1000;
 /// The error of a failure that the platform itself found; 0 for any other status.
 [[nodiscard]] constexpr int errnoFromStatus(Status status) {
     constexpr int kLastError = 4095;
-    const int error = kPlatformStatusBase - status;
-    return status < kPlatformStatusBase && error <= kLastError ? error : 0;
+    const bool isOurs = status < kPlatformStatusBase && status >= kPlatformStatusBase - kLastError;
+    return isOurs ? kPlatformStatusBase - status : 0;
 }
 
 /// What the registry and the channel have in common, whose requests go to the kernel service: how

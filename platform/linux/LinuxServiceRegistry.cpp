@@ -117,12 +117,15 @@ void LinuxServiceRegistry::tell(const char* what, std::string_view name, Outcome
         return;
     }
     std::array<char, 32> number{};
-    const char* reason = number.data();
+    const char* reason = nullptr;
     if (outcome == kNoEntry) {
         reason = "there is none";
     } else if (const int error = errnoFromStatus(outcome); error != 0) {
         reason = ::strerrordesc_np(error);
-    } else {
+    }
+    // A kernel side may also say a number that looks like an error of the system and is none.
+    if (reason == nullptr) {
+        reason = number.data();
         static_cast<void>(
             std::snprintf(number.data(), number.size(), "refused with status %d", outcome));
     }

@@ -10,6 +10,7 @@
 #include <atomic>
 #include <filesystem>
 #include <fstream>
+#include <limits>
 #include <optional>
 #include <string>
 
@@ -233,6 +234,20 @@ TEST_F(RegistryWarningsTest, RefusingKernelSide) {
     serve([](const Packet& request) { return support::reply(request, -42, 0, ""); });
     EXPECT_EQ(warningsOf(registry), cannotFind("refused with status -42"));
     EXPECT_EQ(warningsOf(registry), none);
+}
+
+TEST_F(RegistryWarningsTest, StatusThatIsNoErrorOfTheSystemIsANumber) {
+    std::atomic<std::int32_t> status = 0;
+    serve([&status](const Packet& request) { return support::reply(request, status, 0, ""); });
+    for (const std::int32_t number :
+         {std::numeric_limits<std::int32_t>::max(), 2147482649, 2147482648, 1, -999, -1134, -5095,
+          -5096, std::numeric_limits<std::int32_t>::min()}) {
+        status = number;
+        EXPECT_EQ(warningsOf(registry),
+                  cannotFind("refused with status " + std::to_string(number)));
+    }
+    status = -1001;
+    EXPECT_EQ(warningsOf(registry), cannotFind("Operation not permitted"));
 }
 
 TEST_F(RegistryWarningsTest, KernelSideWithoutTheEntry) {
