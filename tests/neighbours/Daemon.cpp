@@ -14,6 +14,7 @@
 #include <sys/prctl.h>
 #include <sys/wait.h>
 #include <unistd.h>
+#include <utility>
 
 namespace neighbours {
 
@@ -29,13 +30,15 @@ constexpr std::size_t kLongestLine = 8192 + 64;
     ::prctl(PR_SET_PDEATHSIG, SIGKILL);
     ::dup2(output, STDOUT_FILENO);
     ::dup2(output, STDERR_FILENO);
-    // A duplicate onto itself would keep close-on-exec.
-    const int copy = ::fcntl(eventSocket, F_DUPFD, kFirstHandedDescriptor + 1);
-    ::dup2(copy, kFirstHandedDescriptor);
-    ::close_range(kFirstHandedDescriptor + 1, ~0U, 0);
-    ::setenv("LISTEN_FDS", "1", 1);
-    ::setenv("LISTEN_FDNAMES", "events", 1);
-    ::setenv("LISTEN_PID", std::to_string(::getpid()).c_str(), 1);
+    if (eventSocket >= 0) {
+        // A duplicate onto itself would keep close-on-exec.
+        const int copy = ::fcntl(eventSocket, F_DUPFD, kFirstHandedDescriptor + 1);
+        ::dup2(copy, kFirstHandedDescriptor);
+        ::close(copy);
+        ::setenv("LISTEN_FDS", "1", 1);
+        ::setenv("LISTEN_FDNAMES", "events", 1);
+        ::setenv("LISTEN_PID", std::to_string(::getpid()).c_str(), 1);
+    }
     std::vector<char*> words;
     words.reserve(arguments.size() + 1);
     for (const std::string& argument : arguments) {
@@ -63,7 +66,8 @@ Footprint Footprint::of(pid_t process) {
     return found;
 }
 
-Daemon::Daemon(const std::vector<std::string>& arguments, int eventSocket) {
+Daemon::Daemon(const std::vector<std::string>& arguments, int eventSocket, std::string ready)
+    : ready_(std::move(ready)) {
     int ends[2];
     require(::pipe2(ends, O_CLOEXEC) == 0, "no pipe");
     output_ = base::FileDescriptor(ends[0]);
@@ -105,7 +109,7 @@ void Daemon::listen() {
 
 void Daemon::take(std::string_view line) {
     ++lines_;
-    isInRunLoop_ = isInRunLoop_ || line.ends_with("Entering the main runloop.");
+    isReady_ = isReady_ || line.ends_with(ready_);
     newest_.emplace_back(line.substr(0, 400));
     if (newest_.size() > kNewest) {
         newest_.pop_front();

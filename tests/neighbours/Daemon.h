@@ -23,12 +23,13 @@ struct Footprint {
     [[nodiscard]] static Footprint of(pid_t process);
 };
 
-/// A daemon under a root directory, as a process, with all that it says. A line that nobody could
-/// read, or read safely, is a fault.
+/// A daemon, or another program that serves, as a process, with all that it says. A line that
+/// nobody could read, or read safely, is a fault.
 class Daemon : private base::NotCopied {
   public:
-    /// The event socket stays the caller's, so that what is queued in it outlives a daemon.
-    Daemon(const std::vector<std::string>& arguments, int eventSocket);
+    /// The event socket stays the caller's, so that what is queued in it outlives a daemon; -1 is
+    /// none. It is ready when it has said a line that ends in `ready`.
+    Daemon(const std::vector<std::string>& arguments, int eventSocket, std::string ready);
     ~Daemon();
 
     [[nodiscard]] pid_t process() const { return process_; }
@@ -37,7 +38,7 @@ class Daemon : private base::NotCopied {
     void listen();
 
     [[nodiscard]] std::uint64_t lines() const { return lines_; }
-    [[nodiscard]] bool isInRunLoop() const { return isInRunLoop_; }
+    [[nodiscard]] bool isReady() const { return isReady_; }
     /// The newest lines, for a report.
     [[nodiscard]] const std::deque<std::string>& newest() const { return newest_; }
 
@@ -57,7 +58,8 @@ class Daemon : private base::NotCopied {
     base::FileDescriptor output_;
     std::string partial_;
     std::uint64_t lines_ = 0;
-    bool isInRunLoop_ = false;
+    std::string ready_;
+    bool isReady_ = false;
     std::deque<std::string> newest_;
 };
 

@@ -42,7 +42,7 @@ class CountingLog final : public platform::SystemLog {
 std::vector<Bytes> requirements() {
     std::vector<Bytes> found;
     std::vector<std::filesystem::path> paths;
-    for (const auto& entry : std::filesystem::directory_iterator(KSTD_REQUIREMENTS)) {
+    for (const auto& entry : std::filesystem::directory_iterator(KSTD_CORPORA "/requirement")) {
         paths.push_back(entry.path());
     }
     // In the same order everywhere.

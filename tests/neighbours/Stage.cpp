@@ -94,8 +94,8 @@ Stage::~Stage() {
 void Stage::launch() {
     std::vector<std::string> words{program_, "--root", root_.path().string()};
     words.insert(words.end(), options_.begin(), options_.end());
-    daemon_ = std::make_unique<Daemon>(words, events_.get());
-    await("a daemon in its run loop", [this] { return daemon_->isInRunLoop(); });
+    daemon_ = std::make_unique<Daemon>(words, events_.get(), "Entering the main runloop.");
+    await("a daemon in its run loop", [this] { return daemon_->isReady(); });
 }
 
 void Stage::end() {

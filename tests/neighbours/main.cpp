@@ -18,7 +18,8 @@ int main(int argc, char** argv) {
     const std::map<std::string, Run> runs = {
         {"events", neighbours::runEvents},      {"kernel", neighbours::runKernelSide},
         {"https", neighbours::runHTTPSProcess}, {"bus", neighbours::runBus},
-        {"library", neighbours::runLibrary},    {"soak", neighbours::runSoak}};
+        {"library", neighbours::runLibrary},    {"clients", neighbours::runClients},
+        {"soak", neighbours::runSoak}};
     std::string name;
     neighbours::RunOptions options;
     options.daemon = KSTD_DEV;
