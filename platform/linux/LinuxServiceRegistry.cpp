@@ -73,7 +73,7 @@ LinuxServiceRegistry::Lookup LinuxServiceRegistry::lookUp(wire::KernelOperation 
 ServiceHandle LinuxServiceRegistry::hold(const std::optional<RegistryPath>& path, Status status) {
     std::optional<Entry>* room = &entries_.front();
     for (auto& entry : entries_) {
-        if (entry && (path ? entry->path && entry->path->text() == path->text() : !entry->path)) {
+        if (entry && entry->path == path) {
             ++entry->references;
             entry->status = status;
             entry->found = ++lastFound_;

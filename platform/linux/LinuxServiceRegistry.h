@@ -19,6 +19,8 @@ class RegistryPath {
 
     [[nodiscard]] std::string_view text() const { return {text_.data(), size_}; }
 
+    bool operator==(const RegistryPath& other) const { return text() == other.text(); }
+
   private:
     RegistryPath() = default;
 
