@@ -117,7 +117,9 @@ void Keystrand::setLocked(bool locked) {
 }
 
 void Keystrand::goToSleep() {
-    sleeping_ = true;
+    if (!std::exchange(sleeping_, true)) {
+        wasRestricted_ = model_.timer().restricted();
+    }
     model_.lock();
     update();
     parts_.lockState.closed();
@@ -127,7 +129,6 @@ void Keystrand::wakeUp() {
     if (!std::exchange(sleeping_, false)) {
         return;
     }
-    const bool wasRestricted = model_.timer().restricted();
     clockWasSet();
     if (!locked_) {
         setLocked(false);
@@ -135,8 +136,9 @@ void Keystrand::wakeUp() {
     }
     model_.catchUp();
     update();
-    // The period's end is what the alarm was for; nobody needs the machine awake.
-    if (!wasRestricted && model_.timer().restricted()) {
+    // The period's end is what the alarm was for; nobody needs the machine awake. It may have been
+    // seen before anybody said that the machine is awake.
+    if (!wasRestricted_ && model_.timer().restricted()) {
         sleepAgainAt_ = now() + kAwakeForNothing;
     }
 }

@@ -120,6 +120,8 @@ class Keystrand : private base::NotCopied {
 
     bool locked_ = true;
     bool sleeping_ = false;
+    /// When it went to sleep.
+    bool wasRestricted_ = false;
     /// Neither a daemon nor an unlock has said yet what holds.
     bool starting_ = true;
     bool sawUnlock_ = false;

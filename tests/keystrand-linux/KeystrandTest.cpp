@@ -337,6 +337,25 @@ TEST_F(KeystrandTest, MachineThatWokeForTheAlarmAloneSleepsAgain) {
     EXPECT_EQ(asleepAgain, 1);
 }
 
+TEST_F(KeystrandTest, MachineWhoseAlarmIsSeenBeforeTheWordSleepsAgain) {
+    begin();
+    sessions.say(Said::locked);
+    sessions.say(Said::goingToSleep);
+    // Timers go off as soon as it runs again; logind takes longer.
+    pass(3600s);
+    sessions.say(Said::locked);
+    sessions.say(Said::awake);
+    EXPECT_TRUE(isClosed());
+    pass(30s);
+    EXPECT_EQ(asleepAgain, 1);
+    // It was restricted before: somebody has woken it.
+    sessions.say(Said::goingToSleep);
+    pass(3600s);
+    sessions.say(Said::awake);
+    pass(30s);
+    EXPECT_EQ(asleepAgain, 1);
+}
+
 TEST_F(KeystrandTest, MachineThatSomebodyUsesStaysAwake) {
     begin();
     sessions.say(Said::locked);
