@@ -38,7 +38,9 @@ void measureRequirement(const bench::Options& options) {
         {product, bench::copying::bytes(product.encodedSize), bench::protobuf::requirement(sample),
          bench::protobuf::requirementAtHand(sample), bench::flatbuffer::requirement(sample),
          bench::capnproto::requirement(sample)},
-        {.encodeAgainstMemcpy = {}, .encodeAgainstPeers = kTargetAgainstPeers});
+        {.encodeAgainstMemcpy = {},
+         .encodeAgainstPeers = kTargetAgainstPeers,
+         .decodeAgainstProtobuf = kTargetAgainstPeers});
 }
 
 void measureQuestion(const bench::Options& options) {

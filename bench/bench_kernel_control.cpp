@@ -27,7 +27,7 @@ namespace {
 constexpr int kDefaultRounds = 2000;
 constexpr int kCallsPerRound = 100;
 constexpr int kCountedCalls = 1000;
-constexpr double kTarget = 1.15;
+constexpr double kTarget = 1.10;
 
 struct Case {
     std::size_t inputSize;

@@ -24,7 +24,7 @@ namespace {
 constexpr int kDefaultRounds = 500;
 constexpr int kCallsPerRound = 20;
 constexpr int kCountedCalls = 100;
-constexpr double kTarget = 1.25;
+constexpr double kTarget = 1.20;
 
 constexpr char kInsert[] = "insert into all_events (timestamp, data) values (?, ?)";
 constexpr double kSomeTime = 800000000;

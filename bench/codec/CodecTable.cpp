@@ -42,9 +42,11 @@ void printSizes(const std::vector<Codec>& codecs) {
 }
 
 std::optional<double> targetOf(const CodecTargets& targets, const Operation& operation,
-                               std::size_t codec) {
+                               const std::vector<Codec>& codecs, std::size_t codec) {
     if (!operation.isEncode) {
-        return std::nullopt;
+        return operation.work == &Codec::decode && codecs[codec].name == "protobuf"
+                   ? targets.decodeAgainstProtobuf
+                   : std::nullopt;
     }
     return codec == kMemcpy ? targets.encodeAgainstMemcpy : targets.encodeAgainstPeers;
 }
@@ -78,7 +80,8 @@ void compareCodecs(const std::string& title, int rounds, const std::vector<Codec
         for (std::size_t i = kMemcpy; i < codecs.size(); ++i) {
             if (codecs[i].*operation.work) {
                 printRow(base::concat(operation.name, ", against ", codecs[i].name),
-                         compare(measured, place++, kProduct), targetOf(targets, operation, i));
+                         compare(measured, place++, kProduct),
+                         targetOf(targets, operation, codecs, i));
             }
         }
     }

@@ -12,6 +12,8 @@ namespace bench {
 struct CodecTargets {
     std::optional<double> encodeAgainstMemcpy;
     std::optional<double> encodeAgainstPeers;
+    /// Of `decode`, in which the peer keeps its message.
+    std::optional<double> decodeAgainstProtobuf = std::nullopt;
 };
 
 /// Measures all codecs of one payload in the same rounds and prints a row for the product against
