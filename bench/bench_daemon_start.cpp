@@ -31,6 +31,7 @@ class Started {
         const std::chrono::duration<double, std::nano> time =
             std::chrono::steady_clock::now() - begin;
         times_.push_back(time.count());
+        cpuTimes_.push_back(bench::cpuTimeOf(program.pid()));
         const bench::ProcessMemory memory = bench::memoryOf(program.pid());
         resident_.push_back(static_cast<double>(memory.resident));
         proportional_.push_back(static_cast<double>(memory.proportional));
@@ -42,6 +43,7 @@ class Started {
     void forget() { *this = Started(std::move(arguments_)); }
 
     [[nodiscard]] const bench::Samples& times() const { return times_; }
+    [[nodiscard]] const bench::Samples& cpuTimes() const { return cpuTimes_; }
 
     void printMemory(const char* name) const {
         const auto mebibytes = [](const bench::Samples& sizes) {
@@ -54,6 +56,7 @@ class Started {
   private:
     std::vector<std::string> arguments_;
     bench::Samples times_;
+    bench::Samples cpuTimes_;
     bench::Samples resident_;
     bench::Samples proportional_;
     bench::Samples own_;
@@ -81,6 +84,9 @@ void measure(const bench::Options& options, const std::filesystem::path& directo
     }
     bench::printRow("start of the daemon",
                     bench::compare({{minimal.times(), daemon.times()}, 0}, 0, 1), kTarget);
+    // Whoever else wants the CPU has no part in it.
+    bench::printRow("its CPU time",
+                    bench::compare({{minimal.cpuTimes(), daemon.cpuTimes()}, 0}, 0, 1), kTarget);
     std::printf("\n%-20s %12s %12s %12s %10s\n", "", "resident", "proportional", "its own",
                 "libraries");
     minimal.printMemory("minimal program");

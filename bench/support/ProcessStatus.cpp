@@ -57,6 +57,15 @@ ProcessMemory memoryOf(pid_t process) {
                 sizeIn(sums, "Private_Dirty:").value_or(0)};
 }
 
+double cpuTimeOf(pid_t process) {
+    std::ifstream file(pathOf(process, "schedstat"));
+    double nanoseconds = 0;
+    if (!(file >> nanoseconds)) {
+        throw std::runtime_error("cannot see what CPU time a process has used");
+    }
+    return nanoseconds;
+}
+
 std::size_t sharedLibrariesOf(pid_t process) {
     std::ifstream maps(pathOf(process, "maps"));
     if (!maps) {

@@ -20,6 +20,10 @@ struct ProcessMemory {
 /// Throws when the system does not say.
 [[nodiscard]] ProcessMemory memoryOf(pid_t process);
 
+/// The CPU time that the main thread of the process has used, in nanoseconds. Throws when the
+/// system does not say.
+[[nodiscard]] double cpuTimeOf(pid_t process);
+
 /// How many shared libraries the process has mapped, the dynamic linker and the kernel's own not
 /// counted. Throws when the system does not say.
 [[nodiscard]] std::size_t sharedLibrariesOf(pid_t process);
