@@ -67,7 +67,8 @@ std::string CallInjector::shortened(std::string object) const {
 }
 
 void CallInjector::noteIdle(const SystemCall& call) {
-    if (call.program != kDaemon) {
+    // Only the main thread waits for events; a sanitizer may have one of its own.
+    if (call.thread != mainThread_) {
         return;
     }
     isIdle_ = waitsForEvents(call);
@@ -81,6 +82,7 @@ int CallInjector::judge(const SystemCall& call) {
     const std::lock_guard lock(mutex_);
     noteIdle(call);
     if (isFirstOfMain(call)) {
+        mainThread_ = call.program == kDaemon ? call.thread : mainThread_;
         began_.insert(call.program);
         isArmed_ = isArmed_ || armsAtMain_;
     }

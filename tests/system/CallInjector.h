@@ -80,6 +80,7 @@ class CallInjector {
     bool isArmed_ = false;
     bool armsAtMain_ = false;
     bool isIdle_ = false;
+    pid_t mainThread_ = -1;
     bool isMet_ = false;
     int hits_ = 0;
     /// Programs whose own calls have begun.
