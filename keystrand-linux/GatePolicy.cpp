@@ -125,11 +125,13 @@ void GatePolicy::tryAgain() {
     }
 }
 
-void GatePolicy::keepOnly(const IsKnown& isKnown, const BusView& view, BootTime now) {
+void GatePolicy::keepOnly(IsKnown isKnown, const BusView& view, BootTime now) {
+    isKnown_ = std::move(isKnown);
+    returnsUntil_ = now + kReturnTime;
     for (const UsbDevice& device : view.devices) {
         const auto entry = entryOf(device.attachment);
         if (entry == state_.devices.end() || entry->standing != Standing::attached ||
-            device.hardWired || isKnown(device) ||
+            device.hardWired || isKnown_(device) ||
             (device.functions.isOnlyKeyboard && !isNoKeyboard(device))) {
             continue;
         }
@@ -253,6 +255,12 @@ std::optional<GateAction> GatePolicy::decideKnown(KnownDevice& known, const UsbD
             // Only root can have done that.
             known.standing = Standing::letInByOthers;
             known.since = now;
+        } else if (!known.givenUp && returns(device, now)) {
+            known = {.attachment = device.attachment,
+                     .standing = Standing::returned,
+                     .since = now,
+                     .confirmed = false};
+            return forDevice(Kind::accept, device, Standing::returned);
         } else if (!known.givenUp && mayBeTheKeyboard(device) && wantsKeyboard(view)) {
             known = {.attachment = device.attachment,
                      .standing = Standing::keyboard,
@@ -293,6 +301,11 @@ std::optional<GateAction> GatePolicy::decideNew(const UsbDevice& device, const B
     if (isLetInByItsPort(device)) {
         known.standing = Standing::hardWired;
         return std::nullopt;
+    }
+    if (returns(device, now)) {
+        known.standing = Standing::returned;
+        known.confirmed = false;
+        return forDevice(Kind::accept, device, Standing::returned);
     }
     const bool wanted = !isClosedByOthers(device) && wantsKeyboard(view);
     if (wanted && (mayBeTheKeyboard(device) || device.functions.isHub)) {
@@ -585,6 +598,11 @@ const KnownDevice* GatePolicy::find(const Attachment& attachment) const {
         std::find_if(state_.devices.begin(), state_.devices.end(),
                      [&](const KnownDevice& known) { return known.attachment == attachment; });
     return found == state_.devices.end() ? nullptr : &*found;
+}
+
+/// Whether the machine had it when it went off, and it only takes its time now.
+bool GatePolicy::returns(const UsbDevice& device, BootTime now) const {
+    return isKnown_ && now < returnsUntil_ && isKnown_(device) && !isClosedByOthers(device);
 }
 
 bool GatePolicy::isNoKeyboard(const UsbDevice& device) const {

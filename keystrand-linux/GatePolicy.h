@@ -38,6 +38,8 @@ struct GateRules {
 enum class Standing : std::uint8_t {
     /// In: it was there when the gate closed.
     attached,
+    /// In: it was when the machine went off, and came a little late when it started.
+    returned,
     /// In: the kernel lets devices on its port come.
     hardWired,
     /// In: it is the keyboard that somebody needs to unlock.
@@ -155,6 +157,9 @@ class GatePolicy {
     /// long after the root hubs were put back one may still come that was refused.
     static constexpr BootTime kLateTime = std::chrono::seconds(10);
 
+    /// So long after a start of the machine slow disks and docks are awaited.
+    static constexpr BootTime kReturnTime = std::chrono::seconds(60);
+
     explicit GatePolicy(GateRules rules);
 
     /// Goes on from what another service has left. What it decided without having carried it out
@@ -167,9 +172,10 @@ class GatePolicy {
     void open();
 
     /// Of what is in, whatever `isKnown` does not know goes, but for hard-wired ports and
-    /// keyboards. For a closed gate.
+    /// keyboards. What it knows comes in, if it was refused or comes within kReturnTime. For a
+    /// closed gate.
     using IsKnown = std::function<bool(const UsbDevice&)>;
-    void keepOnly(const IsKnown& isKnown, const BusView& view, BootTime now);
+    void keepOnly(IsKnown isKnown, const BusView& view, BootTime now);
 
     /// The device comes in, whatever the rules say. False when it is not there or in already.
     [[nodiscard]] bool accept(const Attachment& attachment, BootTime now);
@@ -222,6 +228,7 @@ class GatePolicy {
     [[nodiscard]] std::optional<GateAction> refuse(KnownDevice& known, const UsbDevice& device,
                                                    const BusView& view, BootTime now);
 
+    [[nodiscard]] bool returns(const UsbDevice& device, BootTime now) const;
     [[nodiscard]] bool isNoKeyboard(const UsbDevice& device) const;
     [[nodiscard]] bool mayBeTheKeyboard(const UsbDevice& device) const;
     [[nodiscard]] bool wantsKeyboard(const BusView& view) const;
@@ -241,6 +248,9 @@ class GatePolicy {
     GateState state_;
     /// What closes: a kernel that does not know the value for hard-wired ports gets the other one.
     AuthorizedDefault closing_;
+    /// What was in when the machine went off, and until when that counts.
+    IsKnown isKnown_;
+    BootTime returnsUntil_{0};
     /// When the last default was put back, while it opens.
     std::optional<BootTime> putBackAt_;
 };

@@ -15,8 +15,9 @@ constexpr std::string_view kGateHead = "keystrand-gate 1";
 constexpr std::string_view kDevicesHead = "keystrand-devices 1";
 constexpr std::string_view kEnd = "end";
 
-constexpr std::array<std::pair<Standing, std::string_view>, 10> kStandings = {{
+constexpr std::array<std::pair<Standing, std::string_view>, 11> kStandings = {{
     {Standing::attached, "attached"},
+    {Standing::returned, "returned"},
     {Standing::hardWired, "hard-wired"},
     {Standing::keyboard, "keyboard"},
     {Standing::probe, "probe"},

@@ -49,6 +49,8 @@ std::string listOf(const std::vector<std::string>& parts) {
 
 std::string_view reasonFor(Standing standing) {
     switch (standing) {
+    case Standing::returned:
+        return "it was attached when the machine went off";
     case Standing::keyboard:
         return "no other keyboard is attached";
     case Standing::probe:
@@ -171,8 +173,10 @@ void UsbGate::keepOnlyKnown() {
     }
     if (const auto view = lookAtBus()) {
         policy_.keepOnly(
-            [&](const UsbDevice& device) { return known->contains(acrossStarts(device)); }, *view,
-            parts_.now());
+            [known = *known](const UsbDevice& device) {
+                return known.contains(acrossStarts(device));
+            },
+            *view, parts_.now());
         settle();
     }
 }

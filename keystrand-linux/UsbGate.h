@@ -56,8 +56,9 @@ class UsbGate : private base::NotCopied {
     /// To be kept in the record, from the next write on.
     void remember(const GateRecord::Service& service);
 
-    /// Of what is in, only what was attached and in when the machine went off stays. For a closed
-    /// gate; nothing, with a line, when that is not known.
+    /// Of what is in, only what was attached and in when the machine went off stays; and what of
+    /// it is shown a little late comes in. For a closed gate; nothing, with a line, when that is
+    /// not known.
     void keepOnlyKnown();
 
     /// Lets the device in, whether the gate is closed or not. A reason for people, or none when it

@@ -17,8 +17,9 @@ namespace kstctl {
 
 namespace {
 
-constexpr std::array<GateRule, 10> kRules = {{
+constexpr std::array<GateRule, 11> kRules = {{
     {"attached", "attached before the gate closed"},
+    {"returned", "attached when the machine went off"},
     {"hard-wired", "on a port inside the machine"},
     {"keyboard", "the keyboard to unlock with"},
     {"probe", "a hub, tried for a keyboard behind it"},

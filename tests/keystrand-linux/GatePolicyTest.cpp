@@ -625,6 +625,39 @@ TEST_F(GatePolicyTest, UnknownHubStaysForTheKeyboardBehindIt) {
     EXPECT_FALSE(bus.isAuthorized("1-2"));
 }
 
+TEST_F(GatePolicyTest, WhatIsKnownComesInALittleLate) {
+    gate->close();
+    bus.plug("1-1", aDisk());
+    bus.plug("1-2", aDisk());
+    gate->settle();
+    EXPECT_EQ(gate->standingAt("1-1"), Standing::refused);
+    gate->keepOnly([](const UsbDevice& device) { return device.port() != "1-2"; });
+    EXPECT_EQ(gate->standingAt("1-1"), Standing::returned);
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+    EXPECT_FALSE(bus.isAuthorized("1-2"));
+    gate->pass(GatePolicy::kReturnTime - BootTime(1));
+    bus.plug("1-3", aHub());
+    bus.plug("1-3.1", aDisk());
+    gate->settle();
+    EXPECT_EQ(gate->standingAt("1-3.1"), Standing::returned);
+    EXPECT_TRUE(bus.isAuthorized("1-3.1"));
+    gate->pass(BootTime(1));
+    bus.plug("1-4", aDisk());
+    gate->settle();
+    EXPECT_EQ(gate->standingAt("1-4"), Standing::refused);
+    EXPECT_FALSE(bus.isAuthorized("1-4"));
+    EXPECT_FALSE(bus.isAuthorized("1-2"));
+}
+
+TEST_F(GatePolicyTest, WhatOthersKeepOutIsNotLetInForBeingKnown) {
+    bus.setRootHubDefault(1, kNobody);
+    gate->close();
+    gate->keepOnly([](const UsbDevice&) { return true; });
+    bus.plug("1-1", aDisk());
+    gate->settle();
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+}
+
 TEST_F(GatePolicyTest, NextServiceRefusesAtOnceWhatWasToBeRefused) {
     gate->meanwhile(1, [&] { bus.plug("1-1", aDisk()); });
     bus.failWrites(1);

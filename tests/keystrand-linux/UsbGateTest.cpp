@@ -530,6 +530,15 @@ TEST_F(UsbGateTest, AfterARestartOnlyWhatWasThereStays) {
     EXPECT_TRUE(next.isAuthorized("2-1"));
     EXPECT_FALSE(next.isAuthorized("2-2"));
     EXPECT_FALSE(next.isAuthorized("1-2"));
+    // The disk that was there takes its time.
+    next.unplug("1-1");
+    after.look();
+    log.take();
+    next.plug("1-1", aDisk());
+    after.look();
+    EXPECT_TRUE(next.isAuthorized("1-1"));
+    EXPECT_EQ(log.take(), Lines{R"(keystrand: accepted 1-1 (1111:2222 "maker" "disk", classes )"
+                                R"(08/06/50): it was attached when the machine went off)"});
 }
 
 TEST_F(UsbGateTest, WithoutAListNothingIsTaken) {
