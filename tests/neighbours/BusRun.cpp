@@ -186,6 +186,7 @@ std::uint64_t armOften(Random ideas, std::uint64_t times, std::size_t silences,
 
 void runBus(const RunOptions& options) {
     constexpr std::uint64_t kBatch = 200;
+    // What the heap of each thread keeps at hand counts as allocated, and each bus has a thread.
     [[maybe_unused]] constexpr std::size_t kMostGrowth = 1'000;
     const auto begin = std::chrono::steady_clock::now();
     std::uint64_t exchanges = 0;
@@ -198,7 +199,7 @@ void runBus(const RunOptions& options) {
                               batch == options.firstBatch ? options.silences : 0,
                               base::concat("batch ", batch));
         runs += kBatch + 1;
-        now = Footprint::of(::getpid());
+        now = Footprint::ofThis();
         first = first.descriptors == 0 ? now : first;
         require(now.descriptors == first.descriptors,
                 base::concat(now.descriptors, " descriptors in the place of ", first.descriptors));
@@ -208,7 +209,7 @@ void runBus(const RunOptions& options) {
 #endif
     }
     std::printf("bus: %llu exchanges, batches %llu to %llu, %.1f s; %llu runs of the helper, "
-                "descriptors %zu -> %zu, memory %zu -> %zu KiB\n",
+                "descriptors %zu -> %zu, heap %zu -> %zu KiB\n",
                 static_cast<unsigned long long>(exchanges),
                 static_cast<unsigned long long>(options.firstBatch),
                 static_cast<unsigned long long>(batch - 1),

@@ -11,6 +11,7 @@
 #include <filesystem>
 #include <fstream>
 #include <iterator>
+#include <malloc.h>
 #include <sys/prctl.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -63,6 +64,13 @@ Footprint Footprint::of(pid_t process) {
             found.kilobytes += kilobytes;
         }
     }
+    return found;
+}
+
+Footprint Footprint::ofThis() {
+    Footprint found = of(::getpid());
+    const auto heap = ::mallinfo2();
+    found.kilobytes = (heap.uordblks + heap.hblkhd) / 1024;
     return found;
 }
 

@@ -21,6 +21,9 @@ struct Footprint {
     /// Of a running process: its open descriptors, and the memory that it has written to. What it
     /// has of files is shared with others as they come and go.
     [[nodiscard]] static Footprint of(pid_t process);
+    /// Of this process: its open descriptors, and what is allocated of its heap. What lies between
+    /// grows with the largest message that anybody has announced.
+    [[nodiscard]] static Footprint ofThis();
 };
 
 /// A daemon, or another program that serves, as a process, with all that it says. A line that

@@ -156,7 +156,7 @@ Result callOften(std::uint64_t seed, std::size_t silences) {
 } // namespace
 
 void runLibrary(const RunOptions& options) {
-    [[maybe_unused]] constexpr std::size_t kMostGrowth = 1'000;
+    [[maybe_unused]] constexpr std::size_t kMostGrowth = 100;
     /// A call checks what it sends and what it gets, and each check can fail once.
     constexpr std::uint64_t kMostLinesPerExchange = 40;
     // The LibCall functions print their failures.
@@ -179,7 +179,7 @@ void runLibrary(const RunOptions& options) {
                all.lines + result.lines};
         require(all.lines <= (all.exchanges + all.calls) * kMostLinesPerExchange,
                 base::concat(all.lines, " lines for ", all.calls, " calls"));
-        now = Footprint::of(::getpid());
+        now = Footprint::ofThis();
         first = first.descriptors == 0 ? now : first;
         require(now.descriptors == first.descriptors,
                 base::concat(now.descriptors, " descriptors in the place of ", first.descriptors));
@@ -190,7 +190,7 @@ void runLibrary(const RunOptions& options) {
     }
     ::dprintf(said.get(),
               "library: %llu exchanges, batches %llu to %llu, %.1f s; %llu calls, %llu lines, "
-              "descriptors %zu -> %zu, memory %zu -> %zu KiB\n",
+              "descriptors %zu -> %zu, heap %zu -> %zu KiB\n",
               static_cast<unsigned long long>(all.exchanges),
               static_cast<unsigned long long>(options.firstBatch),
               static_cast<unsigned long long>(batch - 1),
