@@ -263,13 +263,10 @@ class Reader {
             }
             sorted.insert_or_assign(std::move(text), objects_.reference(entries.values, i));
         }
-        for (const auto& [key, value] : sorted) {
-            sink_.key(key);
-            if (!readObject(value)) {
-                return false;
-            }
-        }
-        return true;
+        return std::all_of(sorted.begin(), sorted.end(), [this](const auto& entry) {
+            sink_.key(entry.first);
+            return readObject(entry.second);
+        });
     }
 
     /// Costs the same whether the key was kept or not.
