@@ -371,18 +371,20 @@ void GatePolicy::takeInWhatCameLast(const BusView& view) {
     }
 }
 
-/// Whether it has refused devices on this service's behalf until now, or until it was put back.
+/// Whether it has refused devices on this service's behalf until now, or until it was put back,
+/// which a service that was killed may have done without having it noted.
 bool GatePolicy::refusesForThis(const RootHub& hub) const {
     for (const WrittenHub& known : state_.hubs) {
         if (known.inode == hub.inode) {
-            return known.value.putBack ? hub.authorizedDefault == known.value.before
-                                       : known.value.isStillThere(hub.authorizedDefault);
+            const WrittenDefault& value = known.value;
+            return value.isStillThere(hub.authorizedDefault) ||
+                   (value.before != value.written && hub.authorizedDefault == value.before);
         }
     }
     return valueWithoutTheParameter(hub).has_value();
 }
 
-GatePolicy::Actions GatePolicy::putDefaultsBack(const BusView& view, BootTime now) const {
+GatePolicy::Actions GatePolicy::putDefaultsBack(const BusView& view, BootTime now) {
     Actions actions;
     const auto& parameter = state_.parameter;
     if (parameter && !parameter->putBack && parameter->isStillThere(view.parameter) &&
@@ -394,8 +396,17 @@ GatePolicy::Actions GatePolicy::putDefaultsBack(const BusView& view, BootTime no
         const auto known =
             std::find_if(state_.hubs.begin(), state_.hubs.end(),
                          [&](const WrittenHub& each) { return each.inode == hub.inode; });
-        if (before && (known == state_.hubs.end() || known->value.isDue(now))) {
-            actions.push_back(forHub(hub, *before));
+        if (!before || (known != state_.hubs.end() && !known->value.isDue(now))) {
+            continue;
+        }
+        actions.push_back(forHub(hub, *before));
+        if (known == state_.hubs.end()) {
+            // It came closed, because of the parameter.
+            state_.hubs.push_back({.bus = hub.bus,
+                                   .inode = hub.inode,
+                                   .value = {.before = *before,
+                                             .written = hub.authorizedDefault,
+                                             .confirmed = true}});
         }
     }
     return actions;
@@ -491,20 +502,12 @@ void GatePolicy::parameterPutBack(const GateAction& action, const GateOutcome& o
 
 /// It is remembered to the end, too: what it refused may come late.
 void GatePolicy::hubPutBack(const GateAction& action, const GateOutcome& outcome, BootTime now) {
-    WrittenHub* known = hubAt(action.hub.inode);
-    if (known == nullptr) {
-        // One that came closed, because of the parameter.
-        state_.hubs.push_back({.bus = action.hub.bus,
-                               .inode = action.hub.inode,
-                               .value = {.before = action.value,
-                                         .written = action.hub.authorizedDefault,
-                                         .confirmed = true}});
-        known = &state_.hubs.back();
+    if (WrittenHub* const known = hubAt(action.hub.inode)) {
+        const bool isDone =
+            outcome.kind == GateOutcome::Kind::vanished || outcome.readBack == action.value;
+        known->value.putBack = isDone;
+        known->value.failedAt = isDone ? std::nullopt : std::optional(now);
     }
-    const bool isDone =
-        outcome.kind == GateOutcome::Kind::vanished || outcome.readBack == action.value;
-    known->value.putBack = isDone;
-    known->value.failedAt = isDone ? std::nullopt : std::optional(now);
 }
 
 void GatePolicy::deviceWritten(const GateAction& action, const GateOutcome& outcome, BootTime now) {

@@ -211,7 +211,7 @@ class GatePolicy {
     [[nodiscard]] Actions decideOpening(const BusView& view, BootTime now);
     [[nodiscard]] Actions closeDefaults(const BusView& view, BootTime now);
     [[nodiscard]] WrittenHub closedHub(const RootHub& hub, AuthorizedDefault before) const;
-    [[nodiscard]] Actions putDefaultsBack(const BusView& view, BootTime now) const;
+    [[nodiscard]] Actions putDefaultsBack(const BusView& view, BootTime now);
     void takeInWhatCameLast(const BusView& view);
     [[nodiscard]] bool refusesForThis(const RootHub& hub) const;
     [[nodiscard]] std::optional<AuthorizedDefault> valueBefore(const RootHub& hub) const;

@@ -730,6 +730,33 @@ TEST_F(GatePolicyTest, NextServiceLetsInWhatWasStillToBeLetIn) {
     EXPECT_TRUE(bus.isAuthorized("1-2"));
 }
 
+TEST_F(GatePolicyTest, NextServiceLetsInWhatWasRefusedBeforeAWriteThatIsNotNoted) {
+    gate->close();
+    // The service that went did not see them, nor the root hub.
+    bus.plugUnseen("1-1", aDisk());
+    bus.addRootHub(3);
+    bus.plugUnseen("3-1", aDisk());
+    gate->policy.open();
+    std::string problem;
+    for (const GateAction& action : gate->policy.decide(*bus.look(problem), gate->now())) {
+        if (action.kind == GateAction::Kind::setRootHub) {
+            static_cast<void>(bus.setRootHub(action.hub, action.value));
+        } else {
+            static_cast<void>(bus.setParameter(action.value));
+        }
+    }
+    const GateState left = gate->policy.state();
+    bus.show("1-1");
+    bus.show("3-1");
+    ASSERT_FALSE(bus.isAuthorized("1-1"));
+    ASSERT_FALSE(bus.isAuthorized("3-1"));
+    with({});
+    gate->policy.resume(left);
+    gate->settle();
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+    EXPECT_TRUE(bus.isAuthorized("3-1"));
+}
+
 TEST_F(GatePolicyTest, ClosedAgainWhileItOpens) {
     gate->close();
     bus.plug("1-1", aDisk());
