@@ -76,6 +76,9 @@ void GatePolicy::close(const BusView& view, BootTime now) {
     if (closed()) {
         return;
     }
+    if (state_.phase == Phase::opening) {
+        takeInWhatCameLast(view, now);
+    }
     // What was put back while the gate was opening has to be written once more, and so has what
     // somebody else has opened.
     for (const RootHub& hub : view.rootHubs) {
@@ -335,7 +338,7 @@ std::optional<GateAction> GatePolicy::refuse(KnownDevice& known, const UsbDevice
 
 GatePolicy::Actions GatePolicy::decideOpening(const BusView& view, BootTime now) {
     if (!putBackAt_ || now < *putBackAt_ + kLateTime) {
-        takeInWhatCameLast(view);
+        takeInWhatCameLast(view, now);
     }
     Actions actions = putDefaultsBack(view, now);
     if (!actions.empty() || !putBackAt_) {
@@ -359,7 +362,7 @@ GatePolicy::Actions GatePolicy::decideOpening(const BusView& view, BootTime now)
 }
 
 /// What the kernel has refused on this service's behalf since the last look.
-void GatePolicy::takeInWhatCameLast(const BusView& view) {
+void GatePolicy::takeInWhatCameLast(const BusView& view, BootTime now) {
     for (const UsbDevice& device : view.devices) {
         const RootHub* const root = rootHubOf(view, device);
         if (root == nullptr || find(device.attachment) != nullptr) {
@@ -367,7 +370,8 @@ void GatePolicy::takeInWhatCameLast(const BusView& view) {
         }
         const Standing out = refusesForThis(*root) ? Standing::refused : Standing::refusedByOthers;
         state_.devices.push_back({.attachment = device.attachment,
-                                  .standing = device.authorized ? Standing::attached : out});
+                                  .standing = device.authorized ? Standing::attached : out,
+                                  .since = now});
     }
 }
 

@@ -212,7 +212,7 @@ class GatePolicy {
     [[nodiscard]] Actions closeDefaults(const BusView& view, BootTime now);
     [[nodiscard]] WrittenHub closedHub(const RootHub& hub, AuthorizedDefault before) const;
     [[nodiscard]] Actions putDefaultsBack(const BusView& view, BootTime now);
-    void takeInWhatCameLast(const BusView& view);
+    void takeInWhatCameLast(const BusView& view, BootTime now);
     [[nodiscard]] bool refusesForThis(const RootHub& hub) const;
     [[nodiscard]] std::optional<AuthorizedDefault> valueBefore(const RootHub& hub) const;
     [[nodiscard]] std::optional<AuthorizedDefault>

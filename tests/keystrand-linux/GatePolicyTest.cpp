@@ -757,6 +757,17 @@ TEST_F(GatePolicyTest, NextServiceLetsInWhatWasRefusedBeforeAWriteThatIsNotNoted
     EXPECT_TRUE(bus.isAuthorized("3-1"));
 }
 
+TEST_F(GatePolicyTest, RefusedBeforeTheGateIsClosedAgainComesInWhenItOpens) {
+    gate->close();
+    bus.plugUnseen("1-1", aDisk());
+    gate->policy.open();
+    bus.show("1-1");
+    gate->close();
+    EXPECT_EQ(gate->standingAt("1-1"), Standing::refused);
+    gate->open();
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+}
+
 TEST_F(GatePolicyTest, ClosedAgainWhileItOpens) {
     gate->close();
     bus.plug("1-1", aDisk());
