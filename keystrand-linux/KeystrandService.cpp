@@ -177,11 +177,14 @@ KeystrandService::KeystrandService(const std::string& root, GateLog& log,
               }
               return configuration.settings;
           }()),
-      commands_(hasPolicies
-                    ? makeCommands(
-                          kernel_, [this] { return CredentialSet::Seconds(clocks_.wall()); },
-                          keystrand_.kernelControls())
-                    : makeServiceCommands(kernel_, keystrand_.kernelControls())),
+      commands_(hasPolicies ? makeCommands(
+                                  kernel_,
+                                  [this] {
+                                      return static_cast<CredentialSet::Seconds>(
+                                          clocks_.wall() / std::chrono::seconds(1));
+                                  },
+                                  keystrand_.kernelControls())
+                            : makeServiceCommands(kernel_, keystrand_.kernelControls())),
       handler_({.registry = kernel_.registry, .commands = commands_, .logLevel = kernel_.logLevel}),
       server_(*loop_, std::move(sockets.service), handler_),
       gateSocket_(*loop_, std::move(sockets.gate), keystrand_, clocks_),

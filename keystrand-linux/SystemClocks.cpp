@@ -12,23 +12,22 @@ namespace keystrand::usb {
 
 namespace {
 
-timespec timeOf(clockid_t clock) {
+std::chrono::microseconds timeOf(clockid_t clock) {
     timespec now{};
     // Fails only for clocks that no kernel is without.
     static_cast<void>(::clock_gettime(clock, &now));
-    return now;
+    return std::chrono::duration_cast<std::chrono::microseconds>(
+        std::chrono::seconds(now.tv_sec) + std::chrono::nanoseconds(now.tv_nsec));
 }
 
 } // namespace
 
 BootTime SystemClocks::sinceStart() const {
-    const timespec now = timeOf(CLOCK_BOOTTIME);
-    return std::chrono::duration_cast<BootTime>(std::chrono::seconds(now.tv_sec) +
-                                                std::chrono::nanoseconds(now.tv_nsec));
+    return timeOf(CLOCK_BOOTTIME);
 }
 
-std::int64_t SystemClocks::wall() const {
-    return timeOf(CLOCK_REALTIME).tv_sec;
+std::chrono::microseconds SystemClocks::wall() const {
+    return timeOf(CLOCK_REALTIME);
 }
 
 DateWatch::DateWatch(EventLoop& loop, Handler handler)

@@ -13,7 +13,7 @@ namespace keystrand::usb {
 class SystemClocks : public MachineClock {
   public:
     [[nodiscard]] BootTime sinceStart() const override;
-    [[nodiscard]] std::int64_t wall() const override;
+    [[nodiscard]] std::chrono::microseconds wall() const override;
 };
 
 /// Calls its handler each time that somebody sets the date, forwards, backwards, or to what it

@@ -386,6 +386,28 @@ TEST_F(KeystrandTest, DateIsSetAndThePeriodStaysAsLong) {
     EXPECT_TRUE(isClosed());
 }
 
+TEST(CountedClockTest, ItsSecondsBeginWithTheDates) {
+    Clocks machine;
+    machine.boot = 100s + 500ms;
+    machine.sinceTheSecond = 300ms;
+    CountedClock clock(machine);
+    EXPECT_EQ(clock.now(), Clocks::kDate);
+    EXPECT_EQ(clock.whenIs(Clocks::kDate + 10), machine.boot + 9'700ms);
+    machine.boot += 9'700ms - 1us;
+    EXPECT_EQ(clock.now(), Clocks::kDate + 9);
+    machine.boot += 1us;
+    EXPECT_EQ(clock.now(), Clocks::kDate + 10);
+    // Less than half a second is no step of the date.
+    machine.date += 10;
+    machine.sinceTheSecond = 499ms;
+    EXPECT_EQ(clock.behind(), 0);
+    machine.date += 2;
+    EXPECT_EQ(clock.behind(), 2);
+    clock.catchUp();
+    EXPECT_EQ(clock.now(), Clocks::kDate + 12);
+    EXPECT_EQ(clock.behind(), 0);
+}
+
 TEST_F(KeystrandTest, FiguresFromTheFutureAreKeptButTheirStay) {
     const auto future = static_cast<std::uint64_t>(kDate) + 1000;
     restoreFigures({.periodStart = future,

@@ -28,7 +28,9 @@ class Clocks : public MachineClock {
     static constexpr std::int64_t kDate = 1'700'000'000;
 
     [[nodiscard]] BootTime sinceStart() const override { return boot; }
-    [[nodiscard]] std::int64_t wall() const override { return date; }
+    [[nodiscard]] std::chrono::microseconds wall() const override {
+        return std::chrono::seconds(date) + sinceTheSecond;
+    }
 
     void pass(std::chrono::seconds time) {
         boot += time;
@@ -37,6 +39,8 @@ class Clocks : public MachineClock {
 
     BootTime boot = std::chrono::seconds(100);
     std::int64_t date = kDate;
+    /// Of the date: the seconds of the two clocks need not begin together.
+    std::chrono::microseconds sinceTheSecond{0};
 };
 
 class Sessions : public LockState {
