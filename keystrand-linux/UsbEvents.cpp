@@ -98,7 +98,7 @@ bool tellsOfUsb(std::string_view message) {
     while (!message.empty()) {
         const std::size_t end = std::min(message.find('\0'), message.size());
         const std::string_view field = message.substr(0, end);
-        isUsb = isUsb || field == "SUBSYSTEM=usb";
+        isUsb = isUsb || field == "SUBSYSTEM=usb" || field == "DEVPATH=/module/usbcore";
         isChange =
             isChange || field == "ACTION=add" || field == "ACTION=remove" || field == "ACTION=bind";
         message.remove_prefix(std::min(end + 1, message.size()));

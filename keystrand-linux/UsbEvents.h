@@ -19,7 +19,8 @@ namespace keystrand::usb {
 /// which whoever plays the kernel sends the same messages.
 [[nodiscard]] base::FileDescriptor openEventsAt(const std::string& path, std::string& problem);
 
-/// Whether the message says that something on a USB bus came, went, or got its driver.
+/// Whether the message says that something on a USB bus came, went, or got its driver, or that the
+/// kernel has learned of USB, with its parameter, before there is any bus.
 [[nodiscard]] bool tellsOfUsb(std::string_view message);
 
 /// Hears of what comes and goes for as long as it exists. On a netlink socket only the kernel is

@@ -354,6 +354,9 @@ TEST_F(SysfsUsbBusTest, OnlyUsbThatComesOrGoesIsAnEvent) {
     for (const char* action : {"add", "remove", "bind"}) {
         EXPECT_EQ(send(action, "usb"), 1) << action;
     }
+    const std::string module("add@/module/x\0ACTION=add\0SUBSYSTEM=module\0DEVPATH=/module/", 58);
+    EXPECT_TRUE(tellsOfUsb(module + "usbcore"));
+    EXPECT_FALSE(tellsOfUsb(module + "usbcore_too"));
     EXPECT_EQ(send("change", "usb"), 0);
     EXPECT_EQ(send("unbind", "usb"), 0);
     EXPECT_EQ(send("add", "usbmisc"), 0);
