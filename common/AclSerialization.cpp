@@ -73,7 +73,7 @@ KSTStatus SerializeVerifyAclConstraint(const KSTHandle* handle, const void* aclC
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    err = kst::checkParameterData(parameters, parametersCount);
+    err = kst::checkParameters(parameters, parametersCount);
     if (err != kKSTErrorSuccess) {
         return err;
     }
@@ -136,7 +136,7 @@ KSTStatus checkAcl(const void* acl, std::uint32_t aclLength) {
 
 /// Stores what the payload needs, as a sum that does not wrap: 8 bytes of it count a field that is
 /// 4 bytes when it is written. `parameters` were checked as a list.
-KSTStatus measureAcl(std::uint32_t aclLength, std::uint32_t operationLength,
+KSTStatus measureAcl(std::uint64_t aclLength, std::uint64_t operationLength,
                      const KSTParameter* parameters, std::uint32_t parametersCount,
                      std::uint64_t& size) {
     std::uint32_t parametersLength = 0;
@@ -146,7 +146,23 @@ KSTStatus measureAcl(std::uint32_t aclLength, std::uint32_t operationLength,
     }
     constexpr std::uint64_t kFixedSize =
         kKSTHandleSize + sizeof(std::uint64_t) + 3 * sizeof(std::uint32_t);
-    size = kFixedSize + operationLength + aclLength + parametersLength;
+    const std::uint64_t withOperation = kFixedSize + operationLength;
+    const std::uint64_t withAcl = withOperation + aclLength;
+    const std::uint64_t withParameters = withAcl + parametersLength;
+    // Never so in 64 bits; it says that no sum can have wrapped.
+    if (withOperation <= operationLength || withAcl <= aclLength ||
+        withParameters <= parametersLength) {
+        return kst::fail(
+            serializationContext(),
+            "sizeof(KSTHandle) + sizeof(uint64_t) + sizeof(uint32_t) + operationLength + "
+            "sizeof(uint32_t) + sizeof(uint32_t) > operationLength && sizeof(KSTHandle) + "
+            "sizeof(uint64_t) + aclLength + sizeof(uint32_t) + operationLength + sizeof(uint32_t) "
+            "+ sizeof(uint32_t) > aclLength && sizeof(KSTHandle) + sizeof(uint64_t) + aclLength + "
+            "sizeof(uint32_t) + operationLength + sizeof(uint32_t) + sizeof(uint32_t) + "
+            "parametersLength > parametersLength",
+            0, kKSTErrorBadParameter);
+    }
+    size = withParameters;
     return kKSTErrorSuccess;
 }
 
@@ -202,7 +218,7 @@ KSTStatus SerializeProcessAcl(const KSTHandle* handle, const void* acl, std::uin
     if (operation == nullptr && operationLength != 0) {
         return kst::fail(context, "operation || !operationLength", 0, kKSTErrorBadParameter);
     }
-    err = kst::checkParameterData(parameters, parametersCount);
+    err = kst::checkParameters(parameters, parametersCount);
     if (err != kKSTErrorSuccess) {
         return err;
     }

@@ -139,10 +139,15 @@ KSTStatus checkWriter(const KSTParameter* parameters, std::uint32_t parametersCo
                                                                });
 }
 
-KSTStatus checkParameterData(const KSTParameter* parameters,
-                             std::uint32_t parametersCount) noexcept {
+KSTStatus checkParameters(const KSTParameter* parameters, std::uint32_t parametersCount) noexcept {
     for (std::uint32_t i = 0; i < parametersCount; ++i) {
-        if (parameters[i].parameterData == nullptr) {
+        const KSTParameter& param = parameters[i];
+        // Valid when it was measured; the list is the caller's, who may have changed it since.
+        const KSTStatus err = ValidateParameter(&param);
+        if (err != kKSTErrorSuccess) {
+            return failCall(serializationContext(), err);
+        }
+        if (param.parameterData == nullptr && param.parameterDataLength != 0) {
             return fail(serializationContext(),
                         "param->parameterData || !param->parameterDataLength", 0,
                         kKSTErrorBadParameter);
@@ -202,7 +207,10 @@ KSTStatus ReceivedParameters::readElement(base::ByteReader& reader,
                     kKSTErrorBadParameter);
     }
     static_cast<void>(reader.readU32(param.type));
-    static_cast<void>(reader.readU32(param.parameterDataLength));
+    // Counted above, and asked again like every length of the payload.
+    if (!reader.readU32(param.parameterDataLength)) {
+        return fail(context, kWordCheck, 0, kKSTErrorBadParameter);
+    }
     if (reader.left() < param.parameterDataLength) {
         return fail(context, "(size - offset) >= params[i].parameterDataLength", 0,
                     kKSTErrorBadParameter);

@@ -31,10 +31,10 @@ namespace kst {
 [[nodiscard]] KSTStatus checkWriter(const KSTParameter* parameters, std::uint32_t parametersCount,
                                     const void* outBuffer, const void* outSize) noexcept;
 
-/// Each of the parameters, which were measured, so that none is without bytes, must have them.
-/// Otherwise kKSTErrorBadParameter.
-[[nodiscard]] KSTStatus checkParameterData(const KSTParameter* parameters,
-                                           std::uint32_t parametersCount) noexcept;
+/// Each of a caller's parameters must be valid and have as many bytes as it says. Otherwise
+/// kKSTErrorBadParameter.
+[[nodiscard]] KSTStatus checkParameters(const KSTParameter* parameters,
+                                        std::uint32_t parametersCount) noexcept;
 
 /// Writes the count and the parameters. False when they do not fit.
 [[nodiscard]] bool writeParameters(base::ByteWriter& writer, const KSTParameter* parameters,

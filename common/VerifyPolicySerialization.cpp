@@ -40,8 +40,15 @@ KSTStatus measure(const char* policyId, const KSTParameter* parameters,
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    // No sum of them wraps in 64 bits.
     measured.size = measured.policyLength + kFixedSize + parametersLength;
+    // Never so in 64 bits; it says that the sum cannot have wrapped.
+    if (measured.size <= parametersLength) {
+        return kst::fail(serializationContext(),
+                         "sizeof(KSTHandle) + policyLength + 1 + sizeof(uint8_t) + "
+                         "sizeof(uint32_t) + sizeof(uint32_t) + parametersLength > "
+                         "parametersLength",
+                         0, kKSTErrorBadParameter);
+    }
     return kKSTErrorSuccess;
 }
 
@@ -104,7 +111,7 @@ KSTStatus SerializeVerifyPolicy(const KSTHandle* handle, const char* policyId,
     if (err != kKSTErrorSuccess) {
         return err;
     }
-    err = kst::checkParameterData(parameters, parametersCount);
+    err = kst::checkParameters(parameters, parametersCount);
     if (err != kKSTErrorSuccess) {
         return err;
     }
