@@ -143,15 +143,9 @@ class StreamLog final : public platform::SystemLog {
     std::ostream& stream_;
 };
 
-/// What is wrong with the alarms on disk, the daemon says.
-class SilentLog final : public platform::SystemLog {
-  public:
-    void write(platform::LogLevel /*level*/, std::string_view /*text*/,
-               const platform::LogFields& /*fields*/) override {}
-};
-
 ExitStatus arm(const platform::Paths& paths, platform::Clock& clock, std::ostream& errors) {
-    SilentLog log;
+    // What fails here for a moment, the daemon may never see.
+    StreamLog log(errors);
     platform::AlarmStore store(paths.alarmDirectory(), {wire::kAlarmName}, log);
     SystemdAlarmTimer unit(paths.systemBus());
     AlarmTimer timer(unit, clock, AlarmTimer::machineHere());

@@ -180,6 +180,15 @@ TEST_F(NotifyTest, HelperWithoutABusIsAFailureWhenNobodyAsked) {
     EXPECT_EQ(errors, "kstd-notify: no timer for the alarm: No such file or directory\n");
 }
 
+TEST_F(NotifyTest, HelperSaysWhyItCannotReadAnAlarm) {
+    putAlarm("");
+    EXPECT_EQ(run({"arm"}), kNotSent) << "there is no bus";
+    EXPECT_EQ(errors, "kstd: AlarmStore: unreadable alarm, taken as due: " +
+                          root.real(std::string(kAlarms) + kAlarm) +
+                          ".\nkstd-notify: no timer for the alarm: No such file or directory\n"
+                          "kstd-notify: no timer for the alarm: No such file or directory\n");
+}
+
 TEST_F(NotifyTest, OtherArgumentsGiveTheUsage) {
     listen();
     const std::vector<std::vector<std::string_view>> cases = {

@@ -317,6 +317,7 @@ Bytes Bus::properReplies(const BusMessage& call) {
     }
     if (call.member.starts_with("St")) {
         timer_ = call.member == "StartTransientUnit" ? calendarTime(call.body) : ~std::uint64_t{0};
+        servicesStarted_ += call.member == "StartUnit" ? 1 : 0;
         const std::string job = base::concat(kJobs, ++job_);
         appendString(body, job);
         Bytes replies = reply(call, "o", std::move(body)).encode();

@@ -54,6 +54,8 @@ class Bus : private base::NotCopied {
     /// The time that it has told last, as the time when the timer elapses; none when that was no
     /// time.
     [[nodiscard]] std::optional<std::uint64_t> toldTime() const;
+    /// Services that it has started, as one does that behaves.
+    [[nodiscard]] std::uint64_t servicesStarted() const { return servicesStarted_; }
 
   private:
     void run();
@@ -78,6 +80,7 @@ class Bus : private base::NotCopied {
     std::atomic<bool> behaves_ = true;
     std::atomic<bool> isTalkative_ = false;
     std::atomic<std::uint64_t> exchanges_ = 0;
+    std::atomic<std::uint64_t> servicesStarted_ = 0;
     std::uint32_t serial_ = 0;
     std::uint32_t job_ = 0;
     bool breaksOff_ = false;

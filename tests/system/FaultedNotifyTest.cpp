@@ -3,6 +3,7 @@
 
 #include "base/UnixAddress.h"
 #include "platform/linux/Paths.h"
+#include "tests/neighbours/Bus.h"
 #include "tests/support/SystemCallErrors.h"
 #include "tests/system/CallInjector.h"
 #include "tests/system/RelaunchFixture.h"
@@ -45,12 +46,16 @@ class FaultedNotifyTest : public RelaunchFixture {
             [handed] { handOver(handed); });
         status_ = gate.program().awaitEnd().value_or(-1);
         lines_ = gate.program().lines();
-        points_ = injector.points();
+        if (!fault && points_.empty()) {
+            points_ = injector.points();
+        }
     }
 
     /// Has `act` run with every fault, and first without one.
     void failEachCallOf(const std::string& subject,
-                        const std::function<void(const std::optional<Fault>& fault)>& act) {
+                        const std::function<void(const std::optional<Fault>& fault)>& act,
+                        std::size_t step = KSTD_FAULT_STEP) {
+        // The calls of the first run that this makes.
         act(std::nullopt);
         EXPECT_EQ(status_, 0);
         std::size_t number = 0;
@@ -58,7 +63,7 @@ class FaultedNotifyTest : public RelaunchFixture {
         for (const CallPoint& point : std::vector(points_)) {
             for (const int error : point.errors) {
                 for (const bool lasts : {false, true}) {
-                    if (number++ % KSTD_FAULT_STEP == 0) {
+                    if (number++ % step == 0) {
                         SCOPED_TRACE(point.name() + ' ' + ::strerrorname_np(error) +
                                      (lasts ? " lasting" : " once"));
                         ++tried;
@@ -169,35 +174,156 @@ class Question {
     base::FileDescriptor answers_;
 };
 
-/// There is no bus under the root, so no timer either: the helper says so.
-TEST_F(FaultedNotifyTest, HelperWithoutABus) {
-    const std::string path = real("/run/kstd/alarms.sock");
-    const base::FileDescriptor socket(
-        ::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
-    const auto address = base::UnixAddress::of(path).value();
-    const int on = 1;
-    ASSERT_EQ(::setsockopt(socket.get(), SOL_SOCKET, SO_PASSCRED, &on, sizeof on), 0);
-    ASSERT_EQ(::bind(socket.get(), address.get(), address.size()), 0);
-    const auto waits = [&socket] {
-        pollfd watched{socket.get(), POLLIN, 0};
-        return ::poll(&watched, 1, 0) > 0;
-    };
-    failEachCallOf("arm", [&](const std::optional<Fault>& fault) {
-        const Question question(path);
-        run("arm", fault, socket.get());
+/// The alarm's helper, with the socket at which it is asked.
+class FaultedHelperTest : public FaultedNotifyTest {
+  protected:
+    void SetUp() override {
+        fs::create_directories(real("/var/lib/kstd/alarms/com.zerva.alarm"));
+        fs::create_directories(fs::path(real(kBus)).parent_path());
+        const auto address = base::UnixAddress::of(path_).value();
+        const int on = 1;
+        ASSERT_EQ(::setsockopt(socket_.get(), SOL_SOCKET, SO_PASSCRED, &on, sizeof on), 0);
+        ASSERT_EQ(::bind(socket_.get(), address.get(), address.size()), 0);
+    }
+
+    void putAlarm(std::string_view line) {
+        putFile("/var/lib/kstd/alarms/com.zerva.alarm/com.zerva.kstd.alarm", bytes(line));
+    }
+
+    void arm(const std::optional<Fault>& fault) {
+        run("arm", fault, socket_.get());
         EXPECT_TRUE(status_ == 0 || status_ == 1) << status_;
+        EXPECT_TRUE(status_ == 0 || saysWhy()) << "ended with 1, and no line says why";
+    }
+
+    /// The bus, with an init system that has no timer yet.
+    [[nodiscard]] std::unique_ptr<neighbours::Bus> newBus() const {
+        fs::remove(real(kBus));
+        return std::make_unique<neighbours::Bus>(real(kBus), neighbours::Random(1), 0);
+    }
+
+    [[nodiscard]] Question ask() const { return Question(path_); }
+    [[nodiscard]] bool questionWaits() const {
+        pollfd watched{socket_.get(), POLLIN, 0};
+        return ::poll(&watched, 1, 0) > 0;
+    }
+    void dropQuestions() const {
+        char byte = 0;
+        while (::recv(socket_.get(), &byte, sizeof byte, MSG_DONTWAIT) >= 0) {
+        }
+    }
+
+  private:
+    static constexpr char kBus[] = "/run/dbus/system_bus_socket";
+
+    const std::string path_ = real("/run/kstd/alarms.sock");
+    const base::FileDescriptor socket_{
+        ::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0)};
+};
+
+using Timer = wire::AlarmAnswer::Timer;
+
+/// Each try is two helpers, which is long for every run of all tests.
+constexpr std::size_t kBusStep = KSTD_FAULT_STEP == 1 ? 1 : 5 * KSTD_FAULT_STEP;
+
+constexpr std::string_view kComes = "04102444800000000000\n";
+constexpr std::int64_t kComesAt = 4'102'444'800'000'000'000;
+constexpr std::string_view kIsDue = "01700000000000000000\n";
+constexpr std::string_view kIsCancelled = "none                \n";
+
+/// There is no bus under the root, so no timer either: the helper says so.
+TEST_F(FaultedHelperTest, WithoutABus) {
+    putAlarm(kIsDue);
+    failEachCallOf("arm", [&](const std::optional<Fault>& fault) {
+        const Question question = ask();
+        arm(fault);
         // The daemon knows, or the unit has failed with a line, or the question waits for the next.
         const auto answer = question.answer();
-        EXPECT_TRUE(answer || (status_ == 1 && saysWhy()) || waits())
+        EXPECT_TRUE(answer || status_ == 1 || questionWaits())
             << status_ << testing::PrintToString(lines_);
         if (answer) {
-            EXPECT_EQ(answer->timer, wire::AlarmAnswer::Timer::failed);
+            EXPECT_EQ(answer->timer, Timer::failed);
         }
-        if (waits()) {
-            run("arm", std::nullopt, socket.get());
+        if (questionWaits()) {
+            arm(std::nullopt);
             EXPECT_TRUE(question.answer());
         }
     });
+}
+
+/// Where the answer is that the timer waits, it does; whatever else becomes of it, a line says why
+/// or the timer waits all the same, and the next helper's does.
+TEST_F(FaultedHelperTest, MakesTheTimer) {
+    putAlarm(kComes);
+    failEachCallOf(
+        "arm an alarm",
+        [&](const std::optional<Fault>& fault) {
+            dropQuestions();
+            const auto bus = newBus();
+            const auto waits = [&bus] {
+                return bus->toldTime() == static_cast<std::uint64_t>(kComesAt / 1000);
+            };
+            const Question question = ask();
+            arm(fault);
+            const auto answer = question.answer();
+            if (answer && answer->timer == Timer::waits) {
+                EXPECT_EQ(answer->date, kComesAt);
+                EXPECT_TRUE(waits()) << "a timer of which the init system has not told";
+            } else {
+                EXPECT_TRUE(fault);
+                EXPECT_TRUE(!lines_.empty() || waits()) << "no timer, and no line says why";
+                EXPECT_TRUE(!answer || answer->timer == Timer::none || !answer->reason.empty());
+            }
+            const Question next = ask();
+            arm(std::nullopt);
+            EXPECT_EQ(status_, 0) << testing::PrintToString(lines_);
+            EXPECT_TRUE(waits()) << "no timer at the next try";
+            const auto nextAnswer = next.answer();
+            EXPECT_TRUE(nextAnswer && nextAnswer->timer == Timer::waits &&
+                        nextAnswer->date == kComesAt);
+        },
+        kBusStep);
+}
+
+TEST_F(FaultedHelperTest, TakesTheTimerAway) {
+    putAlarm(kIsCancelled);
+    failEachCallOf(
+        "arm nothing",
+        [&](const std::optional<Fault>& fault) {
+            dropQuestions();
+            const auto bus = newBus();
+            const Question question = ask();
+            arm(fault);
+            const auto answer = question.answer();
+            if (!answer || answer->timer != Timer::none) {
+                EXPECT_TRUE(fault);
+                EXPECT_TRUE(!answer || saysWhy()) << "no line says why";
+            }
+            const Question next = ask();
+            arm(std::nullopt);
+            const auto nextAnswer = next.answer();
+            EXPECT_TRUE(nextAnswer && nextAnswer->timer == Timer::none);
+        },
+        kBusStep);
+}
+
+/// Nobody asks, so it is the helper that has what is due sent. With 1 it is started again.
+TEST_F(FaultedHelperTest, FiresWhatIsDue) {
+    putAlarm(kIsDue);
+    failEachCallOf(
+        "arm what is due",
+        [&](const std::optional<Fault>& fault) {
+            const auto bus = newBus();
+            arm(fault);
+            if (status_ == 0) {
+                EXPECT_GT(bus->servicesStarted(), 0U);
+            } else {
+                arm(std::nullopt);
+                EXPECT_EQ(status_, 0) << testing::PrintToString(lines_);
+                EXPECT_GT(bus->servicesStarted(), 0U);
+            }
+        },
+        kBusStep);
 }
 
 } // namespace

@@ -63,15 +63,24 @@ Line parse(std::string_view text) {
     return {true, Date{nanoseconds}};
 }
 
-std::string readLine(const std::string& path) {
+struct Text {
+    std::string bytes;
+    /// For which there are none, or 0.
+    int error = 0;
+};
+
+Text readLine(const std::string& path) {
     // Not blocking, because opening a pipe would wait for its writer.
     const base::FileDescriptor file(
         ::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK));
     // A byte more than a line has, by which a file that goes on behind it is known.
     std::string text(kLineSize + 1, '\0');
-    const ssize_t length = file.isOpen() ? ::read(file.get(), text.data(), text.size()) : 0;
-    text.resize(length > 0 ? static_cast<std::size_t>(length) : 0);
-    return text;
+    const ssize_t length = file.isOpen() ? ::read(file.get(), text.data(), text.size()) : -1;
+    if (length < 0) {
+        return {{}, errno};
+    }
+    text.resize(static_cast<std::size_t>(length));
+    return {text};
 }
 
 // What follows gives 0, or the error for which it did not succeed.
@@ -202,9 +211,11 @@ std::vector<std::pair<std::string, Date>> AlarmStore::load(std::string_view stre
             report("no alarm of the daemon, left alone", path, {});
             continue;
         }
-        const Line line = parse(readLine(path));
+        const Text text = readLine(path);
+        const Line line = parse(text.bytes);
         if (!line.readable) {
-            report("unreadable alarm, taken as due", path, {});
+            report("unreadable alarm, taken as due", path,
+                   text.error != 0 ? reasonOf(text.error) : std::string());
         }
         if (line.readable && !line.date) {
             known_.insert_or_assign(path, std::nullopt);

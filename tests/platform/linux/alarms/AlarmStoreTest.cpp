@@ -136,6 +136,13 @@ INSTANTIATE_TEST_SUITE_P(Contents, BrokenFileTest,
                                          "99999999999999999999\n", "-1700000000000000000\n",
                                          "none\n", std::string(21, '\0')));
 
+TEST_F(AlarmStoreTest, FileThatCannotBeReadStandsForAnAlarmThatIsDueAndTheLineSaysWhy) {
+    std::filesystem::create_directories(fileOf("a"));
+    EXPECT_THAT(store.load("stream"), ElementsAre(Pair("a", Date{0})));
+    EXPECT_THAT(log.texts(), ElementsAre("kstd: AlarmStore: unreadable alarm, taken as due: " +
+                                         fileOf("a") + ": Is a directory."));
+}
+
 TEST_F(AlarmStoreTest, BrokenFileIsWholeAgainAfterTheNextRegistration) {
     put("a", std::string(100, 'x'));
     EXPECT_TRUE(store.save("stream", "a", {7}));
