@@ -74,7 +74,7 @@ void Keystrand::start() {
 }
 
 void Keystrand::said(LockState::Said said) {
-    sleepAgainAt_.reset();
+    const bool isAlone = std::exchange(alone_, std::nullopt).has_value();
     switch (said) {
     case LockState::Said::locked:
         setLocked(true);
@@ -95,6 +95,9 @@ void Keystrand::said(LockState::Said said) {
             base::concat("keystrand: nobody tells whether the machine is locked; it counts as ",
                          locked_ ? "locked" : "unlocked, for a minute"));
         break;
+    }
+    if (isAlone) {
+        stayAwake();
     }
     parts_.rearm();
 }
@@ -117,10 +120,11 @@ void Keystrand::setLocked(bool locked) {
 }
 
 void Keystrand::goToSleep() {
-    if (!std::exchange(sleeping_, true)) {
-        wasRestricted_ = model_.timer().restricted();
-    }
     model_.lock();
+    if (!std::exchange(sleeping_, true)) {
+        const std::uint64_t alarm = model_.timer().timerRestarted().alarm;
+        alarmAt_ = alarm != 0 ? std::optional(clock_.whenIs(alarm)) : std::nullopt;
+    }
     update();
     parts_.lockState.closed();
 }
@@ -129,18 +133,40 @@ void Keystrand::wakeUp() {
     if (!std::exchange(sleeping_, false)) {
         return;
     }
+    // Later than that somebody has woken a machine that its alarm could not wake.
+    const bool wokeForAlarm = alarmAt_ && *alarmAt_ <= now() && now() <= *alarmAt_ + kLongestWaking;
     clockWasSet();
-    if (!locked_) {
+    if (!locked_ && !wokeForAlarm) {
         setLocked(false);
         return;
     }
     model_.catchUp();
     update();
-    // The period's end is what the alarm was for; nobody needs the machine awake. It may have been
-    // seen before anybody said that the machine is awake.
-    if (!wasRestricted_ && model_.timer().restricted()) {
-        sleepAgainAt_ = now() + kAwakeForNothing;
+    if (wokeForAlarm) {
+        // Nobody needs it awake. Where nobody has locked it either, it is not unlocked for that
+        // while: its next sleep would begin another period, with another alarm.
+        alone_ = Alone{.until = now() + kAwakeForNothing, .isAsked = false};
     }
+}
+
+/// Whatever was waited for, there is somebody.
+void Keystrand::stayAwake() {
+    if (!locked_ && !sleeping_) {
+        setLocked(false);
+    }
+}
+
+void Keystrand::sleepAgain() {
+    const bool isAsked = alone_->isAsked;
+    alone_.reset();
+    if (isAsked) {
+        stayAwake();
+        return;
+    }
+    parts_.log.write(GateLine::lockState, "keystrand: the machine woke for the end of the period "
+                                          "alone and is asked to sleep again");
+    parts_.sleepAgain();
+    alone_ = Alone{.until = now() + kAwakeForNothing, .isAsked = true};
 }
 
 void Keystrand::readSwitches() {
@@ -193,18 +219,15 @@ void Keystrand::wake() {
     if (gate_.nextLook().value_or(kNever) <= present) {
         gate_.look();
     }
-    if (sleepAgainAt_ && *sleepAgainAt_ <= present) {
-        sleepAgainAt_.reset();
-        parts_.log.write(GateLine::lockState, "keystrand: the machine woke for the end of the "
-                                              "period alone and is asked to sleep again");
-        parts_.sleepAgain();
+    if (alone_ && alone_->until <= present) {
+        sleepAgain();
     }
     parts_.rearm();
 }
 
 BootTime Keystrand::nextWake() const {
     return std::min({clock_.whenIs(model_.nextDeadline()), gate_.nextLook().value_or(kNever),
-                     openUntil_.value_or(kNever), sleepAgainAt_.value_or(kNever)});
+                     openUntil_.value_or(kNever), alone_ ? alone_->until : kNever});
 }
 
 void Keystrand::clockWasSet() {
@@ -221,7 +244,9 @@ void Keystrand::clockWasSet() {
 }
 
 void Keystrand::openFor(std::chrono::seconds time) {
-    sleepAgainAt_.reset();
+    if (std::exchange(alone_, std::nullopt)) {
+        stayAwake();
+    }
     if (time.count() == 0 && !openUntil_) {
         return;
     }

@@ -92,12 +92,16 @@ class Keystrand : private base::NotCopied {
   private:
     /// How long a machine stays awake that only its alarm woke.
     static constexpr BootTime kAwakeForNothing = std::chrono::seconds(30);
+    /// How long after its alarm a machine may be awake that the alarm has woken.
+    static constexpr BootTime kLongestWaking = std::chrono::minutes(2);
     static constexpr RestrictedModeTimer::Seconds kPatience = 60;
 
     void said(LockState::Said said);
     void setLocked(bool locked);
     void goToSleep();
     void wakeUp();
+    void stayAwake();
+    void sleepAgain();
     void readSwitches();
     /// The gate as everything that is known wants it.
     void update();
@@ -120,8 +124,8 @@ class Keystrand : private base::NotCopied {
 
     bool locked_ = true;
     bool sleeping_ = false;
-    /// When it went to sleep.
-    bool wasRestricted_ = false;
+    /// Of the sleep that began last; none when it was restricted already.
+    std::optional<BootTime> alarmAt_;
     /// Neither a daemon nor an unlock has said yet what holds.
     bool starting_ = true;
     bool sawUnlock_ = false;
@@ -132,7 +136,12 @@ class Keystrand : private base::NotCopied {
     bool droppedFigures_ = false;
     bool wasSwitchedOff_ = false;
     std::optional<BootTime> openUntil_;
-    std::optional<BootTime> sleepAgainAt_;
+    /// Awake for the alarm alone: until when it is waited for somebody, and then for sleep.
+    struct Alone {
+        BootTime until;
+        bool isAsked;
+    };
+    std::optional<Alone> alone_;
 };
 
 } // namespace keystrand::usb

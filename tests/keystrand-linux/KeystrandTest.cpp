@@ -356,6 +356,82 @@ TEST_F(KeystrandTest, MachineWhoseAlarmIsSeenBeforeTheWordSleepsAgain) {
     EXPECT_EQ(asleepAgain, 1);
 }
 
+TEST_F(KeystrandTest, MachineThatNobodyLockedSleepsAgainToo) {
+    begin();
+    sessions.say(Said::goingToSleep);
+    clocks.pass(3600s);
+    sessions.say(Said::unlocked);
+    sessions.say(Said::awake);
+    EXPECT_TRUE(isClosed());
+    pass(30s);
+    EXPECT_EQ(asleepAgain, 1);
+    acknowledge();
+    sessions.say(Said::goingToSleep);
+    // No other alarm wakes it.
+    EXPECT_FALSE(waitingState());
+    clocks.pass(3600s);
+    sessions.say(Said::unlocked);
+    sessions.say(Said::awake);
+    EXPECT_FALSE(isClosed());
+    pass(100s);
+    EXPECT_EQ(asleepAgain, 1);
+}
+
+TEST_F(KeystrandTest, MachineThatCannotSleepAgainIsUnlockedAsItWas) {
+    begin();
+    sessions.say(Said::goingToSleep);
+    clocks.pass(3600s);
+    sessions.say(Said::awake);
+    pass(30s);
+    EXPECT_EQ(asleepAgain, 1);
+    pass(29s);
+    EXPECT_TRUE(isClosed());
+    pass(1s);
+    EXPECT_FALSE(isClosed());
+    pass(3600s);
+    EXPECT_FALSE(isClosed());
+    EXPECT_EQ(asleepAgain, 1);
+}
+
+TEST_F(KeystrandTest, AnythingSaidEndsTheWaitForSleep) {
+    for (const Said said : {Said::awake, Said::away, Said::unlocked}) {
+        begin();
+        sessions.say(Said::goingToSleep);
+        clocks.pass(3600s);
+        sessions.say(Said::awake);
+        EXPECT_TRUE(isClosed());
+        sessions.say(said);
+        EXPECT_FALSE(isClosed());
+        pass(60s);
+        EXPECT_EQ(asleepAgain, 0);
+    }
+}
+
+TEST_F(KeystrandTest, MachineThatAnAdministratorOpensStaysAwake) {
+    begin();
+    sessions.say(Said::goingToSleep);
+    clocks.pass(3600s);
+    sessions.say(Said::awake);
+    keystrand->openFor(60s);
+    pass(60s);
+    EXPECT_EQ(asleepAgain, 0);
+    EXPECT_FALSE(isClosed());
+}
+
+TEST_F(KeystrandTest, MachineThatIsWokenLongAfterItsAlarmStaysAwake) {
+    for (const auto& [slept, asked] : {std::pair(3599s, 0), {3600s, 1}, {3720s, 1}, {3721s, 0}}) {
+        begin();
+        asleepAgain = 0;
+        sessions.say(Said::locked);
+        sessions.say(Said::goingToSleep);
+        clocks.pass(slept);
+        sessions.say(Said::awake);
+        pass(30s);
+        EXPECT_EQ(asleepAgain, asked) << slept.count();
+        sessions.say(Said::unlocked);
+    }
+}
+
 TEST_F(KeystrandTest, MachineThatSomebodyUsesStaysAwake) {
     begin();
     sessions.say(Said::locked);
