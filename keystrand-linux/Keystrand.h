@@ -93,7 +93,7 @@ class Keystrand : private base::NotCopied {
     /// How long a machine stays awake that only its alarm woke.
     static constexpr BootTime kAwakeForNothing = std::chrono::seconds(30);
     /// How long after its alarm a machine may be awake that the alarm has woken.
-    static constexpr BootTime kLongestWaking = std::chrono::minutes(2);
+    static constexpr BootTime kLongestWaking = std::chrono::minutes(5);
     static constexpr RestrictedModeTimer::Seconds kPatience = 60;
 
     void said(LockState::Said said);
