@@ -37,6 +37,8 @@ void runLibrary(const RunOptions& options);
 void runBus(const RunOptions& options);
 /// A kernel side with hostile clients.
 void runClients(const RunOptions& options);
+/// Keystrand for Linux with hostile tools, and hostile words about sessions.
+void runGate(const RunOptions& options);
 /// Daemons, one after the other, whose neighbours all behave.
 void runSoak(const RunOptions& options);
 

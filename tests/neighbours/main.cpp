@@ -19,12 +19,12 @@ int main(int argc, char** argv) {
         {"events", neighbours::runEvents},      {"kernel", neighbours::runKernelSide},
         {"https", neighbours::runHTTPSProcess}, {"bus", neighbours::runBus},
         {"library", neighbours::runLibrary},    {"clients", neighbours::runClients},
-        {"soak", neighbours::runSoak}};
+        {"gate", neighbours::runGate},          {"soak", neighbours::runSoak}};
     std::string name;
     neighbours::RunOptions options;
     options.daemon = KSTD_DEV;
     CLI::App app("Puts programs of the tree among hostile neighbours, or friendly ones for long.");
-    app.add_option("run", name, "events, kernel, https, library, bus, clients or soak")
+    app.add_option("run", name, "events, kernel, https, library, bus, clients, gate or soak")
         ->required()
         ->check(CLI::IsMember(runs));
     app.add_option("--count", options.count, "How many exchanges, or notifications of a soak");
