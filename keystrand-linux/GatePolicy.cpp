@@ -115,6 +115,29 @@ void GatePolicy::open() {
     }
 }
 
+void GatePolicy::takeOver(const BusView& view, BootTime now) {
+    state_ = {.phase = Phase::closed};
+    if (isClosed(view.parameter)) {
+        state_.parameter = WrittenDefault{
+            .before = kAsTheControllerHasIt, .written = view.parameter, .confirmed = true};
+    }
+    for (const RootHub& hub : view.rootHubs) {
+        if (isClosed(hub.authorizedDefault)) {
+            state_.hubs.push_back({.bus = hub.bus,
+                                   .inode = hub.inode,
+                                   .value = {.before = kEverybody,
+                                             .written = hub.authorizedDefault,
+                                             .confirmed = true}});
+        }
+    }
+    for (const UsbDevice& device : view.devices) {
+        state_.devices.push_back(
+            {.attachment = device.attachment,
+             .standing = device.authorized ? Standing::attached : Standing::refused,
+             .since = now});
+    }
+}
+
 /// What failed the other way may work this way.
 void GatePolicy::tryAgain() {
     if (state_.parameter) {
@@ -232,12 +255,12 @@ GatePolicy::Actions GatePolicy::closeDefaults(const BusView& view, BootTime now)
 }
 
 WrittenHub GatePolicy::closedHub(const RootHub& hub, AuthorizedDefault before) const {
-    const bool isClosed = isAsStrict(hub.authorizedDefault, closing_);
+    const bool isStrict = isAsStrict(hub.authorizedDefault, closing_);
     return {.bus = hub.bus,
             .inode = hub.inode,
             .value = {.before = before,
-                      .written = isClosed ? hub.authorizedDefault : closing_,
-                      .confirmed = isClosed}};
+                      .written = isStrict ? hub.authorizedDefault : closing_,
+                      .confirmed = isStrict}};
 }
 
 std::optional<GateAction> GatePolicy::decideKnown(KnownDevice& known, const UsbDevice& device,

@@ -171,6 +171,10 @@ class GatePolicy {
     /// Puts everything back. Nothing when it is open.
     void open();
 
+    /// Takes all that reads closed, and each device that is out, for this service's own, whoever
+    /// that was, so that `open` opens it. The gate is closed then.
+    void takeOver(const BusView& view, BootTime now);
+
     /// Of what is in, whatever `isKnown` does not know goes, but for hard-wired ports and
     /// keyboards. What it knows comes in, if it was refused or comes within kReturnTime. For a
     /// closed gate.

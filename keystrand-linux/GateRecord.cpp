@@ -95,6 +95,8 @@ bool takeGateLine(GateRecord& record, LineWords line) {
         record.service.restricted = true;
     } else if (what == "starting") {
         record.service.starting = true;
+    } else if (what == "replaces-lost") {
+        record.replacesLost = true;
     } else if (what == "open-until") {
         record.service.openUntil = BootTime(line.number<BootTime::rep>());
     } else if (what == "parameter") {
@@ -142,6 +144,9 @@ std::string encodeGateRecord(const GateRecord& record) {
     if (record.service.openUntil) {
         text +=
             base::concat("open-until ", std::to_string(record.service.openUntil->count()), '\n');
+    }
+    if (record.replacesLost) {
+        text += "replaces-lost\n";
     }
     if (record.gate.parameter) {
         text += base::concat("parameter ", words(*record.gate.parameter), '\n');

@@ -24,6 +24,8 @@ struct GateRecord {
         bool operator==(const Service&) const = default;
     };
     Service service = {};
+    /// There was one before that nobody could read: who closed what it is about is not known.
+    bool replacesLost = false;
 
     bool operator==(const GateRecord&) const = default;
 };

@@ -1,5 +1,7 @@
 #include "keystrand-linux/GateSocket.h"
 
+#include "base/Concat.h"
+
 #include <algorithm>
 #include <array>
 #include <cerrno>
@@ -41,6 +43,15 @@ wire::GateAnswer devices(Keystrand& keystrand, const MachineClock& clock) {
     return devices;
 }
 
+/// What is open or closed against all that holds.
+std::string gapOf(Keystrand& keystrand, const Keystrand::Status& status) {
+    const std::string lost = keystrand.gate().closedByNobodyKnows();
+    return lost.empty() ? status.gap
+                        : base::concat(status.gap, status.gap.empty() ? "" : ", ", lost,
+                                       " (who closed it is not known any more: keystrand --restore "
+                                       "--all opens it)");
+}
+
 wire::GateAnswer status(Keystrand& keystrand) {
     const Keystrand::Status status = keystrand.status();
     return wire::GateStatus{
@@ -58,7 +69,7 @@ wire::GateAnswer status(Keystrand& keystrand) {
         .untilClosed =
             status.untilClosed ? std::optional(secondsOf(*status.untilClosed)) : std::nullopt,
         .refused = static_cast<std::uint32_t>(keystrand.gate().countRefused()),
-        .gap = status.gap};
+        .gap = gapOf(keystrand, status)};
 }
 
 } // namespace

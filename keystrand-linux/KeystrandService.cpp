@@ -13,7 +13,6 @@
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <system_error>
-#include <thread>
 #include <unistd.h>
 #include <utility>
 #include <vector>
@@ -234,38 +233,50 @@ void KeystrandService::arm() {
     }
 }
 
-bool KeystrandService::restore(const std::string& root, GateLog& log) {
+bool KeystrandService::restore(const std::string& root, Restored what, const MachineClock& clock,
+                               GateLog& log) {
     const auto loop = EventLoop::create();
     if (!loop) {
         log.write(GateLine::writeFailed, "keystrand: cannot make an event loop");
         return false;
     }
-    const SystemClocks clocks;
     SysfsUsbBus bus(*loop, root, log, systemUnder(root));
     const StateFile record = recordUnder(root);
     const StateFile devices(underRoot(root, kDevices), StateFile::Durability::synced);
+    GateRules rules = readGateConfiguration(root).settings.rules;
+    if (what == Restored::all) {
+        rules.onUnlock = OnUnlock::accept;
+    }
     UsbGate gate({.bus = bus,
                   .record = record,
                   .devices = devices,
                   .log = log,
-                  .now = [&] { return clocks.sinceStart(); },
+                  .now = [&] { return clock.sinceStart(); },
                   .rearm =
                       [] {
                       }},
-                 readGateConfiguration(root).settings.rules);
+                 rules);
     const auto left = gate.resume();
-    if (!left || left->gate == GateState()) {
+    bool isOpen = true;
+    if (what == Restored::all) {
+        gate.takeOver();
+    }
+    const bool isLeft = what == Restored::all || (left && left->gate != GateState());
+    if (isLeft) {
+        isOpen = gate.restore([&](BootTime until) { loop->turn(until - clock.sinceStart()); });
+    }
+    if (const std::string lost = gate.closedByNobodyKnows(); !lost.empty()) {
+        log.write(GateLine::writeFailed, base::concat("keystrand: cannot open ", lost,
+                                                      ": who closed it is not known any more"));
+        isOpen = false;
+    } else if (!isLeft) {
         log.write(GateLine::opened, "keystrand: there is nothing to be put back");
-        return true;
     }
-    gate.setClosed(false);
-    if (gate.isOpen()) {
-        // What the kernel refused at the last moment mostly comes within that time.
-        std::this_thread::sleep_for(std::chrono::seconds(3));
-    }
-    gate.look();
     std::string problem;
-    return gate.isOpen() && record.remove(problem);
+    if (isOpen && !record.remove(problem)) {
+        log.write(GateLine::recordFailed, base::concat("keystrand: ", problem));
+    }
+    return isOpen && problem.empty();
 }
 
 } // namespace keystrand::usb

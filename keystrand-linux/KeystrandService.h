@@ -34,9 +34,13 @@ class KeystrandService {
     /// while it waits: nothing hangs then, and nothing has to wake up only to say so.
     static void watchWork(EventLoop& loop);
 
+    enum class Restored : bool { whatWasClosed, all };
     /// Puts back what a service that is not there any more has written, and lets in what it
-    /// refused. False, with lines that say why, when something could not be put back.
-    [[nodiscard]] static bool restore(const std::string& root, GateLog& log);
+    /// refused, for as long as something of that may come late: ten seconds, or twenty when the
+    /// kernel does not take it at once. Or opens all, whoever has closed it. False, with lines that
+    /// say why, when something could not be opened.
+    [[nodiscard]] static bool restore(const std::string& root, Restored what,
+                                      const MachineClock& clock, GateLog& log);
 
   private:
     struct Sockets {

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <csignal>
 #include <system_error>
 #include <unistd.h>
 
@@ -9,8 +10,16 @@ namespace keystrand::usb {
 
 namespace {
 
+constexpr std::chrono::nanoseconds kInterruptEach = std::chrono::milliseconds(5);
+
+timespec timespecOf(std::chrono::nanoseconds time) {
+    const auto seconds = std::chrono::floor<std::chrono::seconds>(time);
+    return {.tv_sec = seconds.count(), .tv_nsec = (time - seconds).count()};
+}
+
 /// The error's number, or 0.
-int readToTheEnd(int fd, std::size_t limit, std::string& bytes) {
+int readToTheEnd(int fd, std::size_t limit, std::string& bytes,
+                 std::optional<ReadDeadline> until = std::nullopt) {
     constexpr std::size_t kPiece = 4096;
     for (;;) {
         const std::size_t before = bytes.size();
@@ -18,6 +27,9 @@ int readToTheEnd(int fd, std::size_t limit, std::string& bytes) {
         const ssize_t count = ::read(fd, bytes.data() + before, bytes.size() - before);
         const int error = count < 0 ? errno : 0;
         bytes.resize(before + static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
+        if (error == EINTR && until && std::chrono::steady_clock::now() >= *until) {
+            return ETIMEDOUT;
+        }
         if (error != 0 && error != EINTR) {
             return error;
         }
@@ -30,12 +42,11 @@ int readToTheEnd(int fd, std::size_t limit, std::string& bytes) {
     }
 }
 
-} // namespace
-
-SmallFile readSmallFile(int directory, const std::string& path, std::size_t limit) {
+SmallFile readFile(int directory, const char* path, std::size_t limit,
+                   std::optional<ReadDeadline> until = std::nullopt) {
     SmallFile file;
     const base::FileDescriptor fd(
-        ::openat(directory, path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+        ::openat(directory, path, O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
     if (!fd.isOpen() || ::fstat(fd.get(), &file.status) != 0) {
         file.error = errno;
         return file;
@@ -44,11 +55,54 @@ SmallFile readSmallFile(int directory, const std::string& path, std::size_t limi
         file.error = S_ISDIR(file.status.st_mode) ? EISDIR : EINVAL;
         return file;
     }
-    file.error = readToTheEnd(fd.get(), limit, file.bytes);
+    file.error = readToTheEnd(fd.get(), limit, file.bytes, until);
     if (file.error != 0) {
         file.bytes.clear();
     }
     return file;
+}
+
+} // namespace
+
+SmallFile readSmallFile(int directory, const std::string& path, std::size_t limit) {
+    return readFile(directory, path.c_str(), limit);
+}
+
+SmallFile readSmallFileUntil(int directory, const char* name, std::size_t limit,
+                             ReadDeadline until) {
+    if (std::chrono::steady_clock::now() >= until) {
+        SmallFile file;
+        file.error = ETIMEDOUT;
+        return file;
+    }
+    const Interruptions interruptions(until);
+    return readFile(directory, name, limit, until);
+}
+
+Interruptions::Interruptions(ReadDeadline from) {
+    // It stays: one that is late does no harm.
+    struct sigaction action {};
+    action.sa_handler = [](int) {
+    };
+    static_cast<void>(::sigaction(SIGALRM, &action, nullptr));
+    sigevent event{};
+    event.sigev_notify = SIGEV_SIGNAL;
+    event.sigev_signo = SIGALRM;
+    timer_t timer{};
+    if (::timer_create(CLOCK_MONOTONIC, &event, &timer) != 0) {
+        return;
+    }
+    timer_ = timer;
+    // The first one may come before the call that it is meant for.
+    const itimerspec times{.it_interval = timespecOf(kInterruptEach),
+                           .it_value = timespecOf(from.time_since_epoch())};
+    static_cast<void>(::timer_settime(timer, TIMER_ABSTIME, &times, nullptr));
+}
+
+Interruptions::~Interruptions() {
+    if (timer_) {
+        static_cast<void>(::timer_delete(*timer_));
+    }
 }
 
 int writeAttribute(int directory, const char* name, std::string_view text) {

@@ -1,9 +1,13 @@
 #pragma once
 
 #include "base/FileDescriptor.h"
+#include "base/NotCopied.h"
 
+#include <chrono>
 #include <cstddef>
+#include <ctime>
 #include <fcntl.h>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <sys/stat.h>
@@ -32,6 +36,26 @@ struct SmallFile {
 [[nodiscard]] inline SmallFile readSmallFile(const std::string& path, std::size_t limit) {
     return readSmallFile(AT_FDCWD, path, limit);
 }
+
+/// Until when a read may wait.
+using ReadDeadline = std::chrono::steady_clock::time_point;
+
+/// While it lives, and from a moment on, whatever the thread waits for inside the kernel is
+/// interrupted again and again, where it can be: the call ends with EINTR. One at a time, in a
+/// program of one thread.
+class Interruptions : private base::NotCopied {
+  public:
+    explicit Interruptions(ReadDeadline from);
+    ~Interruptions();
+
+  private:
+    std::optional<timer_t> timer_;
+};
+
+/// The same of a file on which the kernel may have its reader wait as long as it is busy. ETIMEDOUT
+/// when it still was at that time, and at once when the time is over.
+[[nodiscard]] SmallFile readSmallFileUntil(int directory, const char* name, std::size_t limit,
+                                           ReadDeadline until);
 
 /// Writes the text with one call into a file that is there already. The error's number, or 0.
 [[nodiscard]] int writeAttribute(int directory, const char* name, std::string_view text);

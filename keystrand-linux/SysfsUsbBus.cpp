@@ -60,16 +60,17 @@ bool isPort(std::string_view name) {
     }
 }
 
+std::string withoutNewline(std::string text) {
+    if (text.ends_with('\n')) {
+        text.pop_back();
+    }
+    return text;
+}
+
 /// The text of an attribute; none when it is not there.
 std::optional<std::string> attribute(int directory, const char* name) {
     SmallFile file = readSmallFile(directory, name, kAttributeLimit);
-    if (!file.isRead()) {
-        return std::nullopt;
-    }
-    if (file.bytes.ends_with('\n')) {
-        file.bytes.pop_back();
-    }
-    return std::move(file.bytes);
+    return file.isRead() ? std::optional(withoutNewline(std::move(file.bytes))) : std::nullopt;
 }
 
 template <typename Number>
@@ -129,11 +130,13 @@ SysfsUsbBus::SysfsUsbBus(EventLoop& loop, std::string root, GateLog& log, System
 std::optional<BusView> SysfsUsbBus::look(std::string& problem) {
     auto view = glance(problem);
     if (view) {
+        const ReadDeadline until = std::chrono::steady_clock::now() + kPatienceWithAll;
         // One that goes while it is read is not there any more.
-        std::erase_if(view->devices, [this](UsbDevice& device) { return !readWhatItSays(device); });
+        std::erase_if(view->devices,
+                      [&](UsbDevice& device) { return !readWhatItSays(device, until); });
         said_.clear();
         for (const UsbDevice& device : view->devices) {
-            if (device.functions.understood) {
+            if (device.functions.understood && device.saidAll) {
                 said_.emplace(device.attachment, device);
             }
         }
@@ -242,9 +245,8 @@ std::optional<UsbDevice> SysfsUsbBus::readDevice(const std::string& name) const 
                      .authorized = *authorized != 0};
 }
 
-/// False when it is not the one that was seen any more. The kernel holds some of this back while it
-/// is busy with the device, or with one behind it.
-bool SysfsUsbBus::readWhatItSays(UsbDevice& device) const {
+/// False when it is not the one that was seen any more.
+bool SysfsUsbBus::readWhatItSays(UsbDevice& device, ReadDeadline until) const {
     if (const auto said = said_.find(device.attachment); said != said_.end()) {
         const bool authorized = device.authorized;
         device = said->second;
@@ -253,14 +255,24 @@ bool SysfsUsbBus::readWhatItSays(UsbDevice& device) const {
     }
     const base::FileDescriptor directory = openDirectory(directoryOf(device.port()));
     const int fd = directory.get();
-    const SmallFile descriptors = readSmallFile(fd, "descriptors", kDescriptorsLimit);
-    const std::span bytes(reinterpret_cast<const std::uint8_t*>(descriptors.bytes.data()),
-                          descriptors.bytes.size());
+    const ReadDeadline ours = std::min(until, std::chrono::steady_clock::now() + kPatience);
+    const auto readText = [&](const char* name, std::size_t limit) {
+        SmallFile file = device.saidAll ? system_.read(fd, name, limit, ours) : SmallFile();
+        device.saidAll = device.saidAll && file.error != ETIMEDOUT;
+        return std::move(file.bytes);
+    };
+    const auto readLine = [&](const char* name) {
+        return withoutNewline(readText(name, kAttributeLimit));
+    };
     device.vendor = identifier(fd, "idVendor");
     device.product = identifier(fd, "idProduct");
-    device.manufacturer = attribute(fd, "manufacturer").value_or("");
-    device.name = attribute(fd, "product").value_or("");
-    device.serial = attribute(fd, "serial").value_or("");
+    // What is decided by comes first: the kernel hardly ever holds it back.
+    const std::string descriptors = readText("descriptors", kDescriptorsLimit);
+    const std::span bytes(reinterpret_cast<const std::uint8_t*>(descriptors.data()),
+                          descriptors.size());
+    device.serial = readLine("serial");
+    device.manufacturer = readLine("manufacturer");
+    device.name = readLine("product");
     device.descriptorsHash = hashOfDescriptors(bytes);
     device.functions = readDescriptors(bytes);
     // What the kernel itself goes by. "removable" also says what the hub above says about its

@@ -6,6 +6,8 @@
 #include "keystrand-linux/UsbBus.h"
 #include "keystrand-linux/UsbEvents.h"
 
+#include <chrono>
+#include <cstddef>
 #include <functional>
 #include <map>
 #include <optional>
@@ -21,15 +23,24 @@ namespace keystrand::usb {
 /// when another one is at its port already. `inUse` is what DevicesInUse says.
 ///
 /// What a device says about itself is read once: it does not change as long as the device is there.
+/// While the kernel sets a device up, or one behind a hub, it has whoever reads that wait: nobody
+/// waits longer than kPatience for a device, nor longer than kPatienceWithAll in one look.
 ///
 /// A sysfs that cannot be written is one that cannot be guarded: `look` says so.
 class SysfsUsbBus : public UsbBus {
   public:
+    static constexpr std::chrono::milliseconds kPatience{50};
+    static constexpr std::chrono::milliseconds kPatienceWithAll{500};
+
     /// Where a test puts something of its own.
     struct System {
         /// Writes an attribute in an open directory; the error's number, or 0.
         std::function<int(int directory, const char* attribute, std::string_view text)> write =
             writeAttribute;
+        /// Reads what a device says, as `readSmallFileUntil` does.
+        std::function<SmallFile(int directory, const char* attribute, std::size_t limit,
+                                ReadDeadline until)>
+            read = readSmallFileUntil;
         OpenDiskAlone openAlone = openDiskAlone;
         std::function<base::FileDescriptor(std::string& problem)> openEvents = openKernelEvents;
     };
@@ -52,7 +63,7 @@ class SysfsUsbBus : public UsbBus {
     [[nodiscard]] int readNames(std::vector<std::string>& names, std::string& problem) const;
     [[nodiscard]] std::optional<RootHub> readRootHub(const std::string& name) const;
     [[nodiscard]] std::optional<UsbDevice> readDevice(const std::string& name) const;
-    [[nodiscard]] bool readWhatItSays(UsbDevice& device) const;
+    [[nodiscard]] bool readWhatItSays(UsbDevice& device, ReadDeadline until) const;
     [[nodiscard]] GateOutcome writeDefault(int directory, AuthorizedDefault value) const;
     [[nodiscard]] GateOutcome writeDevice(const base::FileDescriptor& directory,
                                           bool authorized) const;

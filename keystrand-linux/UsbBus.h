@@ -18,11 +18,11 @@ class UsbBus : private base::NotCopied {
     /// What is there now; none, with the reason for people in `problem`, where it cannot be read or
     /// nothing could be written. A machine without USB has a view that says so, and a reason, too.
     /// A device that goes while it is read is not in it; one whose descriptors cannot be read is,
-    /// with nothing understood.
+    /// with nothing understood. What a device says is waited for only shortly: one that hangs, or
+    /// one that hangs behind a hub, has then not said all.
     [[nodiscard]] virtual std::optional<BusView> look(std::string& problem) = 0;
     /// The same, but nothing of what a device says about itself: of each its attachment and whether
-    /// it is in. A device that hangs, or one that hangs behind a hub, can have `look` wait for
-    /// seconds; never this.
+    /// it is in. Never waits.
     [[nodiscard]] virtual std::optional<BusView> glance(std::string& problem) = 0;
 
     /// Writes, and reads back what is there then, whether the write failed or not.

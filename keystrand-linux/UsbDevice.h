@@ -18,6 +18,11 @@ inline constexpr AuthorizedDefault kHardWiredOnly = 2;
 /// The kernel's parameter only: each root hub as its controller has it.
 inline constexpr AuthorizedDefault kAsTheControllerHasIt = -1;
 
+/// Whether a root hub that reads this refuses whom the kernel's own default lets in.
+[[nodiscard]] constexpr bool isClosed(AuthorizedDefault value) {
+    return value == kNobody || value == kHardWiredOnly;
+}
+
 /// One time that a device was plugged in. The port alone names a place, the device's number comes
 /// back after 127 others, and the directory's inode makes the pair unique within a start of the
 /// machine.
@@ -45,6 +50,8 @@ struct UsbDevice {
     /// Of all its descriptors as they were read.
     std::uint64_t descriptorsHash = 0;
     UsbFunctions functions;
+    /// False as long as the kernel is busy with it: some of this cannot be had then, and is empty.
+    bool saidAll = true;
     bool authorized = false;
     /// The firmware says that its port is inside the machine.
     bool hardWired = false;

@@ -20,6 +20,12 @@ constexpr int kMostRounds = 64;
 /// Until a bus that could not be looked at is looked at again.
 constexpr BootTime kBlindTime = std::chrono::minutes(1);
 
+/// So long, and once more for what the kernel did not take, something may come late.
+constexpr BootTime kRestoreTime = 2 * GatePolicy::kLateTime;
+
+/// So long a start of the machine waits for what devices say.
+constexpr BootTime kSetUpTime = std::chrono::seconds(5);
+
 /// More than fit into a line nobody wants to read.
 constexpr std::size_t kMostClasses = 50;
 
@@ -62,6 +68,12 @@ std::string_view reasonFor(Standing standing) {
     }
 }
 
+/// Whether there is a device that has not said all.
+bool isBusy(const BusView& view) {
+    return std::any_of(view.devices.begin(), view.devices.end(),
+                       [](const UsbDevice& device) { return !device.saidAll; });
+}
+
 } // namespace
 
 std::string classesOf(const UsbFunctions& functions, char between) {
@@ -77,9 +89,10 @@ std::string classesOf(const UsbFunctions& functions, char between) {
 }
 
 std::string describe(const UsbDevice& device) {
-    std::string text = base::concat(device.port(), " (", hexOfTwoBytes(device.vendor), ':',
-                                    hexOfTwoBytes(device.product), ' ', quoted(device.manufacturer),
-                                    ' ', quoted(device.name));
+    std::string text = base::concat(
+        device.port(), " (", hexOfTwoBytes(device.vendor), ':', hexOfTwoBytes(device.product), ' ',
+        device.saidAll ? base::concat(quoted(device.manufacturer), ' ', quoted(device.name))
+                       : "busy");
     if (!device.serial.empty()) {
         text += base::concat(", serial ", quoted(device.serial));
     }
@@ -100,12 +113,16 @@ std::optional<GateRecord> UsbGate::resume() {
     const auto text = parts_.record.read(problem);
     auto record = text ? decodeGateRecord(*text) : std::nullopt;
     if (!record && (text || !problem.empty())) {
-        parts_.log.write(GateLine::recordFailed,
-                         base::concat("keystrand: ", parts_.record.path(), ": ",
-                                      problem.empty() ? "not a record of the gate" : problem,
-                                      "; what is attached counts as accepted"));
+        parts_.log.write(
+            GateLine::recordFailed,
+            base::concat("keystrand: ",
+                         problem.empty()
+                             ? base::concat(parts_.record.path(), ": not a record of the gate")
+                             : problem,
+                         "; what is attached counts as accepted, and what reads closed stays so: "
+                         "keystrand --restore --all opens it"));
     }
-    record_ = record.value_or(GateRecord());
+    record_ = record.value_or(GateRecord{.replacesLost = text || !problem.empty()});
     toldClosed_ = record_.gate.phase != GateState::Phase::open;
     savedRecord_ = record ? *text : std::string();
     policy_.resume(record_.gate);
@@ -163,18 +180,27 @@ void UsbGate::keepOnlyKnown() {
     const auto text = parts_.devices.read(problem);
     const auto known = text ? decodeKnownDevices(*text) : std::nullopt;
     if (!known) {
-        parts_.log.write(GateLine::recordFailed,
-                         base::concat("keystrand: ", parts_.devices.path(), ": ",
-                                      !problem.empty() ? problem
-                                      : text           ? "not a list of devices"
-                                                       : "there is none",
-                                      "; what is attached counts as accepted"));
+        parts_.log.write(
+            GateLine::recordFailed,
+            base::concat("keystrand: ",
+                         !problem.empty()
+                             ? problem
+                             : base::concat(parts_.devices.path(),
+                                            text ? ": not a list of devices" : ": there is none"),
+                         "; what is attached counts as accepted"));
         return;
     }
-    if (const auto view = lookAtBus()) {
+    auto view = lookAtBus();
+    // One that has not said all is not known. The kernel sets up what it has just found.
+    const BootTime end = parts_.now() + kSetUpTime;
+    for (int again = 0; again < kMostRounds && view && isBusy(*view) && parts_.now() < end;
+         ++again) {
+        view = lookAtBus();
+    }
+    if (view) {
         policy_.keepOnly(
             [known = *known](const UsbDevice& device) {
-                return known.contains(acrossStarts(device));
+                return device.saidAll && known.contains(acrossStarts(device));
             },
             *view, parts_.now());
         settle();
@@ -215,7 +241,58 @@ void UsbGate::look() {
         if (const auto view = lookAtBus()) {
             saveDevices(*view);
         }
+        parts_.rearm();
     }
+}
+
+void UsbGate::takeOver() {
+    if (const auto view = lookAtBus()) {
+        policy_.takeOver(*view, parts_.now());
+        watchAsNeeded();
+    }
+}
+
+bool UsbGate::restore(const Wait& wait) {
+    const BootTime end = parts_.now() + kRestoreTime;
+    setClosed(false);
+    while (policy_.state().phase != GateState::Phase::open && parts_.now() < end) {
+        wait(std::min(nextLook().value_or(end), end));
+        look();
+    }
+    std::vector<std::string> left = policy_.gaps();
+    const BusView view = lookAtBus(&UsbBus::glance).value_or(BusView());
+    for (const UsbDevice& device : view.devices) {
+        if (!device.authorized && notAccepted_.contains(device.attachment)) {
+            left.push_back(base::concat("device ", device.port()));
+        }
+    }
+    const std::string gap = listOf(left);
+    if (!toldProblem_.empty()) {
+        parts_.log.write(GateLine::writeFailed,
+                         base::concat("keystrand: cannot open the gate: ", toldProblem_));
+    } else if (!gap.empty() && gap != toldGap_) {
+        parts_.log.write(GateLine::opened,
+                         base::concat("keystrand: the gate is open, but for ", gap));
+    }
+    return toldProblem_.empty() && gap.empty();
+}
+
+std::string UsbGate::closedByNobodyKnows() {
+    const bool isToBeOpen = !wantsClosed_ && policy_.isPutBack();
+    const auto view =
+        record_.replacesLost && isToBeOpen ? lookAtBus(&UsbBus::glance) : std::nullopt;
+    std::vector<std::string> closed;
+    if (view && view->hasUsb) {
+        if (isClosed(view->parameter)) {
+            closed.emplace_back("the parameter authorized_default");
+        }
+        for (const RootHub& hub : view->rootHubs) {
+            if (isClosed(hub.authorizedDefault)) {
+                closed.push_back(base::concat("root hub usb", std::to_string(hub.bus)));
+            }
+        }
+    }
+    return listOf(closed);
 }
 
 std::vector<UsbGate::Listed> UsbGate::list() {
@@ -243,8 +320,12 @@ std::string UsbGate::gap() const {
 }
 
 std::optional<BootTime> UsbGate::nextLook() const {
-    const auto next = policy_.nextLook();
+    auto next = policy_.nextLook();
     const bool isDone = policy_.state().phase == GateState::Phase::open && !wantsClosed_;
+    if (busyAt_ && (locked_ || !isDone)) {
+        const BootTime again = *busyAt_ + GatePolicy::kRetryTime;
+        next = std::min(next.value_or(again), again);
+    }
     if (!blindSince_ || isDone) {
         return next;
     }
@@ -261,6 +342,9 @@ std::optional<BusView> UsbGate::lookAtBus(Look at) {
     }
     toldProblem_ = problem;
     blindSince_ = view ? std::nullopt : std::optional(parts_.now());
+    if (at == &UsbBus::look) {
+        busyAt_ = view && isBusy(*view) ? std::optional(parts_.now()) : std::nullopt;
+    }
     return view;
 }
 
@@ -312,20 +396,20 @@ bool UsbGate::carryOut(const std::vector<GateAction>& actions, BootTime now) {
 
 /// The gate is what was read back, not what was wished.
 void UsbGate::tellState() {
-    const bool isClosed = policy_.closed();
+    const bool closes = policy_.closed();
     std::string gap = listOf(policy_.gaps());
-    if (isClosed ? !toldProblem_.empty() : !policy_.isPutBack() && gap.empty()) {
+    if (closes ? !toldProblem_.empty() : !policy_.isPutBack() && gap.empty()) {
         // Nobody knows yet.
         return;
     }
-    if (toldClosed_ == isClosed && toldGap_ == gap) {
+    if (toldClosed_ == closes && toldGap_ == gap) {
         return;
     }
-    toldClosed_ = isClosed;
+    toldClosed_ = closes;
     toldGap_ = std::move(gap);
     const std::string exceptions =
         toldGap_.empty() ? std::string() : base::concat(", but for ", toldGap_);
-    if (isClosed) {
+    if (closes) {
         parts_.log.write(GateLine::closed, "keystrand: the gate is closed" + exceptions);
     } else {
         parts_.log.write(GateLine::opened, "keystrand: the gate is open" + exceptions);
@@ -381,6 +465,9 @@ void UsbGate::tellFailure(const std::string& line) {
 void UsbGate::tellDevice(const GateAction& action, const GateOutcome& outcome) {
     const std::string device = describe(action.device);
     const bool isAccepted = action.kind == Kind::accept;
+    if (isAccepted && outcome.kind == GateOutcome::Kind::failed) {
+        notAccepted_.insert(action.device.attachment);
+    }
     switch (outcome.kind) {
     case GateOutcome::Kind::done:
         parts_.log.write(isAccepted ? GateLine::accepted : GateLine::refused,
@@ -422,7 +509,7 @@ void UsbGate::saveDevices(const BusView& view) {
     KnownDevices known;
     for (const UsbDevice& device : view.devices) {
         const KnownDevice* const entry = policy_.find(device.attachment);
-        if (device.authorized && (entry == nullptr || isIn(entry->standing))) {
+        if (device.authorized && device.saidAll && (entry == nullptr || isIn(entry->standing))) {
             known.insert(acrossStarts(device));
         }
     }

@@ -65,6 +65,18 @@ class UsbGate : private base::NotCopied {
     /// is in.
     [[nodiscard]] std::optional<std::string> accept(const Attachment& attachment);
 
+    /// Opens for good, and goes on as long as something may come late that was refused, but no
+    /// longer than twenty seconds. `wait` returns at that time, or earlier; what it has heard of
+    /// has been looked at. False, with a line that names it, when something could not be opened.
+    using Wait = std::function<void(BootTime until)>;
+    [[nodiscard]] bool restore(const Wait& wait);
+    /// Before that: has it open all that reads closed, and accept all that is out, whoever did
+    /// that.
+    void takeOver();
+    /// What reads closed though the gate is open, when nobody knows any more who closed it; in
+    /// words for people.
+    [[nodiscard]] std::string closedByNobodyKnows();
+
     /// Looks again, because something came or went, or because it is time.
     void look();
     [[nodiscard]] std::optional<BootTime> nextLook() const;
@@ -112,10 +124,14 @@ class UsbGate : private base::NotCopied {
     std::string toldGap_;
     /// The failures of this closing or opening; each is told once, however often it is met.
     std::set<std::string> toldFailures_;
+    /// Which the kernel did not take.
+    std::set<Attachment> notAccepted_;
     bool keepsDevices_ = false;
     bool locked_ = false;
     /// When the bus was looked at last, if it could not be seen.
     std::optional<BootTime> blindSince_;
+    /// When the devices were, if one had not said all.
+    std::optional<BootTime> busyAt_;
     /// What was said last, whether it could be done or not.
     bool wantsClosed_ = false;
     bool watching_ = false;

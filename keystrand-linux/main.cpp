@@ -18,6 +18,7 @@ constexpr int kWrongUsage = 2;
 struct CommandLine {
     std::string root = "/";
     bool restore = false;
+    bool all = false;
 };
 
 /// None when there is nothing to run; `exitStatus` is then the program's status, and what is to be
@@ -27,8 +28,11 @@ std::optional<CommandLine> parseOptions(int argc, const char* const* argv, int& 
     CLI::App app("Refuses new USB devices while the machine is locked.", "keystrand");
     app.add_option("--root", options.root, "All paths lie under this directory")
         ->capture_default_str();
-    app.add_flag("--restore", options.restore,
-                 "Put back what a service that has ended left closed, and end");
+    auto* const restore =
+        app.add_flag("--restore", options.restore,
+                     "Put back what a service that has ended left closed, and end");
+    app.add_flag("--all", options.all, "Open all that is closed, whoever has closed it")
+        ->needs(restore);
     try {
         app.parse(argc, argv);
     } catch (const CLI::ParseError& problem) {
@@ -73,7 +77,13 @@ int main(int argc, char** argv) {
     const auto target = JournalGateLog::targetFor(options->root);
     JournalGateLog log(target);
     if (options->restore) {
-        return keystrand::usb::KeystrandService::restore(options->root, log) ? 0 : 1;
+        using Service = keystrand::usb::KeystrandService;
+        return Service::restore(options->root,
+                                options->all ? Service::Restored::all
+                                             : Service::Restored::whatWasClosed,
+                                keystrand::usb::SystemClocks(), log)
+                   ? 0
+                   : 1;
     }
     return serve(options->root, target, log);
 }

@@ -95,6 +95,11 @@ EventSource EventLoop::signal(int number, Handler handler) {
     return EventSource(source);
 }
 
+void EventLoop::turn(std::chrono::microseconds most) {
+    const auto limit = std::max<std::chrono::microseconds::rep>(most.count(), 0);
+    static_cast<void>(sd_event_run(event_.get(), static_cast<std::uint64_t>(limit)));
+}
+
 bool EventLoop::run() {
     if (!turns_.work) {
         return sd_event_loop(event_.get()) >= 0;

@@ -63,6 +63,9 @@ class EventLoop {
     /// To be told of the turns of `run`. Before it runs.
     void setTurns(Turns turns) { turns_ = std::move(turns); }
 
+    /// Waits for something to come, at most that long, and has it handled. Not for `run`.
+    void turn(std::chrono::microseconds most);
+
     /// Runs until `stop`. False when the loop itself failed.
     [[nodiscard]] bool run();
     void stop();

@@ -143,7 +143,18 @@ std::optional<BusView> FakeUsbBus::look(std::string& problem) {
     if (view && hanging_ && !view->devices.empty()) {
         hanging_();
     }
-    return view && view->hasUsb ? present() : view;
+    if (view && view->hasUsb) {
+        *view = present();
+        for (UsbDevice& device : view->devices) {
+            if (busy_.contains(device.port())) {
+                device.saidAll = false;
+                device.manufacturer.clear();
+                device.name.clear();
+                device.serial.clear();
+            }
+        }
+    }
+    return view;
 }
 
 std::optional<BusView> FakeUsbBus::glance(std::string& problem) {

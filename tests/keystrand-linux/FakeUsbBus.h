@@ -71,6 +71,11 @@ class FakeUsbBus : public UsbBus {
     /// Called whenever what devices say is read: how long they take is theirs.
     void setHanging(std::function<void()> hanging) { hanging_ = std::move(hanging); }
 
+    /// What is at that port has its reader wait for its names; a look does not wait.
+    void setBusy(const std::string& port, bool busy = true) {
+        busy ? static_cast<void>(busy_.insert(port)) : static_cast<void>(busy_.erase(port));
+    }
+
     [[nodiscard]] bool isPlugged(const std::string& port) const { return plugs_.contains(port); }
     /// False also for what is not seen.
     [[nodiscard]] bool isAuthorized(const std::string& port) const;
@@ -121,6 +126,7 @@ class FakeUsbBus : public UsbBus {
     /// What was decided about devices that are not seen yet.
     std::map<std::string, bool> unseen_;
     std::set<std::string> used_;
+    std::set<std::string> busy_;
     std::map<std::uint32_t, std::uint32_t> lastNumber_;
     std::uint64_t lastInode_ = 0;
     AuthorizedDefault parameter_ = kAsTheControllerHasIt;

@@ -20,6 +20,7 @@ using namespace std::chrono_literals;
 GateRecord full() {
     GateRecord record;
     record.service = {.restricted = true, .starting = true, .openUntil = 77us};
+    record.replacesLost = true;
     record.gate.phase = GateState::Phase::closed;
     record.gate.parameter = WrittenDefault{.before = -1, .written = 2, .confirmed = true};
     record.gate.hubs = {{.bus = 1, .inode = 12, .value = {.before = 1, .written = 2}},
@@ -38,6 +39,7 @@ TEST(GateRecordTest, Bytes) {
                                         "restricted\n"
                                         "starting\n"
                                         "open-until 77\n"
+                                        "replaces-lost\n"
                                         "parameter -1 2 done\n"
                                         "hub 1 12 1 2 decided\n"
                                         "hub 2 13 0 0 decided\n"

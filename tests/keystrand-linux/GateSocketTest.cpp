@@ -127,6 +127,47 @@ TEST_F(GateSocketTest, OpensForAWhile) {
     EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
 }
 
+/// A service has died here, and nobody can read what it noted.
+class LostRecordSocketTest : public GateSocketTest {
+  protected:
+    LostRecordSocketTest() {
+        std::string problem;
+        EXPECT_TRUE(lostRecord.replace("nonsense\n", problem));
+        next.start();
+    }
+    std::string gap() {
+        const auto answer = usb::answer(next, clocks, wire::GateStatusRequest());
+        return std::get<wire::GateStatus>(answer).gap;
+    }
+
+    StateFile lostRecord{directory.file("lost"), StateFile::Durability::none};
+    KernelState nextKernel;
+    Keystrand next{Keystrand::Parts{.kernel = nextKernel,
+                                    .events = poster,
+                                    .clock = clocks,
+                                    .lockState = sessions,
+                                    .bus = bus,
+                                    .record = lostRecord,
+                                    .devices = devices,
+                                    .log = log,
+                                    .switches = [] { return PolicySwitches(); },
+                                    .sleepAgain = [] {},
+                                    .rearm =
+                                        [] {
+                                        }},
+                   Keystrand::Settings{}};
+};
+
+TEST_F(LostRecordSocketTest, StatusNamesWhatStaysClosedWhenTheGateIsOpen) {
+    EXPECT_EQ(gap(), "");
+    sessions.say(LockState::Said::unlocked);
+    EXPECT_EQ(gap(), "the parameter authorized_default, root hub usb1 (who closed it is not known "
+                     "any more: keystrand --restore --all opens it)");
+    bus.setRootHubDefault(1, kEverybody);
+    bus.setParameterDefault(kEverybody);
+    EXPECT_EQ(gap(), "");
+}
+
 TEST_F(GateSocketTest, WhatIsNoRequestIsRefusedAndTheNextOneAnswered) {
     const auto answers = ask({"nonsense\n", std::string(wire::kGateRequestSize + 1, 'x'),
                               std::string(4096, '\0'), "status\n"});

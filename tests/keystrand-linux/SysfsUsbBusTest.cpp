@@ -5,22 +5,28 @@
 #include "keystrand-linux/UsbGate.h"
 #include "tests/keystrand-linux/FakeSysfs.h"
 #include "tests/keystrand/LoopTurns.h"
+#include "tests/support/FailingCalls.h"
 #include "tests/support/TemporaryDirectory.h"
 
 #include <gtest/gtest.h>
 
 #include <array>
 #include <cerrno>
+#include <deque>
+#include <fcntl.h>
 #include <fstream>
 #include <linux/netlink.h>
 #include <sched.h>
+#include <set>
 #include <sys/mount.h>
 #include <sys/socket.h>
+#include <unistd.h>
 
 namespace keystrand::usb {
 namespace {
 
 namespace fs = std::filesystem;
+using namespace std::chrono_literals;
 using Kind = GateOutcome::Kind;
 using Lines = std::vector<std::string>;
 
@@ -99,6 +105,111 @@ TEST_F(SysfsUsbBusTest, TextsHaveALimit) {
     const UsbDevice device = only();
     EXPECT_EQ(device.manufacturer.size(), 4096U);
     EXPECT_EQ(device.name, "");
+}
+
+/// Reads like the kernel does while it is busy with some devices.
+class BusyDevicesTest : public SysfsUsbBusTest {
+  protected:
+    BusyDevicesTest() {
+        for (const char* const port : {"1-1", "1-2", "1-3"}) {
+            machine.plug(port, {.descriptors = aMouse().descriptors, .serial = port});
+        }
+        SysfsUsbBus::System system = sysfs.system();
+        system.read = [this](int directory, const char* name, std::size_t limit,
+                             ReadDeadline until) {
+            EXPECT_LE(until, began + SysfsUsbBus::kPatienceWithAll + (Clock::now() - began));
+            EXPECT_LE(until, Clock::now() + SysfsUsbBus::kPatience);
+            const bool isBusy = busy.contains(numberIn(directory)) && std::string(name) == held;
+            held == name ? static_cast<void>(++readsOfHeld) : static_cast<void>(0);
+            return isBusy ? SmallFile{.error = ETIMEDOUT, .bytes = {}}
+                          : readSmallFileUntil(directory, name, limit, Clock::now() + 1h);
+        };
+        slow.emplace(*loop, directory.path().string(), log, std::move(system));
+    }
+    static std::string numberIn(int directory) {
+        return std::string(trimmed(readSmallFile(directory, "devnum", kAttributeLimit).bytes));
+    }
+    BusView lookSlowly() {
+        std::string problem;
+        began = Clock::now();
+        readsOfHeld = 0;
+        return slow->look(problem).value_or(BusView());
+    }
+
+    using Clock = std::chrono::steady_clock;
+    ReadDeadline began;
+    std::set<std::string> busy;
+    std::string held = "serial";
+    int readsOfHeld = 0;
+    std::optional<SysfsUsbBus> slow;
+};
+
+TEST_F(BusyDevicesTest, WhatIsBusyIsThereWithWhatDecides) {
+    busy = {"2"};
+    BusView view = lookSlowly();
+    ASSERT_EQ(view.devices.size(), 3U);
+    EXPECT_TRUE(view.devices[0].saidAll);
+    EXPECT_EQ(view.devices[0].serial, "1-1");
+    EXPECT_FALSE(view.devices[1].saidAll);
+    EXPECT_EQ(view.devices[1].serial, "");
+    EXPECT_EQ(view.devices[1].name, "");
+    EXPECT_EQ(view.devices[1].vendor, 0x1111);
+    EXPECT_TRUE(view.devices[1].functions.understood);
+    EXPECT_TRUE(view.devices[2].saidAll);
+    EXPECT_EQ(view.devices[2].serial, "1-3");
+    // Asked again, as the only one, and kept when it has answered.
+    view = lookSlowly();
+    EXPECT_EQ(readsOfHeld, 1);
+    busy.clear();
+    view = lookSlowly();
+    EXPECT_EQ(readsOfHeld, 1);
+    EXPECT_EQ(view.devices[1].serial, "1-2");
+    EXPECT_TRUE(view.devices[1].saidAll);
+    view = lookSlowly();
+    EXPECT_EQ(readsOfHeld, 0);
+}
+
+TEST_F(BusyDevicesTest, WhatHoldsBackItsDescriptorsIsUnknownForNow) {
+    busy = {"2"};
+    held = "descriptors";
+    EXPECT_FALSE(lookSlowly().devices.at(1).saidAll);
+    EXPECT_EQ(lookSlowly().devices.at(1).functions, UsbFunctions());
+    busy.clear();
+    EXPECT_TRUE(lookSlowly().devices.at(1).functions.understood);
+}
+
+TEST(SmallFileTest, WhatWaitsInTheKernelIsInterrupted) {
+    int ends[2] = {-1, -1};
+    ASSERT_EQ(::pipe2(ends, O_CLOEXEC), 0);
+    const base::FileDescriptor in(ends[0]);
+    const base::FileDescriptor out(ends[1]);
+    char byte = 0;
+    {
+        const Interruptions interruptions(std::chrono::steady_clock::now());
+        EXPECT_EQ(::read(in.get(), &byte, 1), -1);
+        EXPECT_EQ(errno, EINTR);
+        // Again, should the first one have come too early.
+        EXPECT_EQ(::read(in.get(), &byte, 1), -1);
+        EXPECT_EQ(errno, EINTR);
+    }
+    ASSERT_EQ(::write(out.get(), "x", 1), 1);
+    EXPECT_EQ(::read(in.get(), &byte, 1), 1);
+}
+
+TEST(SmallFileTest, ReadIsGivenUpAtItsTimeAndNotBefore) {
+    const support::TemporaryDirectory directory;
+    std::ofstream(directory.file("serial")) << "123\n";
+    const base::FileDescriptor open = openDirectory(directory.path());
+    const auto read = [&](ReadDeadline until) {
+        return readSmallFileUntil(open.get(), "serial", kAttributeLimit, until);
+    };
+    const auto now = std::chrono::steady_clock::now();
+    EXPECT_EQ(read(now).error, ETIMEDOUT);
+    support::FailingCalls::read = {EINTR, EINTR};
+    EXPECT_EQ(read(now + 1h).bytes, "123\n");
+    support::FailingCalls::read = std::deque<int>(1'000'000, EINTR);
+    EXPECT_EQ(read(std::chrono::steady_clock::now() + 1ms).error, ETIMEDOUT);
+    support::FailingCalls::read.clear();
 }
 
 TEST_F(SysfsUsbBusTest, DescriptorsAreReadToTheEndUpToALimit) {

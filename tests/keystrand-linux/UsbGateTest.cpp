@@ -7,6 +7,9 @@
 
 #include <gtest/gtest.h>
 
+#include <filesystem>
+#include <map>
+
 namespace keystrand::usb {
 namespace {
 
@@ -194,7 +197,165 @@ TEST_F(UsbGateTest, RecordThatCannotBeUnderstoodIsTold) {
     log.take();
     EXPECT_EQ(start(), std::nullopt);
     EXPECT_EQ(log.take(), Lines{"keystrand: " + record.path() +
-                                ": not a record of the gate; what is attached counts as accepted"});
+                                ": not a record of the gate; what is attached counts as accepted, "
+                                "and what reads closed stays so: keystrand --restore --all opens "
+                                "it"});
+}
+
+TEST_F(UsbGateTest, RecordThatCannotBeReadIsTold) {
+    std::filesystem::create_directory(record.path());
+    EXPECT_EQ(start(), std::nullopt);
+    EXPECT_EQ(log.take(), Lines{"keystrand: " + record.path() +
+                                ": not a regular file; what is attached counts as accepted, and "
+                                "what reads closed stays so: keystrand --restore --all opens it"});
+}
+
+/// A service that closed has died, and nobody can read what it has noted.
+class LostRecordTest : public UsbGateTest {
+  protected:
+    LostRecordTest() {
+        start({.keyboards = KeyboardRule::never});
+        gate->setClosed(true);
+        bus.plug("1-1", aHub());
+        bus.plug("1-1.2", aDisk());
+        std::string problem;
+        EXPECT_TRUE(record.replace("nonsense\n", problem));
+        start({.keyboards = KeyboardRule::never});
+        log.take();
+    }
+};
+
+TEST_F(LostRecordTest, WhatItClosedStaysClosedAndIsNamedAsLongAsTheGateIsOpen) {
+    gate->setClosed(true);
+    EXPECT_EQ(gate->closedByNobodyKnows(), "");
+    open();
+    const std::string all = "the parameter authorized_default, root hub usb1, root hub usb2";
+    EXPECT_EQ(gate->closedByNobodyKnows(), all);
+    // The next service and the one after that know it as well.
+    start();
+    EXPECT_EQ(gate->closedByNobodyKnows(), all);
+    gate->setClosed(true);
+    open();
+    start();
+    EXPECT_EQ(gate->closedByNobodyKnows(), all);
+    bus.setRootHubDefault(1, kEverybody);
+    bus.setParameterDefault(kAsTheControllerHasIt);
+    EXPECT_EQ(gate->closedByNobodyKnows(), "root hub usb2");
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+}
+
+TEST_F(LostRecordTest, WhoTakesOverOpensAll) {
+    bus.setRootHubDefault(2, kNobody);
+    gate->takeOver();
+    EXPECT_TRUE(gate->restore([this](BootTime until) { now = until; }));
+    EXPECT_EQ(bus.parameter(), kAsTheControllerHasIt);
+    EXPECT_EQ(bus.rootHubDefault(1), kEverybody);
+    EXPECT_EQ(bus.rootHubDefault(2), kEverybody);
+    EXPECT_TRUE(bus.isAuthorized("1-1.2"));
+    EXPECT_EQ(gate->closedByNobodyKnows(), "");
+}
+
+TEST_F(UsbGateTest, WhatOthersHaveClosedIsNotLost) {
+    bus.setRootHubDefault(1, kNobody);
+    gate->setClosed(true);
+    open();
+    EXPECT_EQ(gate->closedByNobodyKnows(), "");
+}
+
+class RestoreTest : public UsbGateTest {
+  protected:
+    RestoreTest() {
+        start({.keyboards = KeyboardRule::never});
+        gate->setClosed(true);
+        bus.plug("1-1", aHub());
+        start();
+        log.take();
+        bus.forgetWrites();
+    }
+
+    /// What happens while the gate waits for the n-th time; then it is time.
+    void meanwhile(std::size_t wait, std::function<void()> what) {
+        happens[wait] = std::move(what);
+    }
+    bool restore() {
+        return gate->restore([this](BootTime until) {
+            EXPECT_GT(until, now);
+            EXPECT_LE(until, began + 20s);
+            if (const auto found = happens.find(waits++); found != happens.end()) {
+                found->second();
+            } else {
+                now = until;
+            }
+        });
+    }
+
+    const BootTime began = now;
+    std::size_t waits = 0;
+    std::map<std::size_t, std::function<void()>> happens;
+};
+
+TEST_F(RestoreTest, WhatComesInLateIsAcceptedAsWell) {
+    // The kernel has refused it for this service's root hub, and shows it seconds later.
+    bus.plugUnseen("1-1.2", aHub());
+    meanwhile(0, [&] {
+        bus.watch(nullptr);
+        now += 9s;
+        bus.setRootHubDefault(1, kHardWiredOnly);
+        bus.show("1-1.2");
+        bus.setRootHubDefault(1, kEverybody);
+        bus.plug("1-1.2.3", aDisk());
+    });
+    EXPECT_TRUE(restore());
+    EXPECT_TRUE(bus.isAuthorized("1-1.2"));
+    EXPECT_TRUE(bus.isAuthorized("1-1.2.3"));
+    EXPECT_EQ(now, began + GatePolicy::kLateTime);
+    EXPECT_EQ(recordOnDisk(), GateRecord());
+}
+
+TEST_F(RestoreTest, WhatTheKernelDoesNotTakeIsTriedOnceMore) {
+    bus.failDefaults();
+    meanwhile(0, [&] {
+        now += GatePolicy::kRetryTime;
+        bus.failDefaults(false);
+    });
+    EXPECT_TRUE(restore());
+    EXPECT_EQ(now, began + 20s);
+    EXPECT_EQ(bus.rootHubDefault(1), kEverybody);
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+    EXPECT_EQ(log.take().back(), "keystrand: the gate is open");
+}
+
+TEST_F(RestoreTest, WhatIsNotOpenInTheEndIsNamed) {
+    bus.failDefaults();
+    EXPECT_FALSE(restore());
+    EXPECT_EQ(now, began + 20s);
+    EXPECT_EQ(log.take().back(), "keystrand: the gate is open, but for the parameter "
+                                 "authorized_default, root hub usb1, root hub usb2");
+}
+
+TEST_F(RestoreTest, DeviceThatIsNotTakenIsNamed) {
+    bus.failWrites(1);
+    EXPECT_FALSE(restore());
+    EXPECT_EQ(log.take(),
+              (Lines{R"(keystrand: cannot accept 1-1 (1111:2222 "maker" "hub", classes 09/00/00))"
+                     ": Input/output error",
+                     "keystrand: the gate is open",
+                     "keystrand: the gate is open, but for device "
+                     "1-1"}));
+}
+
+TEST_F(RestoreTest, DeviceThatIsNotTakenAndGoesIsNotMissed) {
+    bus.failWrites(1);
+    meanwhile(0, [&] { bus.unplug("1-1"); });
+    EXPECT_TRUE(restore());
+}
+
+TEST_F(RestoreTest, UsbThatCannotBeSeenIsTold) {
+    bus.setUnreadable(true);
+    EXPECT_FALSE(restore());
+    EXPECT_EQ(now, began + 20s);
+    EXPECT_EQ(log.take(), (Lines{"keystrand: no port is guarded: it cannot be read",
+                                 "keystrand: cannot open the gate: it cannot be read"}));
 }
 
 TEST_F(UsbGateTest, RecordThatCannotBeWrittenLeavesNothingOpen) {
@@ -315,6 +476,45 @@ TEST_F(UsbGateTest, DeviceThatHangsKeepsNothingOpen) {
     EXPECT_EQ(gate->countRefused(), 0U);
     EXPECT_EQ(reads, 0);
     EXPECT_EQ(pathsOnDisk(), std::set<std::string>{"pci0 1"});
+}
+
+TEST_F(UsbGateTest, DeviceThatHasNotSaidAllIsKeptWhenItHas) {
+    bus.plug("1-1", aMouse());
+    bus.plug("1-2", aDisk());
+    bus.setBusy("1-1");
+    gate->keepDevices();
+    gate->setLocked(true);
+    EXPECT_EQ(pathsOnDisk(), std::set<std::string>{"pci0 2"});
+    EXPECT_EQ(gate->nextLook(), now + GatePolicy::kRetryTime);
+    // Nothing that is tried again keeps the gate open.
+    gate->setClosed(true);
+    EXPECT_EQ(bus.rootHubDefault(1), kHardWiredOnly);
+    bus.setBusy("1-1", false);
+    now += GatePolicy::kRetryTime;
+    gate->look();
+    EXPECT_EQ(pathsOnDisk(), (std::set<std::string>{"pci0 1", "pci0 2"}));
+    EXPECT_EQ(gate->nextLook(), std::nullopt);
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+}
+
+TEST_F(UsbGateTest, DeviceThatHasNotSaidAllIsLookedAtAgainAlsoWhenItComesWhileTheGateIsOpen) {
+    gate->keepDevices();
+    gate->setLocked(true);
+    const int before = rearmed;
+    bus.setBusy("1-1");
+    bus.plug("1-1", aMouse());
+    EXPECT_EQ(gate->nextLook(), now + GatePolicy::kRetryTime);
+    EXPECT_GT(rearmed, before);
+    gate->setLocked(false);
+    EXPECT_EQ(gate->nextLook(), std::nullopt);
+}
+
+TEST_F(UsbGateTest, RefusedDeviceThatHasNotSaidAllIsNamedByWhatIsKnown) {
+    gate->setClosed(true);
+    log.take();
+    bus.setBusy("1-1");
+    bus.plug("1-1", aDisk());
+    EXPECT_EQ(log.take(), Lines{"keystrand: refused 1-1 (1111:2222 busy, classes 08/06/50)"});
 }
 
 TEST_F(UsbGateTest, WhatCouldNotBeClosedIsNamedAndTriedAgain) {
@@ -539,6 +739,34 @@ TEST_F(UsbGateTest, AfterARestartOnlyWhatWasThereStays) {
     EXPECT_TRUE(next.isAuthorized("1-1"));
     EXPECT_EQ(log.take(), Lines{R"(keystrand: accepted 1-1 (1111:2222 "maker" "disk", classes )"
                                 R"(08/06/50): it was attached when the machine went off)"});
+}
+
+TEST_F(UsbGateTest, AfterARestartWhatHasNotSaidAllIsWaitedForShortly) {
+    bus.plug("1-1", aDisk());
+    bus.plug("1-2", aDisk());
+    gate->keepDevices();
+    gate->setLocked(true);
+    std::string problem;
+    ASSERT_TRUE(record.remove(problem));
+    start();
+    gate->setClosed(true);
+    bus.setBusy("1-1");
+    bus.setBusy("1-2");
+    int looks = 0;
+    bus.setHanging([&] {
+        now += 100ms;
+        bus.setBusy("1-1", ++looks < 10);
+    });
+    const BootTime began = now;
+    gate->keepOnlyKnown();
+    EXPECT_TRUE(bus.isAuthorized("1-1"));
+    EXPECT_FALSE(bus.isAuthorized("1-2"));
+    EXPECT_LE(now, began + 6s);
+    // It comes in as soon as it has.
+    bus.setBusy("1-2", false);
+    now = gate->nextLook().value();
+    gate->look();
+    EXPECT_TRUE(bus.isAuthorized("1-2"));
 }
 
 TEST_F(UsbGateTest, WithoutAListNothingIsTaken) {
