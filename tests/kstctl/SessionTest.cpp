@@ -24,7 +24,7 @@ using platform::Value;
 constexpr char kSessions[] = "/org/freedesktop/login1/session/_3";
 constexpr char kUsers[] = "/org/freedesktop/login1/user/_";
 
-/// What a bus and the logind on it answer.
+/// What a bus and the logind on it answer. Told before it serves, and asked afterwards.
 class FakeLogind {
   public:
     /// The users of sessions.
@@ -193,12 +193,16 @@ TEST_F(SessionTest, AServiceOfTheUsersMeansTheSessionThatTheUserSitsAt) {
 
 TEST_F(SessionTest, UserWithoutASession) {
     const std::string none = concat("user ", user, " has no session");
-    PacketServer server = serve();
-    expectFailure({"lock"}, 3, none, in(""));
-    expectFailure({"lock"}, 3, none, in("2"));
+    {
+        const PacketServer server = serve();
+        expectFailure({"lock"}, 3, none, in(""));
+        expectFailure({"lock"}, 3, none, in("2"));
+    }
     logind.displays = {{user, ""}};
-    expectFailure({"unlock"}, 3, none, in(""));
-    server.stop();
+    {
+        const PacketServer server = serve();
+        expectFailure({"unlock"}, 3, none, in(""));
+    }
     EXPECT_TRUE(logind.hints.empty());
 }
 
@@ -220,14 +224,21 @@ TEST_F(SessionTest, OfOthersOnlyRootMay) {
 }
 
 TEST_F(SessionTest, MachineWithoutLogind) {
+    const std::string refusal = "logind: Nobody answers here.";
     logind.error = "org.freedesktop.DBus.Error.ServiceUnknown";
-    const PacketServer server = serve();
-    expectFailure({"lock"}, 3, "logind: Nobody answers here.", in("2"));
-    expectFailure({"lock"}, 3, "logind: Nobody answers here.", in(""));
+    {
+        const PacketServer server = serve();
+        expectFailure({"lock"}, 3, refusal, in("2"));
+        expectFailure({"lock"}, 3, refusal, in(""));
+    }
     logind.error = "org.freedesktop.DBus.Error.InteractiveAuthorizationRequired";
-    expectFailure({"lock"}, 4, "logind: Nobody answers here.", in("2"));
+    {
+        const PacketServer server = serve();
+        expectFailure({"lock"}, 4, refusal, in("2"));
+    }
     logind.error = "org.freedesktop.DBus.Error.LimitsExceeded";
-    expectFailure({"unlock"}, 1, "logind: Nobody answers here.", in("2"));
+    const PacketServer server = serve();
+    expectFailure({"unlock"}, 1, refusal, in("2"));
 }
 
 TEST_F(SessionTest, LogindThatAnswersNonsense) {
@@ -240,13 +251,14 @@ TEST_F(SessionTest, LogindThatAnswersNonsense) {
 TEST_F(SessionTest, BusThatEnds) {
     logind.sessions = {{"2", user}};
     logind.displays = {{user, "2"}};
-    const PacketServer server = serve();
     for (const char* const call : {"GetSession", "SetLockedHint"}) {
         logind.lastCall = call;
+        const PacketServer server = serve();
         expectFailure({"lock"}, 1, "logind: Connection reset by peer", in("2"));
     }
     for (const char* const call : {"GetUser", "Get"}) {
         logind.lastCall = call;
+        const PacketServer server = serve();
         expectFailure({"lock"}, 1, "logind: Connection reset by peer", in(""));
     }
     EXPECT_TRUE(logind.hints.empty());

@@ -4,6 +4,7 @@
 #include "tests/system/CallInjector.h"
 #include "tests/system/RelaunchFixture.h"
 
+#include <atomic>
 #include <cerrno>
 #include <climits>
 #include <csignal>
@@ -51,7 +52,8 @@ class Killer {
   private:
     CallInjector idle_;
     int calls_;
-    int made_ = 0;
+    /// Counted by the gate's thread.
+    std::atomic<int> made_ = 0;
 };
 
 class KilledTwiceTest : public RelaunchFixture, public testing::WithParamInterface<int> {
