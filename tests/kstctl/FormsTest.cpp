@@ -141,10 +141,12 @@ TEST(FormsTest, TableOnANarrowTerminal) {
 
 TEST(FormsTest, ListOfJSONInPieces) {
     JSONListForm form(Report().add("a", 1).add("b", Report::None(), "x"), "c");
-    EXPECT_EQ(form.start() + form.element(Report().add("d", 1)) + form.element(Report()) +
-                  JSONListForm::end(),
-              R"({"a":1,"b":null,"bText":"x","c":[{"d":1},{}]})"
-              "\n");
+    // One after the other: the form knows which element is the first.
+    std::string text = form.start();
+    text += form.element(Report().add("d", 1));
+    text += form.element(Report());
+    EXPECT_EQ(text + JSONListForm::end(), R"({"a":1,"b":null,"bText":"x","c":[{"d":1},{}]})"
+                                          "\n");
     EXPECT_EQ(JSONListForm(Report(), "c").start() + JSONListForm::end(), "{\"c\":[]}\n");
     EXPECT_EQ(JSONTextForm("a\"\n\xc2\x9b"), "a\\\"\\n\\u009b");
     EXPECT_EQ(JSONTextForm(""), "");
