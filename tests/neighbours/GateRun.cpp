@@ -18,9 +18,11 @@
 #include <cstdio>
 #include <fstream>
 #include <iterator>
+#include <linux/sockios.h>
 #include <optional>
 #include <string>
 #include <string_view>
+#include <sys/ioctl.h>
 #include <sys/socket.h>
 #include <unistd.h>
 #include <utility>
@@ -166,7 +168,8 @@ class GateStage {
     }
 
     void plugDisk() {
-        // Whoever is told of it looks at it.
+        // Whether it is in from the start is up to the ports as they are.
+        settle();
         usb_.plugDisk();
         expected_.isDiskIn = !expected_.isClosed();
         isSettled_ = false;
@@ -208,9 +211,7 @@ class GateStage {
             return;
         }
         if (!sessions_.isOpen() || random.oneIn(100)) {
-            // The newest counts.
-            sessions_ = connectTo(sessions());
-            require(sessions_.isOpen(), "cannot connect to the sessions' socket");
+            speakAnew();
         }
         say(word(random));
         if (random.oneIn(100)) {
@@ -223,10 +224,9 @@ class GateStage {
     void settle() {
         service_->listen();
         require(service_->runs(), "the service ended with " + service_->ending());
-        // A word comes by another socket than this question, and may be heard after it.
         const auto deadline =
             std::chrono::steady_clock::now() + (isSettled_ ? std::chrono::seconds(0) : kPatience);
-        for (std::string wrong = difference(); !wrong.empty(); wrong = difference()) {
+        for (std::string wrong = whatIsWrong(); !wrong.empty(); wrong = whatIsWrong()) {
             require(std::chrono::steady_clock::now() < deadline, wrong);
             ::usleep(100);
         }
@@ -238,7 +238,7 @@ class GateStage {
         for (base::FileDescriptor& tool : tools_) {
             tool.reset();
         }
-        sessions_ = connectTo(sessions());
+        speakAnew();
         for (const char* const said : {"awake", "locked"}) {
             say(said);
         }
@@ -303,6 +303,13 @@ class GateStage {
         }
         require(sendTo(tools_[0], request), "a request that keeps the rules is not taken");
         return receiveFrom(tools_[0]).value_or("");
+    }
+
+    /// The newest connection counts, and what another one has said and was not heard yet does not.
+    void speakAnew() {
+        settle();
+        sessions_ = connectTo(sessions());
+        require(sessions_.isOpen(), "cannot connect to the sessions' socket");
     }
 
     void say(const std::string& word) {
@@ -463,8 +470,14 @@ class GateStage {
         }
     }
 
-    /// Empty when there is none.
-    [[nodiscard]] std::string difference() {
+    /// Empty when nothing is. A word comes by another socket than the question for the status, and
+    /// until it is read what holds may be what held before.
+    [[nodiscard]] std::string whatIsWrong() {
+        int unread = 0;
+        if (sessions_.isOpen() &&
+            (::ioctl(sessions_.get(), SIOCOUTQ, &unread) != 0 || unread > 0)) {
+            return "a word is not read";
+        }
         const auto answer = wire::decodeGateAnswer(asked("status\n"));
         require(answer && std::holds_alternative<wire::GateStatus>(*answer), "no status");
         const auto& status = std::get<wire::GateStatus>(*answer);
