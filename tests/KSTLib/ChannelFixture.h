@@ -29,12 +29,6 @@ class ChannelFixture : public LibraryFixture {
         LibraryFixture::TearDown();
     }
 
-    /// A failed check of the library, as `logged` shows it.
-    static std::string failedCheck(const std::string& condition, const std::string& value = "0x0") {
-        return "KSTLib: AssertMacros: " + condition + " (value: " + value +
-               "),  file: KSTLib/KSTLib:<n>\n";
-    }
-
     ScriptedRegistry registry;
     ScriptedChannel channel;
 };

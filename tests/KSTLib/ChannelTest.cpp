@@ -5,6 +5,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <limits>
@@ -19,27 +20,37 @@ using support::ScriptedRegistry;
 
 using Open = support::ChannelFixture;
 
-/// A channel whose connection is lost when the test says so, and which keeps the deadlines it got.
-class NotingChannel : public ScriptedChannel {
+/// Keeps whether it was given deadlines, and is inherited until it is left.
+template <typename Scripted>
+class Noting : public Scripted {
   public:
-    bool isLost = false;
     bool isInheritedOnce = false;
     std::vector<bool> deadlines;
+
+    [[nodiscard]] bool isInherited() const noexcept override { return isInheritedOnce; }
+    void leaveToParent() noexcept override { isInheritedOnce = false; }
+    void
+    setDeadline(std::optional<platform::KernelConnections::Deadline> deadline) noexcept override {
+        deadlines.push_back(deadline.has_value());
+    }
+};
+
+/// A channel whose connection is lost when the test says so.
+class NotingChannel : public Noting<ScriptedChannel> {
+  public:
+    bool isLost = false;
     platform::Status postStatus = platform::kSuccess;
     std::size_t posts = 0;
+    std::uint32_t postSelector = 4711;
     Bytes posted;
 
     [[nodiscard]] bool isConnected(platform::ConnectionHandle /*connection*/) const override {
         return !isLost;
     }
-    [[nodiscard]] bool isInherited() const noexcept override { return isInheritedOnce; }
-    void leaveToParent() noexcept override { isInheritedOnce = false; }
-    void setDeadline(std::optional<Deadline> deadline) noexcept override {
-        deadlines.push_back(deadline.has_value());
-    }
-    platform::Status post(platform::ConnectionHandle /*connection*/, std::uint32_t /*selector*/,
+    platform::Status post(platform::ConnectionHandle /*connection*/, std::uint32_t selector,
                           const void* input, std::size_t inputSize) override {
         ++posts;
+        postSelector = selector;
         const auto* in = static_cast<const std::uint8_t*>(input);
         posted = {in, in + inputSize};
         return postStatus;
@@ -59,7 +70,40 @@ class NotingOpen : public support::LibraryFixture {
         LibraryFixture::TearDown();
     }
 
-    ScriptedRegistry registry;
+    /// KSTGlobalContextAddCredential whose time is up when its command has been sent: the context
+    /// that it makes is deleted by a post. The level is 7.
+    KSTStatus addGloballyTooLate() {
+        static std::chrono::steady_clock::time_point now;
+        static const kst::CallTime kTime{.limit = std::chrono::seconds(5), .now = [] {
+                                             return now;
+                                         }};
+        kst::installPlatform({log, registry, channel, kTime});
+        channel.reply = Bytes(17, 7);
+        channel.duringStructCall = [&] {
+            if (channel.structCalls.back().input.at(4) == 5) {
+                channel.reply.clear();
+                now += std::chrono::seconds(5);
+            }
+        };
+        KSTCredential* credential = nullptr;
+        EXPECT_EQ(KSTCredentialCreate(kKSTCredentialTypePasscodeValidated, &credential), 0);
+        const KSTStatus status = KSTGlobalContextAddCredential(credential);
+        kst::gLogLevel = 255;
+        KSTCredentialDelete(credential);
+        return status;
+    }
+
+    /// The lines of the function and those behind it.
+    Lines linesFrom(const std::string& function) const {
+        Lines lines = logged();
+        const auto isOfIt = [&](const std::string& line) {
+            return line.find(function + ": ") != std::string::npos;
+        };
+        lines.erase(lines.begin(), std::find_if(lines.begin(), lines.end(), isOfIt));
+        return lines;
+    }
+
+    Noting<ScriptedRegistry> registry;
     NotingChannel channel;
 };
 
@@ -369,6 +413,7 @@ TEST_F(NotingOpen, DeadlineOfACallEndsWithIt) {
         const kst::CallScope inner;
     }
     EXPECT_EQ(channel.deadlines, (std::vector<bool>{true, true, true, false}));
+    EXPECT_EQ(registry.deadlines, channel.deadlines);
 }
 
 TEST_F(NotingOpen, PostedCommand) {
@@ -383,6 +428,8 @@ TEST_F(NotingOpen, PostedCommand) {
     channel.postStatus = -9;
     EXPECT_EQ(kst::postCommand(2, "a", 1), -9);
     EXPECT_EQ(channel.posts, 3U);
+    EXPECT_EQ(logged(), (Lines{failedCheck("cmd"), failedCheck("err == 0 ", "0xfffffffffffffffc"),
+                               failedCheck("err == 0 ", "0xfffffffffffffff7")}));
     kst::removePlatform();
     EXPECT_EQ(kst::postCommand(2, "a", 1), kKSTErrorUnexpected);
     EXPECT_EQ(channel.posts, 3U);
@@ -404,26 +451,66 @@ TEST_F(NotingOpen, ChildDeletesItsTemporaryContextsToo) {
 }
 
 TEST_F(NotingOpen, TemporaryContextOfACallWhoseTimeIsUpIsDeletedByAPost) {
-    static std::chrono::steady_clock::time_point now;
-    const kst::CallTime time{.limit = std::chrono::seconds(5), .now = [] {
-                                 return now;
-                             }};
-    kst::installPlatform({log, registry, channel, time});
-    channel.reply = Bytes(17, 7);
-    channel.duringStructCall = [&] {
-        if (channel.structCalls.back().input.at(4) == 5) {
-            now += std::chrono::seconds(5);
-        }
-    };
-    KSTCredential* credential = nullptr;
-    ASSERT_EQ(KSTCredentialCreate(kKSTCredentialTypePasscodeValidated, &credential), 0);
-    static_cast<void>(KSTGlobalContextAddCredential(credential));
-    KSTCredentialDelete(credential);
+    EXPECT_EQ(addGloballyTooLate(), 0);
     EXPECT_EQ(channel.posts, 1U);
+    EXPECT_EQ(channel.postSelector, 0U);
     Bytes frame = {'D', 'R', 'C', 'S', 2, 0, 0, 0};
     frame.insert(frame.end(), 16, 7);
     EXPECT_EQ(channel.posted, frame);
+    EXPECT_EQ(linesFrom("KSTContextDelete"),
+              (Lines{"KSTLib: KSTContextDelete: called.\n",
+                     "KSTLib: KSTContextDelete: returning, err = 0.\n",
+                     "KSTLib: KSTGlobalContextAddCredential: returning, err = 0.\n"}));
     gAllocatedBytes -= 1;
+}
+
+TEST_F(NotingOpen, TemporaryContextThatCannotBePostedGoesAlone) {
+    channel.postStatus = -9;
+    EXPECT_EQ(addGloballyTooLate(), 0);
+    EXPECT_EQ(channel.posts, 1U);
+    EXPECT_EQ(linesFrom("KSTContextDelete"),
+              (Lines{"KSTLib: KSTContextDelete: called.\n",
+                     failedCheck("err == 0 ", "0xfffffffffffffff7"),
+                     "KSTLib: KSTContextDelete: returning, err = -9.\n",
+                     "KSTLib: KSTContextDelete: called.\n",
+                     "KSTLib: KSTContextDelete: returning, err = 0.\n",
+                     "KSTLib: KSTGlobalContextAddCredential: returning, err = 0.\n"}));
+    gAllocatedBytes -= 1;
+}
+
+TEST_F(NotingOpen, LookupThatIsAParentsIsLeftToIt) {
+    registry.isInheritedOnce = true;
+    EXPECT_EQ(kst::init(), 0);
+    EXPECT_FALSE(registry.isInheritedOnce);
+    EXPECT_EQ(channel.opens.size(), 2U);
+}
+
+TEST_F(NotingOpen, CallFromABlockHasLostNothing) {
+    channel.isLost = true;
+    channel.structStatus = -9;
+    channel.scalars = {40};
+    bool wasLost = false;
+    KSTGlobalContextVerifyPolicy("p", false, nullptr, 0,
+                                 [&](KSTStatus err, bool, const KSTRequirement*) {
+                                     EXPECT_EQ(err, -9);
+                                     EXPECT_TRUE(channel.scalarCalls.empty());
+                                     EXPECT_EQ(KSTContextCreate(nullptr), -3);
+                                     wasLost = kst::isConnectionLost();
+                                 });
+    EXPECT_EQ(channel.scalarCalls.size(), 1U);
+    EXPECT_TRUE(wasLost);
+}
+
+TEST_F(NotingOpen, TimeOfNoCallIsNotUp) {
+    EXPECT_FALSE(kst::isTimeUp());
+}
+
+TEST_F(Open, InstalledPlatformHasTheLog) {
+    kst::setLibraryLog(nullptr);
+    kst::installPlatform({log, registry, channel});
+    registry.present = false;
+    EXPECT_EQ(kst::init(), kKSTErrorUnexpected);
+    EXPECT_EQ(logged(), Lines{failedCheck("service")});
 }
 
 TEST(CallTime, IsFiveSecondsInAll) {

@@ -77,6 +77,11 @@ TEST_F(CredentialObjects, NothingIsANullPointerForTheBlock) {
         EXPECT_TRUE(call.wasNull);
         EXPECT_EQ(call.length, 0U);
     }
+    KSTCredentialDelete(credential);
+    make(kKSTCredentialTypePassphraseEntered);
+    EXPECT_EQ(KSTCredentialSetProperty(credential, 200, "x", 1), 0);
+    EXPECT_EQ(KSTCredentialGetProperty(credential, 200, block), 0);
+    EXPECT_EQ(block.calls.back().bytes, Bytes{'x'});
 }
 
 TEST_F(CredentialObjects, Failures) {
@@ -127,6 +132,7 @@ TEST_F(CredentialObjects, EntriesAndReturnsAtLevel30) {
     static_cast<void>(KSTCredentialGetProperty(credential, 5, block));
     KSTCredentialDelete(credential);
     credential = nullptr;
+    KSTCredentialDelete(nullptr);
     EXPECT_EQ(newLines(), (Lines{
                               "KSTLib: KSTCredentialCreate: called.\n",
                               "KSTLib: KSTCredentialCreate: returning, err = 0.\n",
@@ -139,6 +145,9 @@ TEST_F(CredentialObjects, EntriesAndReturnsAtLevel30) {
                               "KSTLib: KSTCredentialGetPropertyData: returning, err = 0.\n",
                               "KSTLib: KSTCredentialGetProperty: returning, err = 0.\n",
                               "KSTLib: KSTCredentialDelete: called.\n",
+                              "KSTLib: KSTCredentialDelete: returning.\n",
+                              "KSTLib: KSTCredentialDelete: called.\n",
+                              libCallCheck("credential"),
                               "KSTLib: KSTCredentialDelete: returning.\n",
                           }));
 }

@@ -228,3 +228,12 @@ TEST_F(Fork, ChildThatNobodyWasToldOf) {
     EXPECT_EQ(ended, 0);
     expectEveryConnectionInOrder();
 }
+
+TEST_F(Fork, ChildOfAProcessWhosePlatformWasTakenAway) {
+    kst::removePlatform();
+    EXPECT_EQ(support::exitStatusOfChild([] {
+                  return kst::installedPlatform() == nullptr && KSTContextCreate(nullptr) == -3 ? 0
+                                                                                                : 1;
+              }),
+              0);
+}

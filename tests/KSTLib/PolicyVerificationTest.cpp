@@ -232,8 +232,10 @@ TEST_F(PolicyVerification, BlockLearnsOfBadArguments) {
         EXPECT_EQ(verifyAcl(constraint, length), -3);
         expectLogged({failedCheck("aclConstraint && aclConstraintLength"), returned(kAcl, -3)});
     }
-    KSTContextVerifyAclConstraint(context, "a", 1, false, nullptr, 0, 0, nullptr);
-    expectLogged({failedCheck("processRequirement"), returned(kAcl, -3)});
+    for (const std::size_t length : {std::size_t{1}, std::size_t{1} << 32U}) {
+        KSTContextVerifyAclConstraint(context, "a", length, false, nullptr, 0, 0, nullptr);
+        expectLogged({failedCheck("processRequirement"), returned(kAcl, -3)});
+    }
     EXPECT_EQ(verifyAcl("a", std::size_t{1} << 32U), -3);
     expectLogged({failedCheck("aclConstraintLength <= UINT32_MAX"), returned(kAcl, -3)});
     EXPECT_TRUE(sent().empty());
@@ -257,10 +259,12 @@ TEST_F(PolicyVerification, WhatAPayloadCannotCarry) {
 }
 
 TEST_F(PolicyVerification, ConstraintWhoseSizeWraps) {
-    // The announced size is 0xfffffffe + 33 without its 33rd bit; the constraint is never read.
-    EXPECT_EQ(verifyAcl("a", 0xfffffffe), -3);
-    expectLogged({serializerCheck("*outSize >= requiredSize"), failedCheck("err == 0 ", kFailed3),
-                  returned(kAcl, -3)});
+    // The announced size is 33 more without its 33rd bit; the constraint is never read.
+    for (const std::size_t length : {0xfffffffeU, 0xffffffffU}) {
+        EXPECT_EQ(verifyAcl("a", length), -3);
+        expectLogged({serializerCheck("*outSize >= requiredSize"),
+                      failedCheck("err == 0 ", kFailed3), returned(kAcl, -3)});
+    }
     EXPECT_TRUE(sent().empty());
 }
 

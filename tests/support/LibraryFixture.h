@@ -34,6 +34,12 @@ class LibraryFixture : public testing::Test {
     /// The lines in the log, with <n> for the line number of an assertion line.
     [[nodiscard]] std::vector<std::string> logged() const { return textsWithoutLineNumbers(log); }
 
+    /// A failed check of the library, as `logged` shows it.
+    static std::string failedCheck(const std::string& condition, const std::string& value = "0x0") {
+        return "KSTLib: AssertMacros: " + condition + " (value: " + value +
+               "),  file: KSTLib/KSTLib:<n>\n";
+    }
+
     /// The line of a LibCall function of `source`, "LibCall" or "LibCallBlock", whose transport
     /// returned `status`, as `logged` shows it.
     static std::string transportFailed(std::int32_t status, const std::string& source) {
