@@ -71,6 +71,14 @@ TEST(TextBufferTest, FromTheHeapIntoPagesOfItsOwn) {
     }
 }
 
+TEST(TextBufferTest, OneByteGoesAlongIntoPages) {
+    TextBuffer buffer;
+    buffer.append('x');
+    const std::string large(1 << 20, 'y');
+    buffer.append(large);
+    EXPECT_EQ(buffer.view(), 'x' + large);
+}
+
 TEST(TextBufferTest, ShortenedToEveryLength) {
     for (std::size_t size = 0; size <= 3; ++size) {
         TextBuffer buffer;

@@ -70,6 +70,12 @@ TEST_F(Allocation, SizesThatNoMemoryHas) {
     EXPECT_EQ(kst::allocate(limit + 1), nullptr);
     EXPECT_EQ(kst::allocate(SIZE_MAX), nullptr);
     EXPECT_EQ(gAllocatedBytes, before);
+    // The largest size of all is asked for; what is beyond it is not.
+    const ScriptedGate gate(0);
+    EXPECT_EQ(kst::allocate(limit + 1), nullptr);
+    EXPECT_EQ(kst::allocate(limit), nullptr);
+    EXPECT_EQ(gate.asked, std::vector<std::size_t>{limit});
+    EXPECT_EQ(gAllocatedBytes, before);
 }
 
 TEST_F(Allocation, ReleasingNullDoesNothing) {

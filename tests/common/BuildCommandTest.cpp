@@ -65,6 +65,14 @@ TEST_F(BuildCommand, WithoutPayload) {
     }
 }
 
+TEST_F(BuildCommand, PayloadOfOneByte) {
+    const std::uint8_t byte = 0xa7;
+    std::uint8_t* frame = LibCall_BuildCommand(26, 0, 0, &byte, 1, &size);
+    ASSERT_NE(frame, nullptr);
+    EXPECT_EQ(bytesOf(frame, size),
+              (std::vector<std::uint8_t>{'D', 'R', 'C', 'S', 26, 0, 0, 0, 0xa7}));
+}
+
 TEST_F(BuildCommand, NullPayloadWithASize) {
     expectNothingHappened(LibCall_BuildCommand(1, 0, 0, nullptr, 1, &size));
 }

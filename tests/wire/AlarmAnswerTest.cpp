@@ -13,6 +13,7 @@ using Timer = AlarmAnswer::Timer;
 TEST(AlarmAnswerTest, AnswerIsTheseBytes) {
     const AlarmAnswer answer{Timer::failed, false, 0x0102030405060708, "no"};
     EXPECT_EQ(encodeAlarmAnswer(answer), (Bytes{1, 2, 0, 8, 7, 6, 5, 4, 3, 2, 1, 'n', 'o'}));
+    EXPECT_EQ(encodeAlarmAnswer({}), (Bytes{1, 0, 1, 0, 0, 0, 0, 0, 0, 0, 0}));
 }
 
 TEST(AlarmAnswerTest, WhatIsWrittenIsRead) {

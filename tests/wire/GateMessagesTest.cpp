@@ -106,6 +106,9 @@ TEST(GateMessagesTest, Status) {
     EXPECT_EQ(encodeGateAnswer(partly),
               encodeGateAnswer(GateStatus{.closed = true}) + "gap 75736232\n");
     EXPECT_EQ(decodeGateAnswer(encodeGateAnswer(partly)), GateAnswer(partly));
+    EXPECT_EQ(encodeGateAnswer(GateStatus()),
+              "status\nlocked no\nstarting no\nsleeping no\nrestricted no\nclosed no\nallowed yes\n"
+              "password-set yes\nboot-argument no\nrefused 0\n");
     EXPECT_EQ(decodeGateAnswer(encodeGateAnswer(GateStatus())), GateAnswer(GateStatus()));
 }
 

@@ -7,6 +7,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <fstream>
 #include <iterator>
 #include <sstream>
@@ -54,6 +55,16 @@ TEST(TablesInPagesTest, WireFormatsListsTheCommandsAsTheyAre) {
             {base::concat(kind.code), kind.title, kind.payload, base::concat(kind.replyOffered)});
     }
     EXPECT_EQ(tableBelow(page("docs/wire-formats.md"), "| code | command"), wanted);
+}
+
+TEST(TablesInPagesTest, EachCommandIsFoundByItsCode) {
+    std::uint32_t last = 0;
+    for (const CommandKind& kind : kCommandKinds) {
+        EXPECT_EQ(findCommandKind(kind.code), &kind);
+        last = std::max<std::uint32_t>(last, kind.code);
+    }
+    EXPECT_EQ(findCommandKind(0), nullptr);
+    EXPECT_EQ(findCommandKind(last + 1), nullptr);
 }
 
 TEST(TablesInPagesTest, KernelSocketListsTheCommandsByTheSameNames) {
