@@ -2,11 +2,15 @@
 
 #include "KSTLib/Channel.h"
 #include "tests/KSTLib/KernelServerFixture.h"
+#include "tests/support/AssertionLines.h"
 #include "tests/support/ChildProcess.h"
 #include "tests/support/MemoryScan.h"
+#include "tests/support/ScriptedChannel.h"
+#include "tests/support/ScriptedRegistry.h"
 
 #include <gtest/gtest.h>
 
+#include <cerrno>
 #include <cstdlib>
 #include <filesystem>
 #include <future>
@@ -20,6 +24,9 @@
 namespace {
 
 using support::MemoryScan;
+
+/// How many handlers of forks the system has no memory for.
+int handlersRefused = 0;
 
 constexpr MemoryScan::Turned kTurnedSecret = {0x31, 0xe9, 0x74, 0x2c, 0xb5, 0x80, 0x1f, 0xd6,
                                               0x4a, 0xc3, 0x09, 0x7e, 0xa2, 0xf7, 0x5d, 0x18};
@@ -60,7 +67,49 @@ class Fork : public support::KernelServerFixture {
     KSTContextRef context = nullptr;
 };
 
+/// A library that nobody has used yet: the first times it asks for a handler it gets none. What its
+/// first call says is in `lines`.
+int exitStatusWithoutHandlers(int refused, const std::vector<std::string>& lines) {
+    handlersRefused = refused;
+    support::RecordingLog log;
+    support::ScriptedRegistry registry;
+    support::ScriptedChannel channel;
+    kst::installPlatform({log, registry, channel});
+    const KSTStatus first = kst::init();
+    const bool isRefused = !lines.empty();
+    const bool isRight = first == (isRefused ? -4 : 0) && kst::gChannelOpen != isRefused &&
+                         registry.classesAsked.empty() == isRefused &&
+                         support::textsWithoutLineNumbers(log) == lines;
+    return isRight && kst::init() == 0 && kst::gChannelOpen ? 0 : 1;
+}
+
 } // namespace
+
+// The names are the linker's. NOLINTBEGIN(bugprone-reserved-identifier)
+extern "C" {
+
+int __real_pthread_atfork(void (*prepare)(), void (*parent)(), void (*child)());
+
+int __wrap_pthread_atfork(void (*prepare)(), void (*parent)(), void (*child)()) {
+    if (handlersRefused > 0) {
+        --handlersRefused;
+        return ENOMEM;
+    }
+    return __real_pthread_atfork(prepare, parent, child);
+}
+
+} // extern "C"
+// NOLINTEND(bugprone-reserved-identifier)
+
+// In a process of its own, since a handler stays.
+TEST(ForkDeathTest, WithoutAHandlerNothingIsOpenedUntilThereIsOne) {
+    GTEST_FLAG_SET(death_test_style, "threadsafe");
+    const std::vector<std::string> line = {
+        "KSTLib: AssertMacros: watchForks() (value: 0x0),  file: "
+        "KSTLib/KSTLib:<n>\n"};
+    EXPECT_EXIT(std::_Exit(exitStatusWithoutHandlers(1, {})), testing::ExitedWithCode(0), "");
+    EXPECT_EXIT(std::_Exit(exitStatusWithoutHandlers(2, line)), testing::ExitedWithCode(0), "");
+}
 
 TEST_F(Fork, ChildBeginsWithoutAConnectionAndMakesItsOwn) {
     kst::gLogLevel = 35;

@@ -67,7 +67,7 @@ const std::vector<std::string_view> kInvalid = {
     // Half of a surrogate pair.
     "\"\\uD800\"", "\"\\uDBFF\"", "\"\\uDC00\"", "\"\\uDFFF\"", "\"\\uD800a\"", "\"\\uD800\\n\"",
     "\"\\uD800\\u0041\"", "\"\\uD800\\uD800\"", "\"\\uDC00\\uD800\"", "\"\\uD83D\\uDE00\\uDE00\"",
-    "\"a\\uDC00z\"", "{\"\\uDC00\":1}", "{\"\\uD800\":1}",
+    "\"a\\uDC00z\"", "{\"\\uDC00\":1}", "{\"\\uD800\":1}", "\"\\uD7FF\\uDC00\"",
     // Control characters.
     "\"\x01\"", "\"\x1F\"", "\"\t\"", "\"\n\"", "\"\r\"", "{\"\n\":1}", "\x01", "[1\x01]",
     // No UTF-8.

@@ -299,16 +299,19 @@ TEST_P(JSONContract, KeyThatIsNoTextIsLeftOutWithItsValue) {
 }
 
 TEST_P(JSONContract, WhatStandsBehindATextIsNoPartOfIt) {
-    constexpr std::string_view kMemory = "\xF0\x9F\x98\x80";
-    for (std::size_t size = 1; size < kMemory.size(); ++size) {
-        const auto text = makeText();
-        text->beginList();
-        text->text(kMemory.substr(0, size));
-        text->text("z");
-        text->endList();
-        EXPECT_EQ(finish(*text), R"(["z"])");
+    // The first character of each length, and one in the middle.
+    for (const std::string_view memory :
+         {"\xC2\x80", "\xE0\xA0\x80", "\xF0\x90\x80\x80", "\xF0\x9F\x98\x80"}) {
+        for (std::size_t size = 1; size < memory.size(); ++size) {
+            const auto text = makeText();
+            text->beginList();
+            text->text(memory.substr(0, size));
+            text->text("z");
+            text->endList();
+            EXPECT_EQ(finish(*text), R"(["z"])");
+        }
+        EXPECT_EQ(write(memory), base::concat("\"", memory, "\""));
     }
-    EXPECT_EQ(write(kMemory), base::concat("\"", kMemory, "\""));
 }
 
 TEST_P(JSONContract, TextThatIsMovedAwayAsItGrowsIsTheSame) {
