@@ -242,6 +242,10 @@ class TracedFunctions : public support::ContextFixture {
         call();
         const Lines lines = logged();
         kst::gLogLevel = 40;
+        // Only a check has a place in a source.
+        for (const auto& line : log.lines()) {
+            EXPECT_EQ(line.line == 0, line.text.find("AssertMacros") == std::string::npos);
+        }
         const std::string returning = std::string("KSTLib: ") + traced.returns + ": returning, ";
         return {!lines.empty() && lines.front() == called(traced.name),
                 !lines.empty() && lines.back().rfind(returning, 0) == 0};

@@ -162,6 +162,15 @@ TEST_F(EventStoreFailuresTest, PageDamagedAmongTheEvents) {
 }
 
 /// SQLite takes the first part of a log that is not as it was written for its end.
+TEST_F(EventStoreFailuresTest, TableThatIsGoneHasNoEvents) {
+    const Store store = makeStore();
+    store->addEventDict(event(1), kEventTable);
+    EXPECT_TRUE(store->executeSQL("drop table all_events"));
+    static_cast<void>(lines());
+    EXPECT_EQ(store->allEvents(), platform::ValueList());
+    EXPECT_EQ(lines(), Texts{"Error preparing statement: select data from all_events"});
+}
+
 TEST_F(EventStoreFailuresTest, DamagedLogEndsBeforeTheDamage) {
     const Store store = makeStore();
     ASSERT_EQ(OtherConnection(path).run("pragma wal_checkpoint(TRUNCATE)"), SQLITE_OK);

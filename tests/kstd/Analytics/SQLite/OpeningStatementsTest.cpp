@@ -257,6 +257,17 @@ TEST_F(OpeningStatementsTest, ReadOnlyConnectionFailsToBuild) {
     EXPECT_EQ(lines(), Texts());
 }
 
+TEST_F(OpeningStatementsTest, BuildWhoseDateCannotBeStoredLeavesNothing) {
+    const auto made = database("create table T (a, b); pragma query_only = on;");
+    EXPECT_FALSE(made->openWithError(nullptr));
+    EXPECT_FALSE(made->isOpen());
+    EXPECT_EQ(lines(),
+              Texts{"KSTDSQLite: Failed to step (8): \"insert or replace into Properties (key, "
+                    "value) values (?,?)\""});
+    OtherConnection other(path);
+    EXPECT_EQ(other.rows("select name from sqlite_master"), Texts());
+}
+
 /// Only the storage is tried again: any other failure stays as before.
 TEST_F(OpeningStatementsTest, BuildThatFailsForAnotherReasonCounts) {
     const NewConnections refusing([](sqlite3* db) {

@@ -2,6 +2,8 @@
 
 #include <stdexcept>
 
+struct RXOfNoNamespace {};
+
 namespace kstd {
 namespace {
 
@@ -306,6 +308,7 @@ struct RXUnnamed {
 
 TEST_F(QueryBuilderTest, RecordClassTellsItsName) {
     EXPECT_EQ(KSTDSQLiteClassName<RXEvent>(), "RXEvent");
+    EXPECT_EQ(KSTDSQLiteClassName<RXOfNoNamespace>(), "RXOfNoNamespace");
     EXPECT_EQ(KSTDSQLiteClassName<KSTDSQLite>(), "KSTDSQLite");
     EXPECT_EQ(KSTDSQLiteClassName<Renamed>(), "RXOther");
     EXPECT_EQ(KSTDSQLiteClassName<RXUnnamed>(), "");
