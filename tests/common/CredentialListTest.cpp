@@ -110,6 +110,16 @@ TEST_F(CredentialList, ThereAndBack) {
     expectLogged({});
 }
 
+TEST_F(CredentialList, OneElement) {
+    const Bytes bytes = listBytes({2});
+    ASSERT_EQ(read(bytes), 0);
+    ASSERT_EQ(count, 1U);
+    ASSERT_NE(list, nullptr);
+    EXPECT_EQ(list[0]->type, 2U);
+    EXPECT_EQ(written(), bytes);
+    DeallocCredentialList(list, count);
+}
+
 TEST_F(CredentialList, EveryTruncation) {
     const Bytes bytes = listBytes({4, 12, 4});
     for (std::size_t size = 0; size < bytes.size(); ++size) {

@@ -118,6 +118,22 @@ TEST_F(DeepRequirement, CountsThatNothingStandsBehind) {
     EXPECT_LT(asked, 4 * bytes.size());
 }
 
+TEST_F(DeepRequirement, NothingIsBuiltWhenOneChildIsMissing) {
+    Bytes bytes = support::compositeBytes(4, {support::leafBytes(1), support::leafBytes(1)});
+    {
+        const ScriptedGate gate;
+        ASSERT_EQ(DeserializeRequirement(bytes.data(), bytes.size(), &tree, &consumed), 0);
+        EXPECT_EQ(gate.asked, (std::vector<std::size_t>{36, 16, 16}));
+        DeallocRequirement(tree);
+        tree = nullptr;
+    }
+    bytes.resize(bytes.size() - 1);
+    const ScriptedGate gate;
+    EXPECT_EQ(DeserializeRequirement(bytes.data(), bytes.size(), &tree, &consumed), -3);
+    EXPECT_TRUE(gate.asked.empty());
+    expectLogged({failedCheck("size >= sizeof(KSTRequirement)"), failedCall(-3)});
+}
+
 TEST_F(DeepRequirement, FailedAllocationOfTheLevels) {
     // One level more than there is room for without any.
     const Bytes bytes = nestedBytes(33, 1, 1);

@@ -267,12 +267,17 @@ TEST_F(Requirement, CountWhoseNodeHasNoLength) {
     void* buffer = ::mmap(nullptr, size, PROT_READ | PROT_WRITE,
                           MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
     ASSERT_NE(buffer, MAP_FAILED);
-    const Bytes bytes = compositeBytes(4, 0x20000000U, {});
+    Bytes bytes = compositeBytes(4, 0x20000000U, {});
     std::memcpy(buffer, bytes.data(), bytes.size());
     const ScriptedGate gate;
     EXPECT_EQ(DeserializeRequirement(buffer, size, &tree, &consumed), -3);
-    EXPECT_TRUE(gate.asked.empty());
     expectLogged({failedCheck("reqSize - sizeof(KSTRequirement) <= UINT32_MAX")});
+    // With one child less it has one, and it is the first child that is none.
+    bytes = compositeBytes(4, 0x1fffffffU, {});
+    std::memcpy(buffer, bytes.data(), bytes.size());
+    EXPECT_EQ(DeserializeRequirement(buffer, size, &tree, &consumed), -3);
+    expectLogged({failedCheck("0"), failedCall(-3)});
+    EXPECT_TRUE(gate.asked.empty());
     ::munmap(buffer, size);
 }
 

@@ -141,7 +141,9 @@ TEST_F(VerifyPolicy, PolicyLengthsAboveTheLimit) {
 TEST_F(VerifyPolicy, TextWithoutAnEnd) {
     Result result;
     Bytes bytes(16 + 128, 'p');
+    const ScriptedGate gate;
     EXPECT_EQ(read(bytes, result), -3);
+    EXPECT_TRUE(gate.asked.empty());
     expectLogged({failedCheck("(size - offset) >= (policyLength + 1)")});
     bytes.push_back('p');
     EXPECT_EQ(read(bytes, result), -3);

@@ -101,6 +101,7 @@ TEST_F(ConfigurationTest, AddressesThatAreIgnored) {
         const char* reason;
     } kCases[] = {
         {"", kScheme},
+        {"collector", kScheme},
         {"collector.example/2/kst", kScheme},
         {"://collector.example", kScheme},
         {"2https://collector.example", kScheme},

@@ -255,8 +255,10 @@ TEST(BinaryPropertyListWriterTest, NestingIsBounded) {
     EXPECT_EQ(readBack(map), map);
     EXPECT_EQ(readBack(ValueList(3, list).front()), list);
     // What lies beside each other is not in each other.
-    const Value besides = ValueList(2 * platform::kMaxPropertyListDepth, Value(ValueList{}));
-    EXPECT_EQ(readBack(besides), besides);
+    for (const Value& each : {Value(ValueList{}), Value(ValueMap{})}) {
+        const Value besides = ValueList(2 * platform::kMaxPropertyListDepth, each);
+        EXPECT_EQ(readBack(besides), besides);
+    }
     const std::string line =
         "failed: a property list cannot hold lists and maps more than 128 deep in each other";
     EXPECT_EQ(written(ValueList{list}), line);
