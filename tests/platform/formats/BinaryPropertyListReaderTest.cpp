@@ -206,6 +206,18 @@ TEST(BinaryPropertyListReaderTest, TrailerMustFitTheFile) {
     }
 }
 
+TEST(BinaryPropertyListReaderTest, OffsetsOfSeveralBytesMustFitTheFile) {
+    for (const std::size_t width : {1U, 2U, 4U, 8U}) {
+        HandMadePropertyList list;
+        list.offsetWidth = width;
+        list.objects = {fromHex("09")};
+        Bytes file = list.bytes();
+        EXPECT_EQ(read(file), Value(true)) << width;
+        file[file.size() - 17] = 2;
+        EXPECT_EQ(read(file), std::nullopt) << width;
+    }
+}
+
 TEST(BinaryPropertyListReaderTest, OffsetsMustBeInTheObjectTable) {
     Bytes file = singleObject(fromHex("09"));
     std::uint8_t& offset = file[9];

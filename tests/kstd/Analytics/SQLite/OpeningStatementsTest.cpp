@@ -2,10 +2,13 @@
 
 #include "base/Concat.h"
 #include "base/NotCopied.h"
+#include "kstd/Analytics/SQLite/DatabaseFile.h"
 #include "tests/kstd/Analytics/SQLite/DatabaseFixture.h"
 
 #include <algorithm>
+#include <deque>
 #include <functional>
+#include <sqlite3.h>
 #include <utility>
 
 namespace kstd {
@@ -31,6 +34,53 @@ class NewConnections : private base::NotCopied {
     }
 
     static inline std::function<void(sqlite3*)> prepare_;
+};
+
+/// While it exists files of databases can be opened to which so many writes succeed in all. Those
+/// behind them fail with the code.
+class FailingWrites : private base::NotCopied {
+  public:
+    FailingWrites(std::size_t succeed, int code) : ownOpen_(files_->xOpen) {
+        left_ = succeed;
+        code_ = code;
+        files_->xOpen = [](sqlite3_vfs* /*files*/, const char* path, sqlite3_file* file, int flags,
+                           int* outFlags) {
+            return current_->open(path, file, flags, outFlags);
+        };
+        current_ = this;
+    }
+    ~FailingWrites() {
+        files_->xOpen = ownOpen_;
+        current_ = nullptr;
+    }
+
+  private:
+    int open(const char* path, sqlite3_file* file, int flags, int* outFlags) {
+        const int code = ownOpen_(files_, path, file, flags, outFlags);
+        if (file->pMethods != nullptr) {
+            ownWrite_ = file->pMethods->xWrite;
+            methods_.push_back(*file->pMethods);
+            methods_.back().xWrite = [](sqlite3_file* written, const void* bytes, int size,
+                                        sqlite3_int64 at) {
+                if (left_ == 0) {
+                    return code_;
+                }
+                --left_;
+                return ownWrite_(written, bytes, size, at);
+            };
+            file->pMethods = &methods_.back();
+        }
+        return code;
+    }
+
+    static inline FailingWrites* current_ = nullptr;
+    static inline std::size_t left_ = 0;
+    static inline int code_ = SQLITE_OK;
+    static inline decltype(sqlite3_io_methods::xWrite) ownWrite_ = nullptr;
+    /// For files that are still open at the end.
+    static inline std::deque<sqlite3_io_methods> methods_;
+    sqlite3_vfs* const files_ = sqlite3_vfs_find(registerDatabaseFiles());
+    decltype(sqlite3_vfs::xOpen) const ownOpen_;
 };
 
 class OpeningStatementsTest : public DatabaseFixture {
@@ -247,6 +297,33 @@ TEST_F(OpeningStatementsTest, BuildThatTheStorageFailsLeavesNothingAndIsTriedAga
         made->remove();
     }
     EXPECT_GE(pages, 5);
+}
+
+TEST_F(OpeningStatementsTest, BuildOfWhichAWriteFailsLeavesNothingAndIsTriedAgain) {
+    for (const int code : {SQLITE_IOERR_WRITE, SQLITE_NOMEM, SQLITE_CANTOPEN}) {
+        bool failed = true;
+        std::size_t writes = 0;
+        for (; failed; ++writes) {
+            SCOPED_TRACE(base::concat("code ", code, ", after ", writes, " writes"));
+            const auto made = database();
+            {
+                const FailingWrites failing(writes, code);
+                failed = !made->openWithError(nullptr);
+            }
+            static_cast<void>(lines());
+            if (failed) {
+                EXPECT_FALSE(made->isOpen());
+                EXPECT_EQ(OtherConnection(path).rows("select name from sqlite_master"), Texts());
+                ASSERT_TRUE(made->openWithError(nullptr));
+                EXPECT_EQ(lines(), Texts());
+            }
+            EXPECT_EQ(made->allTableNames(), (Texts{"Properties", "T"}));
+            made->close();
+            made->remove();
+            static_cast<void>(lines());
+        }
+        EXPECT_GE(writes, 5U);
+    }
 }
 
 TEST_F(OpeningStatementsTest, ReadOnlyConnectionFailsToBuild) {
