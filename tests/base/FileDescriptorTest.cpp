@@ -26,6 +26,7 @@ TEST(FileDescriptorTest, ZeroIsOneAndMinusOneIsNone) {
     EXPECT_TRUE(first.isOpen());
     EXPECT_EQ(first.release(), 0);
     EXPECT_FALSE(first.isOpen());
+    EXPECT_EQ(first.get(), -1);
     EXPECT_FALSE(FileDescriptor().isOpen());
     EXPECT_EQ(FileDescriptor().get(), -1);
     EXPECT_FALSE(FileDescriptor(-1).isOpen());

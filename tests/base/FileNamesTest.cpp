@@ -8,6 +8,7 @@ using base::withoutDots;
 TEST(FileNames, TheDirectoryIsWhatStandsBeforeTheLastName) {
     EXPECT_EQ(directoryOf("/a/b/c"), "/a/b");
     EXPECT_EQ(directoryOf("/a"), "/");
+    EXPECT_EQ(directoryOf("a"), "/");
     EXPECT_EQ(directoryOf("/"), "/");
     EXPECT_EQ(directoryOf("/a/b/"), "/a/b");
 }

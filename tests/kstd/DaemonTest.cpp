@@ -1,5 +1,6 @@
 #include "kstd/Daemon.h"
 
+#include "KSTLib/Platform.h"
 #include "platform/EventStream.h"
 #include "tests/kstd/DaemonFixture.h"
 #include "tests/support/HostWith.h"
@@ -72,6 +73,12 @@ TEST_F(DaemonTest, WholeLogOfALifeWithoutEvents) {
     EXPECT_THAT(lines(), ElementsAre("kstd: main: Started service - only.",
                                      "kstd: main: Entering the main runloop.",
                                      "kstd: main: Stoping service - only."));
+}
+
+TEST_F(DaemonTest, TheLibraryLosesItsPlatformWithTheDaemon) {
+    EXPECT_NE(kst::installedPlatform(), nullptr);
+    library.reset();
+    EXPECT_EQ(kst::installedPlatform(), nullptr);
 }
 
 TEST_F(DaemonTest, EventsOfBothStreamsReachEveryServiceInOrderOfArrival) {

@@ -25,6 +25,32 @@ Value rebuilt(const Value& value) {
     return builder.take();
 }
 
+/// Keeps the names of the kinds that it has no operation for.
+struct OtherKinds final : platform::ValueSink {
+    void beginMap() override {}
+    void key(std::string_view /*key*/) override {}
+    void endMap() override {}
+    void beginList() override {}
+    void endList() override {}
+    void null() override {}
+    void boolean(bool /*value*/) override {}
+    void integer(std::int64_t /*value*/) override {}
+    void largeInteger(std::uint64_t /*value*/) override {}
+    void real(double /*value*/) override {}
+    void text(std::string_view /*utf8*/) override {}
+    void bytes(std::span<const std::uint8_t> /*value*/) override {}
+    void date(Timestamp /*value*/) override {}
+    void other(std::string_view kind) override { names.emplace_back(kind); }
+
+    std::vector<std::string> names;
+};
+
+TEST(ValueBuilderTest, KindsWithoutAnOperationAreTheirNames) {
+    OtherKinds kinds;
+    describe(ValueList{UniqueIdentifier(), true, Link(), "text", Error(), ValueMap()}, kinds);
+    EXPECT_EQ(kinds.names, (std::vector<std::string>{"identifier", "link", "error"}));
+}
+
 TEST(ValueBuilderTest, NumbersComeBackInTheirWidestKind) {
     constexpr auto kMostSigned = std::numeric_limits<std::int64_t>::max();
     constexpr auto kMostUnsigned = std::numeric_limits<std::uint64_t>::max();

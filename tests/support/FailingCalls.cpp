@@ -2,6 +2,7 @@
 
 #include <cerrno>
 #include <cstddef>
+#include <poll.h>
 #include <sys/stat.h>
 #include <unistd.h>
 #include <utility>
@@ -30,6 +31,8 @@ ssize_t __real_read(int descriptor, void* data, std::size_t size);
 int __real_fstat(int descriptor, struct stat* status);
 ssize_t __real_recv(int socket, void* data, std::size_t size, int flags);
 ssize_t __real_recvmsg(int socket, msghdr* message, int flags);
+ssize_t __real_send(int socket, const void* data, std::size_t size, int flags);
+int __real_poll(pollfd* watched, nfds_t count, int milliseconds);
 
 ssize_t __wrap_read(int descriptor, void* data, std::size_t size) {
     return failsWith(FailingCalls::read) ? -1 : __real_read(descriptor, data, size);
@@ -41,6 +44,14 @@ int __wrap_fstat(int descriptor, struct stat* status) {
 
 ssize_t __wrap_recv(int socket, void* data, std::size_t size, int flags) {
     return failsWith(FailingCalls::recv) ? -1 : __real_recv(socket, data, size, flags);
+}
+
+ssize_t __wrap_send(int socket, const void* data, std::size_t size, int flags) {
+    return failsWith(FailingCalls::send) ? -1 : __real_send(socket, data, size, flags);
+}
+
+int __wrap_poll(pollfd* watched, nfds_t count, int milliseconds) {
+    return failsWith(FailingCalls::poll) ? -1 : __real_poll(watched, count, milliseconds);
 }
 
 ssize_t __wrap_recvmsg(int socket, msghdr* message, int flags) {

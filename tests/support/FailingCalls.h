@@ -14,6 +14,8 @@ struct FailingCalls {
     static inline std::deque<int> read;
     static inline std::deque<int> fstat;
     static inline std::deque<int> recv;
+    static inline std::deque<int> send;
+    static inline std::deque<int> poll;
     /// Gives what the call returns, with errno set when that is negative.
     static inline std::deque<std::function<ssize_t(msghdr& message)>> recvmsg;
 };

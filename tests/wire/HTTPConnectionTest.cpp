@@ -6,6 +6,7 @@
 
 #include <array>
 #include <cerrno>
+#include <fcntl.h>
 #include <string>
 #include <sys/socket.h>
 #include <thread>
@@ -105,6 +106,54 @@ TEST_F(HTTPConnectionTest, ReceiveThatIsInterruptedIsDoneAgainAndOneThatFailsIsA
     write(wire::encodeHTTPBodyWanted(8));
     support::FailingCalls::recv = {ECONNRESET};
     EXPECT_EQ(receive(), State::hungUp);
+}
+
+TEST_F(HTTPConnectionTest, SendThatIsInterruptedIsDoneAgainAndOneThatFailsIsAHangUp) {
+    const Bytes message = wire::encodeHTTPBodyWanted(7);
+    support::FailingCalls::send = {EINTR, EAGAIN, EINTR};
+    EXPECT_EQ(connection_->send(message), State::open);
+    Bytes received(message.size());
+    EXPECT_EQ(::recv(peer_.get(), received.data(), received.size(), MSG_DONTWAIT),
+              static_cast<ssize_t>(received.size()));
+    EXPECT_EQ(received, message);
+    support::FailingCalls::send = {ECONNRESET};
+    EXPECT_EQ(connection_->send(message), State::hungUp);
+    EXPECT_EQ(::recv(peer_.get(), received.data(), received.size(), MSG_DONTWAIT), -1);
+}
+
+TEST_F(HTTPConnectionTest, WaitThatIsInterruptedIsDoneAgainAndOneThatFailsIsAHangUp) {
+    support::FailingCalls::recv = {EAGAIN};
+    support::FailingCalls::poll = {EINTR, EINTR};
+    write(wire::encodeHTTPBodyWanted(7));
+    EXPECT_EQ(receive(), State::open);
+    EXPECT_TRUE(support::FailingCalls::poll.empty());
+    support::FailingCalls::poll = {ENOMEM};
+    EXPECT_EQ(receive(), State::hungUp);
+    support::FailingCalls::send = {EAGAIN};
+    support::FailingCalls::poll = {ENOMEM};
+    EXPECT_EQ(connection_->send(wire::encodeHTTPWorking()), State::hungUp);
+}
+
+TEST_F(HTTPConnectionTest, WaitEndsWithTheInterruptAndNotBeforeWhatHasCome) {
+    int ends[2] = {-1, -1};
+    ASSERT_EQ(::pipe2(ends, O_CLOEXEC), 0);
+    const base::FileDescriptor interrupt(ends[0]);
+    base::FileDescriptor other(ends[1]);
+    HTTPConnection interrupted(base::FileDescriptor(::dup(peer_.get())), 30s, interrupt.get());
+    other.reset();
+    EXPECT_EQ(interrupted.receive(message_), State::interrupted);
+    EXPECT_EQ(connection_->send(wire::encodeHTTPBodyWanted(7)), State::open);
+    support::FailingCalls::recv = {EAGAIN};
+    EXPECT_EQ(interrupted.receive(message_), State::open);
+    EXPECT_EQ(wire::decodeHTTPBodyWanted(message_.fields), 7U);
+}
+
+TEST_F(HTTPConnectionTest, EarlierOfTheTwoEndsCounts) {
+    connection_->endAt(HTTPConnection::Clock::now() + 5ms);
+    EXPECT_EQ(receive(), State::timedOut);
+    connect(5ms);
+    connection_->endAt(HTTPConnection::Clock::now() + 1h);
+    EXPECT_EQ(receive(), State::timedOut);
 }
 
 TEST_F(HTTPConnectionTest, WhatIsNoMessage) {

@@ -161,6 +161,18 @@ TEST_F(EventStoreTest, ThrowingVisitorLeavesTheStoreUsable) {
     EXPECT_EQ(lines(), Texts());
 }
 
+TEST_F(EventStoreTest, TransactionOfSomebodyElseIsNotEnded) {
+    const Store store = makeStore();
+    { const UnchangingEvents events(*store); }
+    EXPECT_EQ(lines(), Texts());
+    store->begin();
+    { const UnchangingEvents events(*store); }
+    static_cast<void>(lines());
+    EXPECT_EQ(sqlite3_get_autocommit(store->db()), 0);
+    store->end();
+    EXPECT_EQ(lines(), Texts());
+}
+
 TEST_F(EventStoreTest, AnotherTableTakesEventsToo) {
     const Store store = makeStore();
     ASSERT_TRUE(store->executeSQL("create table more (data, timestamp)"));

@@ -63,14 +63,18 @@ TEST_F(LoggerTest, OneInstanceForAllThreads) {
 TEST_F(LoggerTest, TheLifetimesEndReleasesLoggersStoresAndTheSystemsVersion) {
     setVersion("B1", "P1");
     std::weak_ptr<Analytics> first;
+    std::weak_ptr<TQAnalyticsLoggerSQLiteStore> store;
     {
         const AnalyticsLifetime shorter;
         first = Analytics::logger(fake.host());
+        store = TestLogger::logger(fake.host())->fields.database;
         EXPECT_FALSE(first.expired());
+        EXPECT_FALSE(store.expired());
         ValueMap version;
         KSTDAnalyticsLogger::addOSVersion(version, fake.version);
     }
     EXPECT_TRUE(first.expired());
+    EXPECT_TRUE(store.expired());
     setVersion("B2", "P2");
     const auto document = Analytics::logger(fake.host())->getLoggingJSON();
     ASSERT_TRUE(document);

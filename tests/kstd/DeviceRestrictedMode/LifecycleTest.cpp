@@ -149,6 +149,9 @@ TEST_F(LifecycleTest, StartWithAnAnalyticsFileWhileTheKernelIsAbsent) {
 
 TEST_F(LifecycleTest, StopWritesItsTwoLinesAndDoesNothingElse) {
     service->stop();
+    for (const auto& line : fake.log.lines()) {
+        EXPECT_EQ(line.level, platform::LogLevel::info);
+    }
     EXPECT_THAT(lines(), ElementsAre("kstd: -[DeviceRestrictedModeService stop]: called, .",
                                      "kstd: -[DeviceRestrictedModeService stop]: returning, ."));
     EXPECT_THAT(requests(), IsEmpty());

@@ -205,6 +205,8 @@ TEST_P(JSONContract, WrittenIntegers) {
                               std::numeric_limits<std::uint64_t>::max()}),
               "[-9223372036854775808,9223372036854775807,18446744073709551615]");
     EXPECT_EQ(write(std::uint64_t{1} << 63), "9223372036854775808");
+    EXPECT_EQ(write(ValueList(2, Value(std::numeric_limits<std::uint64_t>::max()))),
+              "[18446744073709551615,18446744073709551615]");
 }
 
 TEST_P(JSONContract, RealsAlwaysHaveAFraction) {
@@ -416,6 +418,9 @@ TEST_P(JSONContract, RewoundInAList) {
         text->key("gone");
         text->beginList();
         text->integer(1);
+        text->rewind(mark);
+        text->beginMap();
+        text->key("gone");
         text->rewind(mark);
         text->boolean(true);
         text->endList();

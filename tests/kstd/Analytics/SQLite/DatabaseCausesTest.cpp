@@ -75,6 +75,42 @@ TEST_F(DatabaseCausesTest, WhatPassesIsToldAgainAfterARowWasWritten) {
     }
 }
 
+TEST_F(DatabaseCausesTest, SystemsReasonIsToldOnlyWhereItBelongsToTheFailure) {
+    sqlite3* db = nullptr;
+    ASSERT_EQ(sqlite3_open_v2(directory.path().c_str(), &db, SQLITE_OPEN_READWRITE, nullptr),
+              SQLITE_CANTOPEN);
+    const std::pair<int, std::string> kCodes[] = {
+        {SQLITE_IOERR, "disk I/O error (10), Is a directory"},
+        {SQLITE_CANTOPEN, "unable to open database file (14), Is a directory"},
+        {SQLITE_FULL, "database or disk is full (13)"},
+        {SQLITE_ERROR, "SQL logic error (1)"}};
+    for (const auto& [code, cause] : kCodes) {
+        DatabaseCauses(&log, path).tell(code, db);
+        EXPECT_EQ(warnings(), Texts{told(cause)});
+    }
+    sqlite3_close_v2(db);
+    DatabaseCauses(&log, path).tell(SQLITE_IOERR, nullptr);
+    EXPECT_EQ(warnings(), Texts{told("disk I/O error (10)")});
+}
+
+TEST_F(DatabaseCausesTest, DirectoryIsToldAgainAfterARowWasWritten) {
+    DatabaseCauses causes(&log, path);
+    for (int round = 0; round < 2; ++round) {
+        causes.tellOfDirectory("there is no directory");
+        causes.tellOfDirectory("there is no directory");
+        EXPECT_EQ(warnings(), Texts{"kstd: Database: there is no directory."});
+        causes.wrote();
+    }
+}
+
+TEST_F(DatabaseCausesTest, TextThatCannotBePreparedIsToldWithItsCause) {
+    const auto opened = openDatabase();
+    EXPECT_EQ(opened->statementForSQL("nonsense"), nullptr);
+    ASSERT_EQ(log.lines().size(), 2U);
+    EXPECT_EQ(log.lines()[0].text, "Error preparing statement: nonsense");
+    EXPECT_EQ(log.lines()[1].text, told("SQL logic error (1)"));
+}
+
 TEST_F(DatabaseCausesTest, OthersLocksAreAwaitedFiveMinutes) {
     const DatabaseEnvironment usual{
         .log = log, .clock = environment.clock, .propertyLists = environment.propertyLists};
