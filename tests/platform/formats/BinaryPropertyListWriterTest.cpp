@@ -258,6 +258,7 @@ TEST(BinaryPropertyListWriterTest, NestingIsBounded) {
     for (const Value& each : {Value(ValueList{}), Value(ValueMap{})}) {
         const Value besides = ValueList(2 * platform::kMaxPropertyListDepth, each);
         EXPECT_EQ(readBack(besides), besides);
+        EXPECT_EQ(readBack(ValueList{besides}), ValueList{besides});
     }
     const std::string line =
         "failed: a property list cannot hold lists and maps more than 128 deep in each other";

@@ -164,6 +164,12 @@ TEST(XMLPropertyListReaderTest, NestingOfXMLIsBounded) {
         EXPECT_EQ(read(maps).has_value(), isRead) << depth;
         EXPECT_EQ(read(repeated("<array>", depth)), std::nullopt);
     }
+    // What lies beside each other is not in each other.
+    for (const std::size_t depth : {1UL, 2UL}) {
+        EXPECT_TRUE(read(repeated("<array>", depth) + repeated("<array/>", 2 * kMost) +
+                         repeated("</array>", depth)))
+            << depth;
+    }
 }
 
 TEST(XMLPropertyListReaderTest, NumberOfContainersInXMLIsBounded) {
