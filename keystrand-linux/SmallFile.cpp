@@ -70,11 +70,6 @@ SmallFile readSmallFile(int directory, const std::string& path, std::size_t limi
 
 SmallFile readSmallFileUntil(int directory, const char* name, std::size_t limit,
                              ReadDeadline until) {
-    if (std::chrono::steady_clock::now() >= until) {
-        SmallFile file;
-        file.error = ETIMEDOUT;
-        return file;
-    }
     const Interruptions interruptions(until);
     return readFile(directory, name, limit, until);
 }

@@ -53,7 +53,8 @@ class Interruptions : private base::NotCopied {
 };
 
 /// The same of a file on which the kernel may have its reader wait as long as it is busy. ETIMEDOUT
-/// when it still was at that time, and at once when the time is over.
+/// when it still is at that time, a few milliseconds later when the time is over; whoever need not
+/// wait reads, however late it is.
 [[nodiscard]] SmallFile readSmallFileUntil(int directory, const char* name, std::size_t limit,
                                            ReadDeadline until);
 

@@ -23,6 +23,9 @@ constexpr BootTime kBlindTime = std::chrono::minutes(1);
 /// So long, and once more for what the kernel did not take, something may come late.
 constexpr BootTime kRestoreTime = 2 * GatePolicy::kLateTime;
 
+/// So long a refused device is waited for that has not said all.
+constexpr BootTime kNameTime = std::chrono::seconds(2);
+
 /// So long a start of the machine waits for what devices say.
 constexpr BootTime kSetUpTime = std::chrono::seconds(5);
 
@@ -372,7 +375,13 @@ bool UsbGate::step() {
             return glance.has_value();
         }
     }
-    const auto view = lookAtBus();
+    auto view = lookAtBus();
+    // What is refused anyway can wait for its names to be told.
+    for (int again = 0; again < kMostRounds && view && policy_.closed() && awaitsNames(*view) &&
+                        parts_.now() < now + kNameTime;
+         ++again) {
+        view = lookAtBus();
+    }
     if (!view) {
         policy_.endLate(now);
         return false;
@@ -382,6 +391,19 @@ bool UsbGate::step() {
         saveDevices(*view);
     }
     return carryOut(actions, now);
+}
+
+/// Whether something new has not said all, and nothing new is in that would have to go at once.
+bool UsbGate::awaitsNames(const BusView& view) const {
+    bool awaits = false;
+    for (const UsbDevice& device : view.devices) {
+        const bool isNew = policy_.find(device.attachment) == nullptr;
+        if (isNew && device.authorized) {
+            return false;
+        }
+        awaits = awaits || (isNew && !device.saidAll);
+    }
+    return awaits;
 }
 
 bool UsbGate::carryOut(const std::vector<GateAction>& actions, BootTime now) {

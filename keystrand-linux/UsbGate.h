@@ -102,6 +102,7 @@ class UsbGate : private base::NotCopied {
     [[nodiscard]] std::optional<BusView> lookAtBus(Look at = &UsbBus::look);
     void settle();
     [[nodiscard]] bool step();
+    [[nodiscard]] bool awaitsNames(const BusView& view) const;
     [[nodiscard]] bool carryOut(const std::vector<GateAction>& actions, BootTime now);
     void tellState();
     void tellFailure(const std::string& line);

@@ -517,6 +517,45 @@ TEST_F(UsbGateTest, RefusedDeviceThatHasNotSaidAllIsNamedByWhatIsKnown) {
     EXPECT_EQ(log.take(), Lines{"keystrand: refused 1-1 (1111:2222 busy, classes 08/06/50)"});
 }
 
+TEST_F(UsbGateTest, RefusedDeviceIsWaitedForShortlyForItsNames) {
+    gate->setClosed(true);
+    log.take();
+    int looks = 0;
+    bus.setBusy("1-1");
+    bus.setHanging([&] {
+        now += 100ms;
+        bus.setBusy("1-1", ++looks < 10);
+    });
+    bus.plug("1-1", aDisk());
+    EXPECT_EQ(log.take(),
+              Lines{R"(keystrand: refused 1-1 (1111:2222 "maker" "disk", classes 08/06/50))"});
+    // Not for ever, and not again when that is told.
+    bus.setBusy("1-2");
+    bus.setHanging([&] { now += 100ms; });
+    const BootTime began = now;
+    bus.plug("1-2", aDisk());
+    EXPECT_LE(now, began + 3s);
+    EXPECT_EQ(log.take(), Lines{"keystrand: refused 1-2 (1111:2222 busy, classes 08/06/50)"});
+    const BootTime told = now;
+    gate->look();
+    EXPECT_LE(now, told + 200ms);
+}
+
+TEST_F(UsbGateTest, NoNamesAreWaitedForWhileSomethingNewIsIn) {
+    gate->setClosed(true);
+    bus.watch(nullptr);
+    bus.setRootHubDefault(1, kEverybody);
+    bus.plug("1-1", aDisk());
+    bus.setRootHubDefault(1, kHardWiredOnly);
+    bus.setBusy("1-2");
+    bus.plug("1-2", aDisk());
+    int looks = 0;
+    bus.setHanging([&] { looks += bus.isAuthorized("1-1") ? 1 : 0; });
+    gate->look();
+    EXPECT_FALSE(bus.isAuthorized("1-1"));
+    EXPECT_EQ(looks, 1);
+}
+
 TEST_F(UsbGateTest, WhatCouldNotBeClosedIsNamedAndTriedAgain) {
     bus.plug("1-1", aMouse());
     bus.failDefaults();
