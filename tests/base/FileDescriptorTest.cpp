@@ -1,5 +1,7 @@
 #include "base/FileDescriptor.h"
 
+#include "tests/support/ChildProcess.h"
+
 #include <gtest/gtest.h>
 
 #include <cerrno>
@@ -47,6 +49,15 @@ TEST(FileDescriptorTest, ClosesAtItsEndAndWhenItIsReset) {
     EXPECT_FALSE(owner.isOpen());
     EXPECT_FALSE(isOpenInTheProcess(another));
     owner.reset();
+}
+
+TEST(FileDescriptorTest, ZeroIsClosedToo) {
+    EXPECT_EQ(support::exitStatusOfChild([] {
+                  const bool isThere = ::dup2(openedNumber(), 0) == 0;
+                  { const FileDescriptor owner(0); }
+                  return isThere && !isOpenInTheProcess(0) ? 0 : 1;
+              }),
+              0);
 }
 
 TEST(FileDescriptorTest, MovingHandsItOverAndClosesWhatWasThere) {

@@ -1,8 +1,13 @@
 #include "base/TextBuffer.h"
 
+#include "tests/support/ChildProcess.h"
+
 #include <gtest/gtest.h>
 
+#include <fstream>
+#include <new>
 #include <string>
+#include <sys/resource.h>
 #include <utility>
 
 namespace {
@@ -78,6 +83,47 @@ TEST(TextBufferTest, OneByteGoesAlongIntoPages) {
     buffer.append(large);
     EXPECT_EQ(buffer.view(), 'x' + large);
 }
+
+TEST(TextBufferTest, PagesAreGivenBack) {
+    const auto pagesOfTheProcess = [] {
+        std::size_t pages = 0;
+        std::ifstream("/proc/self/statm") >> pages;
+        return pages;
+    };
+    const std::string large(1 << 20, 'x');
+    const std::size_t before = pagesOfTheProcess();
+    for (int round = 0; round < 100; ++round) {
+        TextBuffer buffer;
+        buffer.append(large);
+    }
+    EXPECT_LT(pagesOfTheProcess(), before + 50 * large.size() / 4096);
+}
+
+#ifndef KSTD_SANITIZED // Which takes more addresses than any limit.
+TEST(TextBufferTest, WantOfMemoryIsThrownAndLeavesTheText) {
+    EXPECT_EQ(support::exitStatusOfChild([] {
+                  constexpr rlim_t kMost = 1UL << 30U;
+                  const rlimit limit{kMost, kMost};
+                  TextBuffer buffer;
+                  buffer.append("text");
+                  const std::string piece(1 << 20, 'x');
+                  std::size_t added = 0;
+                  if (::setrlimit(RLIMIT_AS, &limit) != 0) {
+                      return 1;
+                  }
+                  try {
+                      for (; added <= kMost; added += piece.size()) {
+                          buffer.append(piece);
+                      }
+                  } catch (const std::bad_alloc&) {
+                      return buffer.size() == 4 + added && buffer.view().starts_with("textx") ? 0
+                                                                                              : 2;
+                  }
+                  return 3;
+              }),
+              0);
+}
+#endif
 
 TEST(TextBufferTest, ShortenedToEveryLength) {
     for (std::size_t size = 0; size <= 3; ++size) {
