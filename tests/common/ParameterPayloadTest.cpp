@@ -231,11 +231,14 @@ TYPED_TEST(ParameterPayload, ParameterWithoutAValueIsReadButNotWritten) {
 
 TYPED_TEST(ParameterPayload, LengthWithoutAPointer) {
     const std::vector<ParameterValue> parameters = {{1, {1, 2, 3, 4}}, {3, {1}}};
-    ParameterArray array(parameters);
-    array[1].parameterData = nullptr;
-    this->expectNotWritten(
-        array.data(), 2, 1000,
-        {this->failedCheck("param->parameterData || !param->parameterDataLength")});
+    for (std::size_t i = 0; i < parameters.size(); ++i) {
+        ParameterArray array(parameters);
+        array[i].parameterData = nullptr;
+        this->expectNotWritten(
+            array.data(), 2, 1000,
+            {this->failedCheck("param->parameterData || !param->parameterDataLength")});
+        this->log.clear();
+    }
 }
 
 TYPED_TEST(ParameterPayload, CountAndArrayOnlyTogether) {
