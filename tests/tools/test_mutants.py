@@ -207,6 +207,23 @@ class MutantsTest(unittest.TestCase):
             self.assertEqual((status, len(text.splitlines())), (0, lines))
         self.assertEqual(self.mutants("--list", "wire")[0], 1)
 
+    def test_what_is_the_same_from_either_side_is_not_turned_round(self):
+        self.write("common/Sides.cpp", """#include <utility>
+int less(int left, int right);
+int saturatingAdd(int left, int right);
+int both(int a, int b) {
+    int sum = 0;
+    std::swap(a, b);
+    if (__builtin_add_overflow(a, b, &sum)) { return saturatingAdd(a, b); }
+    return less(a, b);
+}
+""")
+        self.addCleanup(os.remove, os.path.join(self.directory.name, "common/Sides.cpp"))
+        status, text = self.mutants("--list", "common/Sides.cpp")
+        self.assertEqual(status, 0)
+        self.assertEqual([line for line in text.splitlines() if "swap-arguments" in line],
+                         ["common/Sides.cpp: both: swap-arguments: less(a, b) -> less(b, a)"])
+
     def test_a_sample_is_the_same_each_time(self):
         first, second, other = (self.mutants("--list", "--every", "3", "--seed", seed)[1] for seed in "112")
         self.assertEqual(first, second)

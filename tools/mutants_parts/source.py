@@ -510,8 +510,9 @@ class Source:
             if count:
                 self.replace(start, end, "min-max", text)
         what = cursor.referenced
-        # To a comparison for equality the order is all one.
-        if (what is None or what.kind != Kind.CONSTRUCTOR) and not re.search(r"(?i)equal|memcmp|same|min|max", name):
+        # To a comparison for equality, a swap, a sum and a product the order is all one.
+        if (what is None or what.kind != Kind.CONSTRUCTOR) and not re.search(
+                r"(?i)equal|memcmp|same|min|max|^swap$|^saturating(Add|Multiply)$|_(add|mul)_overflow$", name):
             self.swapped_arguments(cursor, arguments)
         for child in cursor.get_children():
             if child.kind.is_expression():
