@@ -9,6 +9,7 @@
 #include <array>
 #include <cstring>
 #include <limits>
+#include <optional>
 #include <thread>
 
 namespace {
@@ -168,6 +169,39 @@ TEST_F(Allocation, ChildForgetsWhatOtherThreadsHeldAndNothingElse) {
                   std::thread([] { kst::CallBuffer::wipeThoseOfOtherThreads(); }).join();
                   const bool known = own == kForgotten && left == secret();
                   return (wiped ? 0 : 1) + (kept ? 0 : 2) + (once ? 0 : 4) + (known ? 0 : 8);
+              }),
+              0);
+}
+
+TEST_F(Allocation, WhatHeldNothingOrHasLeftTakesNobodyAlong) {
+    EXPECT_EQ(support::exitStatusOfChild([] {
+                  Secret left = secret();
+                  Secret held = secret();
+                  std::optional<kst::CallBuffer> gone;
+                  gone.emplace(left.data(), left.size());
+                  gone->leave();
+                  kst::CallBuffer mine(held.data(), held.size());
+                  gone.reset();
+                  { const kst::CallBuffer nothing(nullptr, 24); }
+                  std::thread([] { kst::CallBuffer::wipeThoseOfOtherThreads(); }).join();
+                  return (held == kForgotten ? 0 : 1) + (left == secret() ? 0 : 2);
+              }),
+              0);
+}
+
+TEST_F(Allocation, WhatWasKeptMayLeave) {
+    EXPECT_EQ(support::exitStatusOfChild([] {
+                  Secret first = secret();
+                  Secret second = secret();
+                  Secret third = secret();
+                  kst::CallBuffer one(first.data(), first.size());
+                  kst::CallBuffer two(second.data(), second.size());
+                  kst::CallBuffer three(third.data(), third.size());
+                  kst::CallBuffer::wipeThoseOfOtherThreads();
+                  one.leave();
+                  std::thread([] { kst::CallBuffer::wipeThoseOfOtherThreads(); }).join();
+                  return (first == secret() ? 0 : 1) + (second == kForgotten ? 0 : 2) +
+                         (third == kForgotten ? 0 : 4);
               }),
               0);
 }
