@@ -2,6 +2,7 @@
 #include "KSTLib/LibCall.h"
 #include "tests/common/CredentialSamples.h"
 #include "tests/support/ScriptedGate.h"
+#include "wire/CredentialFields.h"
 
 #include <gtest/gtest.h>
 
@@ -306,6 +307,20 @@ TEST_F(CredentialProperties, StoredPassphraseLengthAbove128) {
     for (const std::uint32_t length : {128U, 129U, 0x80000000U, 0xffffffffU}) {
         support::putU32(bytes, 36, length);
         EXPECT_EQ(found(bytes, 200), (Found{40, 128}));
+    }
+}
+
+TEST_F(CredentialProperties, PassphraseLengthIsNeverMoreThanTheDataHas) {
+    Bytes bytes = credentialBytes(2);
+    support::putU32(bytes, 36, 128);
+    for (const std::uint32_t room : {0U, 1U, 127U, 128U}) {
+        support::putU32(bytes, 28, 8 + room);
+        EXPECT_EQ(wire::passphraseLength(support::asCredential(bytes)), room);
+    }
+    // Too short for the length itself.
+    for (std::uint32_t dataLength = 0; dataLength < 8; ++dataLength) {
+        support::putU32(bytes, 28, dataLength);
+        EXPECT_EQ(wire::passphraseLength(support::asCredential(bytes)), 0U) << dataLength;
     }
 }
 
