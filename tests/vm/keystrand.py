@@ -88,8 +88,12 @@ class Keystrand:
         """What kstctl shows for these words."""
         return json.loads(self.vm.run(f"kstctl --json {words}"))
 
+    def status(self):
+        """Status 5 is that something is not known: the daemon may just be making its database."""
+        return json.loads(self.vm.run("kstctl --json status 2>/dev/null || [ $? -eq 5 ]"))
+
     def gate(self):
-        return self.kstctl("status")["gate"]
+        return self.status()["gate"]
 
     def listed(self, name):
         """What kstctl says of the device with this name."""
@@ -97,7 +101,7 @@ class Keystrand:
 
     def await_saved(self, check):
         """Waits until what kstd has on disk for the next start is so."""
-        self.vm.until("kstd has saved the state", lambda: check(self.kstctl("status")["stateFile"]))
+        self.vm.until("kstd has saved the state", lambda: check(self.status()["stateFile"]))
 
     def await_gate(self, **expected):
         """Waits until kstctl shows these of the gate, and returns all."""

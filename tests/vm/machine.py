@@ -208,14 +208,47 @@ class Machine:
         self.agent.put("systemctl poweroff")
         self.wait_end()
 
-    def sleep(self):
-        """Returns when the machine sleeps; wakes by wake(), or by an alarm of its own."""
+    def sleep(self, kind="deep"):
+        """Returns when the machine sleeps: in memory ("deep"), from which it wakes by wake() or by an alarm of its
+        own; or with all frozen and its devices asleep ("s2idle"), from which only its power button wakes it, as QEMU
+        has nothing else that interrupts it then."""
+        if kind != "deep":
+            self.run(f"echo {kind} >/sys/power/mem_sleep; echo 7 >/proc/sys/kernel/printk")
         self.run("systemctl suspend >/run/suspend 2>&1 &")
-        self.wait_event("SUSPEND")
+        if kind == "deep":
+            self.wait_event("SUSPEND")
+        else:
+            self.wait_frozen(kind)
 
-    def wake(self):
-        self.qmp("system_wakeup")
-        self.wait_event("WAKEUP")
+    def wait_frozen(self, kind):
+        """Waits until the kernel is in a sleep of that kind: its last words are said, its only processor waits."""
+        end = time.monotonic() + FAR
+        while not self.is_frozen(kind):
+            if time.monotonic() > end:
+                raise Failure(f"not in {kind} within {FAR} seconds")
+            time.sleep(1)
+
+    def is_frozen(self, kind):
+        lines = self.printed()
+        entries = [number for number, line in enumerate(lines) if f"PM: suspend entry ({kind})" in line]
+        return (entries and lines[-1].endswith("Suspending console(s) (use no_console_suspend to debug)") and
+                "HLT=1" in self.qmp("human-monitor-command", **{"command-line": "info registers"}))
+
+    def wake(self, kind="deep"):
+        if kind == "deep":
+            self.qmp("system_wakeup")
+            self.wait_event("WAKEUP")
+        else:
+            self.qmp("system_powerdown")
+
+    def reset(self):
+        """As by its button. Stands still then, until it is waited for: what is plugged in meanwhile is there before
+        the kernel is."""
+        self.qmp("stop")
+        self.qmp("set-action", reboot="reset")
+        self.qmp("system_reset")
+        self.agent.rest = b""
+        self.uptime = 0.0
 
     def wait_end(self):
         try:
