@@ -134,6 +134,12 @@ TEST_F(HTTPConnectionTest, WaitThatIsInterruptedIsDoneAgainAndOneThatFailsIsAHan
     EXPECT_EQ(connection_->send(wire::encodeHTTPWorking()), State::hungUp);
 }
 
+TEST_F(HTTPConnectionTest, WaitThatIsInterruptedEndsAtItsTime) {
+    connect(5ms);
+    support::FailingCalls::poll = {EINTR};
+    EXPECT_EQ(receive(), State::timedOut);
+}
+
 TEST_F(HTTPConnectionTest, WaitEndsWithTheInterruptAndNotBeforeWhatHasCome) {
     int ends[2] = {-1, -1};
     ASSERT_EQ(::pipe2(ends, O_CLOEXEC), 0);

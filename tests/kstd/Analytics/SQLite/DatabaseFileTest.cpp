@@ -148,6 +148,7 @@ TEST_F(DatabaseFileTest, PagesThatCannotBeHadAreNotMapped) {
     EXPECT_EQ(mapped, nullptr);
     EXPECT_EQ(codeOf(SQLITE_READONLY, behindTheEnd.address()), SQLITE_FULL);
     EXPECT_EQ(mapped, nullptr);
+    EXPECT_EQ(codeOf(SQLITE_NOMEM, behindTheEnd.address()), SQLITE_NOMEM);
     none.giveBack();
     EXPECT_EQ(codeOf(SQLITE_OK, none.address()), SQLITE_IOERR_SHMMAP);
     EXPECT_EQ(mapped, nullptr);
