@@ -73,6 +73,7 @@ TEST_F(HTTPConnectionTest, PeerThatSaysNothingOrStopsInAMessageIsGivenUp) {
         connect(5ms);
         write({message.begin(), message.begin() + size});
         EXPECT_EQ(receive(), State::timedOut) << size;
+        EXPECT_EQ(message_.type, HTTPMessage().type) << "the message is as before";
     }
 }
 
@@ -106,6 +107,10 @@ TEST_F(HTTPConnectionTest, ReceiveThatIsInterruptedIsDoneAgainAndOneThatFailsIsA
     write(wire::encodeHTTPBodyWanted(8));
     support::FailingCalls::recv = {ECONNRESET};
     EXPECT_EQ(receive(), State::hungUp);
+    connect(30s);
+    peer_.reset();
+    support::FailingCalls::recv = {EINTR};
+    EXPECT_EQ(receive(), State::hungUp) << "the end is one after an interruption, too";
 }
 
 TEST_F(HTTPConnectionTest, SendThatIsInterruptedIsDoneAgainAndOneThatFailsIsAHangUp) {

@@ -141,7 +141,8 @@ TEST_F(KSTDValueTypeTest, AQuotedClassNameMakesAnObjectOfThatClass) {
 }
 
 TEST_F(KSTDValueTypeTest, AnIncompleteClassNameIsNone) {
-    for (const std::string_view encoding : {"@\"", "@\"\"", "@\"A", "@A\"", "@'A'", "@\"A\"x"}) {
+    for (const std::string_view encoding :
+         {"@\"", "@\"\"", "@\"A", "@A\"", "@'A'", "@\"A\"x", "@xA\""}) {
         expectRow(type(encoding), {15, "@", "id", 8, 0});
     }
 }
