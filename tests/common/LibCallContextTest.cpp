@@ -174,8 +174,11 @@ TEST_F(LibCallContext, DeleteWithoutDestroyingSendsNothing) {
 TEST_F(LibCallContext, DeleteThatFailsKeepsTheContext) {
     EXPECT_EQ(LibCall_KSTContextDelete(nullptr, context, false), -3);
     expectFailure("KSTContextDelete", -3, {failedCheck("transport")});
-    EXPECT_EQ(LibCall_KSTContextDelete(ContextlessTransport::answer, nullptr, false), -3);
-    expectFailure("KSTContextDelete", -3, {failedCheck("context")});
+    for (const bool destroy : {false, true}) {
+        EXPECT_EQ(LibCall_KSTContextDelete(ContextlessTransport::answer, nullptr, destroy), -3);
+        expectFailure("KSTContextDelete", -3, {failedCheck("context")});
+    }
+    EXPECT_TRUE(transport.calls.empty());
     transport.status = 12;
     EXPECT_EQ(LibCall_KSTContextDelete(ContextlessTransport::answer, context, true), 12);
     expectFailure("KSTContextDelete", 12, {failedCheck("err == 0 ", "0xc")});
