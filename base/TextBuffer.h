@@ -46,6 +46,13 @@ class TextBuffer {
         size_ += text.size() + 2;
     }
 
+    /// Appends what `write` writes: it gets room for `most` characters and gives the end of those
+    /// that it used.
+    template <typename Writer>
+    void appendWritten(std::size_t most, Writer&& write) {
+        size_ = static_cast<std::size_t>(write(extend(most)) - data_);
+    }
+
     /// Shortens the text to its first `size` bytes, of which it must have so many.
     void truncate(std::size_t size) { size_ = size; }
 
@@ -105,6 +112,8 @@ class TextBuffer {
         if (pages == MAP_FAILED) {
             throw std::bad_alloc();
         }
+        // Of use where it is obeyed: the first touch of every page is what a long text costs most.
+        static_cast<void>(::madvise(pages, capacity, MADV_HUGEPAGE));
         if (!isMapped()) {
             if (size_ > 0) {
                 std::memcpy(pages, data_, size_);

@@ -2,6 +2,7 @@
 // should be, and what was read can be written and read again without a change.
 
 #include "platform/ValueBuilder.h"
+#include "platform/formats/JSONCodec.h"
 #include "platform/formats/PropertyListCodec.h"
 #include "platform/formats/UnicodeText.h"
 
@@ -105,6 +106,21 @@ Bytes writtenAfterReading(std::span<const std::uint8_t> file) {
     return std::move(written).value();
 }
 
+std::string asJSON(std::span<const std::uint8_t> file, platform::KnownKeys* known) {
+    platform::JSONWriter writer;
+    const bool isRead = platform::readBinaryPropertyList(file, writer, known);
+    const auto text = writer.finish();
+    return isRead && text ? std::string(text.value().view()) : std::string();
+}
+
+/// Once the keys are not known, and once they are.
+void checkWithKnownKeys(std::span<const std::uint8_t> file) {
+    platform::KnownKeys known;
+    const std::string expected = asJSON(file, nullptr);
+    require(asJSON(file, &known) == expected);
+    require(asJSON(file, &known) == expected);
+}
+
 void check(std::span<const std::uint8_t> file) {
     CheckingSink sink;
     if (platform::readBinaryPropertyList(file, sink)) {
@@ -114,6 +130,7 @@ void check(std::span<const std::uint8_t> file) {
         if (sink.values() > kMostValues) {
             return;
         }
+        checkWithKnownKeys(file);
         const Bytes once = writtenAfterReading(file);
         require(writtenAfterReading(once) == once);
     }

@@ -5,6 +5,7 @@
 
 #include <cstdint>
 #include <span>
+#include <string>
 #include <string_view>
 
 namespace platform {
@@ -20,6 +21,9 @@ class ValueSink : private base::NotCopied {
 
     virtual void beginMap() = 0;
     virtual void key(std::string_view key) = 0;
+    /// The same, for a key that comes often. `form` comes with it every time, empty at first, and
+    /// is the sink's, to keep there what it makes of the key.
+    virtual void repeatedKey(std::string_view key, std::string& /*form*/) { this->key(key); }
     virtual void endMap() = 0;
     virtual void beginList() = 0;
     virtual void endList() = 0;

@@ -81,7 +81,7 @@ UploadText::UploadText(platform::JSON& json, platform::PropertyLists& propertyLi
 
 void UploadText::addEvent(std::span<const std::uint8_t> data) {
     const auto before = text_->mark();
-    if (!propertyLists_.read(data, *text_)) {
+    if (!propertyLists_.readKnowing(knownKeys_, data, *text_)) {
         text_->rewind(before);
     }
 }

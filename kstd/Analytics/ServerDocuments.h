@@ -3,6 +3,7 @@
 #include "base/NotCopied.h"
 #include "base/TextBuffer.h"
 #include "platform/JSON.h"
+#include "platform/PropertyLists.h"
 #include "platform/Result.h"
 #include "platform/Value.h"
 
@@ -69,6 +70,7 @@ class UploadText : private base::NotCopied {
 
   private:
     platform::PropertyLists& propertyLists_;
+    platform::KnownKeys knownKeys_;
     const std::unique_ptr<platform::JSONText> text_;
 };
 

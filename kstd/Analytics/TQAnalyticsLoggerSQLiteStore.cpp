@@ -128,8 +128,8 @@ StoredEventCursor::~StoredEventCursor() {
 
 std::optional<std::span<const std::uint8_t>> StoredEventCursor::next() {
     while (statement_ != nullptr && statement_->step()) {
-        if (statement_->columnTypeAtIndex(0) == SQLITE_BLOB) {
-            return statement_->blobBytesAtIndex(0);
+        if (const auto event = statement_->blobBytesAtIndex(0)) {
+            return event;
         }
     }
     return std::nullopt;

@@ -26,13 +26,17 @@ Result<Bytes> FakePropertyLists::binary(const Value& value) {
 }
 
 bool FakePropertyLists::read(std::span<const std::uint8_t> data, ValueSink& sink) {
-    {
-        const std::lock_guard lock(mutex_);
-        if (std::exchange(nextReadFails_, false)) {
-            return false;
-        }
-    }
-    return readBinaryPropertyList(data, sink);
+    return !takeReadFailure() && readBinaryPropertyList(data, sink);
+}
+
+bool FakePropertyLists::readKnowing(KnownKeys& known, std::span<const std::uint8_t> data,
+                                    ValueSink& sink) {
+    return !takeReadFailure() && readBinaryPropertyList(data, sink, &known);
+}
+
+bool FakePropertyLists::takeReadFailure() {
+    const std::lock_guard lock(mutex_);
+    return std::exchange(nextReadFails_, false);
 }
 
 void FakePropertyLists::failNextBinary(Error error) {

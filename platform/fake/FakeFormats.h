@@ -19,14 +19,18 @@ class FakePropertyLists final : public PropertyLists {
   public:
     [[nodiscard]] Result<Bytes> binary(const Value& value) override;
     [[nodiscard]] bool read(std::span<const std::uint8_t> data, ValueSink& sink) override;
+    [[nodiscard]] bool readKnowing(KnownKeys& known, std::span<const std::uint8_t> data,
+                                   ValueSink& sink) override;
 
     /// The next `binary` fails with this error, whatever it is given.
     void failNextBinary(Error error);
 
-    /// The next `read` fails, whatever it is given; its sink takes nothing.
+    /// The next reading fails, whatever it is given; its sink takes nothing.
     void failNextRead();
 
   private:
+    [[nodiscard]] bool takeReadFailure();
+
     std::mutex mutex_;
     std::optional<Error> nextBinaryError_;
     bool nextReadFails_ = false;

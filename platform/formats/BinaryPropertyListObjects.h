@@ -4,6 +4,8 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
+#include <endian.h>
 #include <span>
 
 /// The numbers of the binary form that both its writer and its reader need, and how objects are
@@ -50,12 +52,17 @@ using Span = std::span<const std::uint8_t>;
 
 /// The number that has its high byte first, of at most 8 bytes.
 [[nodiscard]] inline std::uint64_t numberIn(Span bytes) {
-    // Nearly every reference and offset of a small file is of one or two bytes.
+    // Nearly every reference and offset of a small file is of one or two bytes, every real of 8.
     if (bytes.size() == 1) {
         return bytes[0];
     }
     if (bytes.size() == 2) {
         return (std::uint64_t{bytes[0]} << 8U) | bytes[1];
+    }
+    if (bytes.size() == sizeof(std::uint64_t)) {
+        std::uint64_t number = 0;
+        std::memcpy(&number, bytes.data(), sizeof number);
+        return be64toh(number);
     }
     std::uint64_t number = 0;
     for (const std::uint8_t byte : bytes) {
@@ -106,21 +113,23 @@ class ObjectTable {
 
     /// The object that the `index`-th of the references is to; there must be so many.
     [[nodiscard]] std::uint64_t reference(Span references, std::size_t index) const {
-        return numberIn(references.subspan(index * referenceWidth_, referenceWidth_));
+        return numberIn({references.data() + index * referenceWidth_, referenceWidth_});
+    }
+
+    /// The object, and behind it all that follows in the object table. Nothing when there is none.
+    [[nodiscard]] Span at(std::uint64_t object) const {
+        if (object >= count_) {
+            return {};
+        }
+        const std::uint64_t offset =
+            numberIn({offsets_.data() + object * offsetWidth_, offsetWidth_});
+        return offset >= kMagicSize && offset < objects_.size() ? objects_.subspan(offset) : Span();
     }
 
     /// Gives the object's marker, and in `reader` all that stands behind it in the object table.
     [[nodiscard]] bool find(std::uint64_t object, std::uint8_t& marker,
                             base::ByteReader& reader) const {
-        if (object >= count_) {
-            return false;
-        }
-        const std::uint64_t offset =
-            numberIn(offsets_.subspan(object * offsetWidth_, offsetWidth_));
-        if (offset < kMagicSize || offset >= objects_.size()) {
-            return false;
-        }
-        reader = base::ByteReader(objects_.subspan(offset));
+        reader = base::ByteReader(at(object));
         return reader.readU8(marker);
     }
 

@@ -4,8 +4,8 @@
 #include "platform/formats/UnicodeText.h"
 
 #include <algorithm>
-#include <array>
 #include <bit>
+#include <cstring>
 #include <limits>
 #include <map>
 #include <string>
@@ -28,10 +28,6 @@ struct FileText {
     }
 };
 
-/// The first keys of a map, kept from the first look at them for when they are all in ASCII: few
-/// maps have more.
-using FirstKeys = std::array<std::string_view, 16>;
-
 /// The references of one map.
 struct Entries {
     std::size_t count;
@@ -41,8 +37,12 @@ struct Entries {
 
 class Reader {
   public:
-    Reader(const ObjectTable& objects, std::size_t work, ValueSink& sink)
-        : objects_(objects), work_(work), sink_(sink) {}
+    Reader(const ObjectTable& objects, std::size_t size, ValueSink& sink, KnownKeys* known)
+        : objects_(objects),
+          size_(size),
+          work_(propertyListWork(size)),
+          sink_(sink),
+          known_(known) {}
 
     [[nodiscard]] bool readObject(std::uint64_t object) {
         base::ByteReader reader{Span()};
@@ -89,15 +89,28 @@ class Reader {
     }
 
     bool readInteger(std::uint8_t marker, base::ByteReader& reader) {
+        constexpr std::uint8_t kWidthBitsOfLarge = 4;
         const std::uint8_t widthBits = marker & 0xfU;
+        if (widthBits >= kWidthBitsOfLarge) {
+            return widthBits == kWidthBitsOfLarge && readLargeInteger(reader);
+        }
+        std::uint64_t number = 0;
+        if (!readNumber(reader, 1UL << widthBits, number)) {
+            return false;
+        }
+        sink_.integer(static_cast<std::int64_t>(number));
+        return true;
+    }
+
+    /// One of 16 bytes.
+    bool readLargeInteger(base::ByteReader& reader) {
         std::uint64_t high = 0;
         std::uint64_t low = 0;
-        if (widthBits > 4 || (widthBits == 4 && !readNumber(reader, 8, high)) ||
-            !readNumber(reader, std::min<std::size_t>(1UL << widthBits, 8), low)) {
+        if (!readNumber(reader, 8, high) || !readNumber(reader, 8, low)) {
             return false;
         }
         const bool isAbove63Bits = (low >> 63U) != 0;
-        if (high == 0 && isAbove63Bits && widthBits == 4) {
+        if (high == 0 && isAbove63Bits) {
             sink_.largeInteger(low);
             return true;
         }
@@ -199,15 +212,66 @@ class Reader {
         const Span keys = references.first(references.size() / 2);
         const Entries entries{keys.size() / objects_.referenceWidth(), keys,
                               references.last(keys.size())};
-        bool isSorted = false;
-        FirstKeys firstKeys;
-        if (!spend(2 * entries.count * kPropertyListWorkPerValue) ||
-            !lookAtKeys(entries, firstKeys, isSorted)) {
+        if (!spend(2 * entries.count * kPropertyListWorkPerValue)) {
             return false;
         }
-        sink_.beginMap();
-        if (!(isSorted ? readSortedEntries(entries, firstKeys) : readOtherEntries(entries))) {
+        if (KnownKeys::Set* const known = knownKeysOf(entries)) {
+            return readKnownEntries(entries, *known);
+        }
+        bool isSorted = false;
+        if (!lookAtKeys(entries, isSorted)) {
             return false;
+        }
+        if (isSorted && mayKnowKeys()) {
+            keepKeys(entries);
+        }
+        sink_.beginMap();
+        if (!(isSorted ? readSortedEntries(entries) : readOtherEntries(entries))) {
+            return false;
+        }
+        sink_.endMap();
+        return true;
+    }
+
+    [[nodiscard]] bool mayKnowKeys() const { return known_ != nullptr && depth_ == 1; }
+
+    /// The set of keys that the map at hand has, if it is known.
+    [[nodiscard]] KnownKeys::Set* knownKeysOf(const Entries& entries) const {
+        if (!mayKnowKeys()) {
+            return nullptr;
+        }
+        const auto found =
+            std::find_if(known_->sets.begin(), known_->sets.end(),
+                         [&](const KnownKeys::Set& keys) { return hasKeys(entries, keys); });
+        return found != known_->sets.end() ? &*found : nullptr;
+    }
+
+    [[nodiscard]] bool hasKeys(const Entries& entries, const KnownKeys::Set& keys) const {
+        if (entries.count != keys.size()) {
+            return false;
+        }
+        for (std::size_t i = 0; i < entries.count; ++i) {
+            const Span object = objects_.at(objects_.reference(entries.keys, i));
+            const std::string& known = keys[i].object;
+            if (object.size() < known.size() ||
+                std::memcmp(object.data(), known.data(), known.size()) != 0) {
+                return false;
+            }
+        }
+        return true;
+    }
+
+    bool readKnownEntries(const Entries& entries, KnownKeys::Set& keys) {
+        sink_.beginMap();
+        for (std::size_t i = 0; i < entries.count; ++i) {
+            // As much as two looks at the key would be.
+            if (!spend(2 * keys[i].textSize)) {
+                return false;
+            }
+            sink_.repeatedKey(keys[i].text(), keys[i].form);
+            if (!readObject(objects_.reference(entries.values, i))) {
+                return false;
+            }
         }
         sink_.endMap();
         return true;
@@ -215,7 +279,7 @@ class Reader {
 
     /// False when a key is no text. `isSorted` says whether the keys are in ASCII and ascending, as
     /// in every file of our own.
-    bool lookAtKeys(const Entries& entries, FirstKeys& firstKeys, bool& isSorted) {
+    bool lookAtKeys(const Entries& entries, bool& isSorted) {
         isSorted = true;
         std::string_view last;
         for (std::size_t i = 0; i < entries.count; ++i) {
@@ -226,20 +290,17 @@ class Reader {
             }
             isSorted = isSorted && !key.isUTF16 && (i == 0 || last < key.ascii());
             last = key.ascii();
-            if (i < firstKeys.size()) {
-                firstKeys[i] = last;
-            }
         }
         return true;
     }
 
-    bool readSortedEntries(const Entries& entries, const FirstKeys& firstKeys) {
+    bool readSortedEntries(const Entries& entries) {
         for (std::size_t i = 0; i < entries.count; ++i) {
-            std::string_view key;
-            if (!readKeyAgain(entries, i, firstKeys, key)) {
+            FileText key;
+            if (!readKey(objects_.reference(entries.keys, i), key)) {
                 return false;
             }
-            sink_.key(key);
+            sink_.key(key.ascii());
             if (!readObject(objects_.reference(entries.values, i))) {
                 return false;
             }
@@ -269,17 +330,27 @@ class Reader {
         });
     }
 
-    /// Costs the same whether the key was kept or not.
-    bool readKeyAgain(const Entries& entries, std::size_t index, const FirstKeys& firstKeys,
-                      std::string_view& key) {
-        if (index < firstKeys.size()) {
-            key = firstKeys[index];
-            return spend(key.size());
+    /// Keeps the keys of the map at hand, which were looked at, for the maps of other files; but
+    /// not those that overlap so much that they would take more than the file.
+    void keepKeys(const Entries& entries) {
+        KnownKeys::Set keys;
+        std::size_t left = size_;
+        for (std::size_t i = 0; i < entries.count; ++i) {
+            const Span object = objects_.at(objects_.reference(entries.keys, i));
+            base::ByteReader reader(object);
+            std::uint8_t marker = 0;
+            Span text;
+            static_cast<void>(reader.readU8(marker) && readElements(marker, reader, 1, text));
+            const std::size_t size = object.size() - reader.left();
+            if (size > left) {
+                return;
+            }
+            left -= size;
+            const Span key = object.first(size);
+            keys.push_back({std::string(key.begin(), key.end()), text.size(), {}});
         }
-        FileText text;
-        const bool isRead = readKey(objects_.reference(entries.keys, index), text);
-        key = text.ascii();
-        return isRead;
+        known_->sets[known_->oldest] = std::move(keys);
+        known_->oldest = (known_->oldest + 1) % known_->sets.size();
     }
 
     bool readKey(std::uint64_t object, FileText& key) {
@@ -298,8 +369,11 @@ class Reader {
     }
 
     const ObjectTable& objects_;
+    /// That of the whole file.
+    const std::size_t size_;
     std::size_t work_;
     ValueSink& sink_;
+    KnownKeys* const known_;
     std::size_t depth_ = 0;
     /// The UTF-8 form of the text at hand, here so that its memory is used again.
     std::string converted_;
@@ -307,10 +381,10 @@ class Reader {
 
 } // namespace
 
-bool readBinaryPropertyList(std::span<const std::uint8_t> data, ValueSink& sink) {
+bool readBinaryPropertyList(std::span<const std::uint8_t> data, ValueSink& sink, KnownKeys* known) {
     ObjectTable objects;
     return objects.open(data) &&
-           Reader(objects, propertyListWork(data.size()), sink).readObject(objects.top());
+           Reader(objects, data.size(), sink, known).readObject(objects.top());
 }
 
 } // namespace platform

@@ -22,6 +22,7 @@ class JSONWriter : public JSONText {
 
     void beginMap() override { begin('{'); }
     void key(std::string_view key) override;
+    void repeatedKey(std::string_view key, std::string& form) override;
     void endMap() override { end('}'); }
     void beginList() override { begin('['); }
     void endList() override { end(']'); }

@@ -1,11 +1,14 @@
+#include "base/Concat.h"
 #include "platform/formats/JSONCodec.h"
 
 #include <algorithm>
 #include <array>
 #include <charconv>
+#include <cmath>
 #include <concepts>
 #include <cstring>
 #include <limits>
+#include <rapidjson/internal/dtoa.h>
 #include <rapidjson/writer.h>
 #include <string>
 #include <utility>
@@ -22,25 +25,11 @@ using Writer = rapidjson::Writer<Output, Encoding, Encoding, rapidjson::CrtAlloc
 
 template <std::integral Integer>
 void appendInteger(base::TextBuffer& buffer, Integer number) {
-    std::array<char, std::numeric_limits<Integer>::digits10 + 2> digits;
-    const auto end = std::to_chars(digits.data(), digits.data() + digits.size(), number).ptr;
-    buffer.append(std::string_view(digits.data(), end));
+    constexpr std::size_t kMostDigits = std::numeric_limits<Integer>::digits10 + 2;
+    buffer.appendWritten(kMostDigits, [number](char* place) {
+        return std::to_chars(place, place + kMostDigits, number).ptr;
+    });
 }
-
-/// Takes the longest real number: sign, 17 digits, point, exponent.
-class NumberOutput {
-  public:
-    using Ch = char;
-
-    void Put(char character) { characters_[size_++] = character; }
-    void Flush() {}
-
-    [[nodiscard]] std::string_view view() const { return {characters_.data(), size_}; }
-
-  private:
-    std::array<char, 32> characters_{};
-    std::size_t size_ = 0;
-};
 
 class BufferOutput {
   public:
@@ -55,16 +44,21 @@ class BufferOutput {
     base::TextBuffer& buffer_;
 };
 
-/// A single digit with an exponent, such as 1e25, comes from the library without a fraction.
-void appendWithFraction(base::TextBuffer& buffer, std::string_view number) {
-    if (number.find('.') != std::string_view::npos) {
-        buffer.append(number);
+/// The number is finite.
+void appendReal(base::TextBuffer& buffer, double number) {
+    // Takes the longest one: sign, 17 digits, point, exponent.
+    std::array<char, 32> characters;
+    const std::string_view text(characters.data(),
+                                rapidjson::internal::dtoa(number, characters.data()));
+    if (text.find('.') != std::string_view::npos) {
+        buffer.append(text);
         return;
     }
-    const std::size_t digits = std::min(number.find('e'), number.size());
-    buffer.append(number.substr(0, digits));
+    // A single digit with an exponent, such as 1e25, comes from the library without a fraction.
+    const std::size_t digits = std::min(text.find('e'), text.size());
+    buffer.append(text.substr(0, digits));
     buffer.append(".0");
-    buffer.append(number.substr(digits));
+    buffer.append(text.substr(digits));
 }
 
 [[nodiscard]] std::size_t lengthOfCharacter(char firstByte) {
@@ -153,6 +147,23 @@ void JSONWriter::key(std::string_view key) {
     }
 }
 
+void JSONWriter::repeatedKey(std::string_view key, std::string& form) {
+    constexpr std::string_view kComma = ",";
+    if (form.empty()) {
+        JSONWriter alone;
+        alone.key(key);
+        form = base::concat(kComma, alone.text_.view());
+    }
+    const bool isExpressed = form != kComma;
+    if (!isExpressed || isPretty_ || depthLeftOut_ > 0) {
+        this->key(key);
+        return;
+    }
+    entryStart_ = text_.size();
+    text_.append(std::string_view(form).substr(isFirst_ ? kComma.size() : 0));
+    hasKey_ = true;
+}
+
 void JSONWriter::integer(std::int64_t value) {
     if (openValue()) {
         appendInteger(text_, value);
@@ -169,10 +180,9 @@ void JSONWriter::largeInteger(std::uint64_t value) {
 
 void JSONWriter::real(double value) {
     if (openValue()) {
-        NumberOutput output;
-        const bool isExpressed = Writer<NumberOutput>(output).Double(value);
+        const bool isExpressed = std::isfinite(value);
         if (isExpressed) {
-            appendWithFraction(text_, output.view());
+            appendReal(text_, value);
         }
         closeValue(isExpressed);
     }

@@ -77,7 +77,12 @@ inline constexpr std::size_t kPropertyListWorkPerValue = 16;
 /// kMaxPropertyListDepth (an object that is inside itself is always that) and more work than
 /// propertyListWork. The sink has then taken some part of the value. Never allocates more than what
 /// the bytes at hand account for, and nothing at all when texts are in ASCII and maps are sorted.
-[[nodiscard]] bool readBinaryPropertyList(std::span<const std::uint8_t> data, ValueSink& sink);
+///
+/// With `known` a map that is the whole value, and whose keys are one of the sets there, costs no
+/// second look at them; other keys that are in ASCII and sorted become a set there. All else is as
+/// without it, and `known` holds no more of a file than its size.
+[[nodiscard]] bool readBinaryPropertyList(std::span<const std::uint8_t> data, ValueSink& sink,
+                                          KnownKeys* known = nullptr);
 
 inline constexpr std::size_t kMaxXMLPropertyListSize = 1024UL * 1024;
 /// Lists and maps in one file, empty ones and those in comments counted too.
@@ -106,9 +111,20 @@ class PropertyListCodec final : public PropertyLists {
     }
 
     [[nodiscard]] bool read(std::span<const std::uint8_t> data, ValueSink& sink) override {
+        return isBinary(data) ? readBinaryPropertyList(data, sink)
+                              : readXMLPropertyList(data, sink);
+    }
+
+    [[nodiscard]] bool readKnowing(KnownKeys& known, std::span<const std::uint8_t> data,
+                                   ValueSink& sink) override {
+        return isBinary(data) ? readBinaryPropertyList(data, sink, &known)
+                              : readXMLPropertyList(data, sink);
+    }
+
+  private:
+    [[nodiscard]] static bool isBinary(std::span<const std::uint8_t> data) {
         const std::string_view start(reinterpret_cast<const char*>(data.data()), data.size());
-        return start.starts_with(kBinaryPropertyListMagic) ? readBinaryPropertyList(data, sink)
-                                                           : readXMLPropertyList(data, sink);
+        return start.starts_with(kBinaryPropertyListMagic);
     }
 };
 

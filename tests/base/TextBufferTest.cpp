@@ -4,6 +4,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <fstream>
 #include <new>
 #include <string>
@@ -41,6 +42,20 @@ TEST(TextBufferTest, TextBetweenTwoCharacters) {
     expected.append(100, 'x');
     expected.push_back('\0');
     EXPECT_EQ(buffer.view(), expected);
+}
+
+TEST(TextBufferTest, WhatIsWrittenIntoItsRoom) {
+    constexpr std::size_t kMost = 100;
+    TextBuffer buffer;
+    std::string expected;
+    for (std::size_t used = 0; used <= kMost; ++used) {
+        buffer.appendWritten(kMost, [used](char* place) {
+            std::fill(place, place + kMost, static_cast<char>('a' + used % 26));
+            return place + used;
+        });
+        expected.append(used, static_cast<char>('a' + used % 26));
+        ASSERT_EQ(buffer.view(), expected);
+    }
 }
 
 TEST(TextBufferTest, KeepsWhatIsThereWhileItGrows) {

@@ -241,16 +241,23 @@ double KSTDSQLiteStatement::doubleAtIndex(int index) const {
 }
 
 std::optional<platform::Bytes> KSTDSQLiteStatement::blobAtIndex(int index) const {
-    const std::span<const std::uint8_t> bytes = blobBytesAtIndex(index);
-    if (bytes.data() == nullptr) {
+    const auto* const bytes = static_cast<const std::uint8_t*>(sqlite3_column_blob(handle_, index));
+    if (bytes == nullptr) {
         return std::nullopt;
     }
-    return platform::Bytes(bytes.begin(), bytes.end());
+    return platform::Bytes(bytes, bytes + sqlite3_column_bytes(handle_, index));
 }
 
-std::span<const std::uint8_t> KSTDSQLiteStatement::blobBytesAtIndex(int index) const {
-    const auto* const bytes = static_cast<const std::uint8_t*>(sqlite3_column_blob(handle_, index));
-    return {bytes, static_cast<std::size_t>(sqlite3_column_bytes(handle_, index))};
+std::optional<std::span<const std::uint8_t>>
+KSTDSQLiteStatement::blobBytesAtIndex(int index) const {
+    // One lock of the connection for three questions. The value itself has none, which it can do
+    // without: a statement belongs to one queue.
+    sqlite3_value* const value = sqlite3_column_value(handle_, index);
+    if (sqlite3_value_type(value) != SQLITE_BLOB) {
+        return std::nullopt;
+    }
+    const auto* const bytes = static_cast<const std::uint8_t*>(sqlite3_value_blob(value));
+    return std::span(bytes, static_cast<std::size_t>(sqlite3_value_bytes(value)));
 }
 
 std::optional<std::string> KSTDSQLiteStatement::textAtIndex(int index) const {

@@ -83,9 +83,9 @@ class KSTDSQLiteStatement : private base::NotCopied {
     [[nodiscard]] double doubleAtIndex(int index) const;
     /// None when SQLite gives no pointer, as it does for NULL and for an empty blob.
     [[nodiscard]] std::optional<platform::Bytes> blobAtIndex(int index) const;
-    /// The bytes where SQLite has them, until the next step or reset; empty where blobAtIndex gives
-    /// none.
-    [[nodiscard]] std::span<const std::uint8_t> blobBytesAtIndex(int index) const;
+    /// The bytes of a blob where SQLite has them, until the next step or reset; none when the
+    /// column is no blob.
+    [[nodiscard]] std::optional<std::span<const std::uint8_t>> blobBytesAtIndex(int index) const;
     /// Up to its first zero byte; none for NULL.
     [[nodiscard]] std::optional<std::string> textAtIndex(int index) const;
     /// A signed 64-bit integer, a double, a text, a buffer (an empty one for an empty blob) or

@@ -257,6 +257,41 @@ TEST_P(JSONContract, RealsComeBackBitForBit) {
     }
 }
 
+TEST_P(JSONContract, RepeatedKeysAreWrittenAsOthersAre) {
+    for (const std::string_view key : {"key", "", "a \"quoted\" one", "\u00e9", "\xff"}) {
+        for (const bool isPretty : {false, true}) {
+            const auto expected = fixture().json().makeText({.isPretty = isPretty});
+            const auto repeated = fixture().json().makeText({.isPretty = isPretty});
+            std::string form;
+            // First and later ones, behind one that is left out, and inside of what is left out.
+            const auto write = [](JSONText& text, const auto& writeKey) {
+                text.beginMap();
+                writeKey(text);
+                text.beginMap();
+                writeKey(text);
+                text.integer(1);
+                addEntry(text, "x", 2);
+                writeKey(text);
+                text.bytes({});
+                writeKey(text);
+                text.endMap();
+                text.key("\xff");
+                text.beginMap();
+                writeKey(text);
+                text.boolean(true);
+                text.endMap();
+                writeKey(text);
+                text.text("end");
+                text.endMap();
+            };
+            write(*expected, [key](JSONText& text) { text.key(key); });
+            write(*repeated, [key, &form](JSONText& text) { text.repeatedKey(key, form); });
+            EXPECT_EQ(finish(*repeated), finish(*expected));
+            EXPECT_FALSE(form.empty());
+        }
+    }
+}
+
 TEST_P(JSONContract, WhatCannotBeExpressedIsLeftOutWithItsKey) {
     const std::vector<Value> values = inexpressible();
     for (std::size_t i = 0; i < values.size(); ++i) {

@@ -41,6 +41,31 @@ TEST_P(PropertyListsContract, EveryKindComesBackAsItself) {
     EXPECT_EQ(readBack(map), map);
 }
 
+TEST_P(PropertyListsContract, KnownKeysChangeNothing) {
+    platform::KnownKeys known;
+    const auto readKnowing = [&](const Bytes& bytes) -> std::optional<Value> {
+        platform::ValueBuilder builder;
+        return fixture().propertyLists().readKnowing(known, bytes, builder)
+                   ? std::optional(builder.take())
+                   : std::nullopt;
+    };
+    const std::vector<Value> values = {
+        ValueMap{{"a", true}, {"b", "text"}},
+        ValueMap{{"a", std::int64_t{1}}, {"b", -0.5}},
+        ValueMap{{"a", true}, {"c", "text"}},
+        ValueMap{{"a", ValueMap{{"a", true}, {"b", false}}}},
+        ValueMap{{"\u00e9", true}},
+        ValueList{ValueMap{{"a", true}}},
+        true,
+    };
+    for (int round = 0; round < 2; ++round) {
+        for (const Value& value : values) {
+            EXPECT_EQ(readKnowing(binary(value).value()), value);
+            EXPECT_EQ(readKnowing(Bytes{'b'}), std::nullopt);
+        }
+    }
+}
+
 TEST_P(PropertyListsContract, NumbersLoseTheirWidthNotTheirKind) {
     EXPECT_EQ(readBack(std::uint8_t{1}), Value(std::int64_t{1}));
     EXPECT_EQ(readBack(std::int8_t{-1}), Value(std::int64_t{-1}));

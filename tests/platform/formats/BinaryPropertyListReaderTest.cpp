@@ -1,4 +1,5 @@
 #include "platform/ValueBuilder.h"
+#include "platform/formats/JSONCodec.h"
 #include "platform/formats/PropertyListCodec.h"
 #include "tests/platform/formats/PropertyListBytes.h"
 
@@ -266,6 +267,12 @@ class KeySink final : public platform::ValueSink {
   public:
     void beginMap() override { keys += "{"; }
     void key(std::string_view key) override { keys.append(key); }
+    void repeatedKey(std::string_view key, std::string& form) override {
+        ++repeated;
+        EXPECT_TRUE(form.empty() || form == key) << form;
+        form = key;
+        this->key(key);
+    }
     void endMap() override { keys += "}"; }
     void beginList() override {}
     void endList() override {}
@@ -280,6 +287,8 @@ class KeySink final : public platform::ValueSink {
     void other(std::string_view /*kind*/) override {}
 
     std::string keys;
+    /// How many of the keys came as repeated ones.
+    int repeated = 0;
 };
 
 TEST(BinaryPropertyListReaderTest, SinkSeesKeysSortedAndOnce) {
@@ -409,6 +418,186 @@ TEST(BinaryPropertyListReaderTest, ObjectsOfOneFileMayBeSharedByUsualMeasure) {
     EXPECT_TRUE(readsSharedObject(10'000, {fromHex("5f1028"
                                                    "6161616161616161616161616161616161616161"
                                                    "6161616161616161616161616161616161616161")}));
+}
+
+/// A file of such objects, the first of which is the whole value.
+Bytes fileOf(std::initializer_list<std::string_view> objects) {
+    HandMadePropertyList file;
+    for (const std::string_view object : objects) {
+        file.objects.push_back(fromHex(object));
+    }
+    return file.bytes();
+}
+
+/// How many keys of the file were known.
+int knownKeysIn(const Bytes& file, platform::KnownKeys& known) {
+    KeySink sink;
+    EXPECT_TRUE(platform::readBinaryPropertyList(file, sink, &known));
+    return sink.repeated;
+}
+
+/// The file as JSON, or none.
+std::optional<std::string> asJSON(const Bytes& file, platform::KnownKeys* known) {
+    platform::JSONWriter writer;
+    if (!platform::readBinaryPropertyList(file, writer, known)) {
+        return std::nullopt;
+    }
+    const auto text = writer.finish();
+    return text ? std::string(text.value().view()) : "nothing";
+}
+
+TEST(BinaryPropertyListReaderTest, KeysAreKnownWhenTheyCameInThatOrderBefore) {
+    platform::KnownKeys known;
+    EXPECT_EQ(knownKeysIn(fileOf({"d2010203 04", "5161", "5162", "08", "09"}), known), 0);
+    EXPECT_EQ(knownKeysIn(fileOf({"d2010203 04", "5161", "5162", "08", "09"}), known), 2);
+    // Wherever they stand, and whatever their values are.
+    EXPECT_EQ(
+        knownKeysIn(fileOf({"d2030401 02", "33 3ff0000000000000", "a0", "5161", "5162"}), known),
+        2);
+    const Bytes withEmptyKey = fileOf({"d2010203 04", "50", "5161", "08", "09"});
+    EXPECT_EQ(knownKeysIn(withEmptyKey, known), 0);
+    EXPECT_EQ(knownKeysIn(withEmptyKey, known), 2);
+    // One of them alone is another set.
+    const Bytes alone = fileOf({"d10103", "5161", "5162", "08"});
+    EXPECT_EQ(knownKeysIn(alone, known), 0);
+    EXPECT_EQ(knownKeysIn(alone, known), 1);
+    // What has to be sorted, or is in UTF-16, is not kept.
+    for (const Bytes& other : {fileOf({"d2020103 04", "5161", "5162", "08", "09"}),
+                               fileOf({"d2010203 04", "5161", "610062", "08", "09"})}) {
+        EXPECT_EQ(knownKeysIn(other, known), 0);
+        EXPECT_EQ(knownKeysIn(other, known), 0);
+    }
+    // In a map that is inside another value they are not kept, nor known.
+    const Bytes inside = fileOf({"a101", "d10203", "5161", "08"});
+    EXPECT_EQ(knownKeysIn(inside, known), 0);
+    EXPECT_EQ(knownKeysIn(inside, known), 0);
+}
+
+TEST(BinaryPropertyListReaderTest, KeysOfAFewKindsOfMapsAreKept) {
+    const std::vector<Bytes> files = {
+        fileOf({"d10102", "5161", "08"}), fileOf({"d10102", "5162", "08"}),
+        fileOf({"d10102", "5163", "08"}), fileOf({"d10102", "5164", "08"}),
+        fileOf({"d10102", "5165", "08"})};
+    platform::KnownKeys known;
+    for (std::size_t i = 0; i < 4; ++i) {
+        EXPECT_EQ(knownKeysIn(files[i], known), 0) << i;
+    }
+    for (std::size_t i = 0; i < 4; ++i) {
+        EXPECT_EQ(knownKeysIn(files[i], known), 1) << i;
+    }
+    // The fifth takes the place of the first, which then takes that of the second.
+    EXPECT_EQ(knownKeysIn(files[4], known), 0);
+    EXPECT_EQ(knownKeysIn(files[4], known), 1);
+    EXPECT_EQ(knownKeysIn(files[1], known), 1);
+    EXPECT_EQ(knownKeysIn(files[0], known), 0);
+    EXPECT_EQ(knownKeysIn(files[1], known), 0);
+    EXPECT_EQ(knownKeysIn(files[3], known), 1);
+}
+
+TEST(BinaryPropertyListReaderTest, WithKnownKeysAFileIsReadAsWithout) {
+    const std::vector<Bytes> files = {
+        // Two keys; in the other order; one with another byte; one more; one less; one twice.
+        fileOf({"d2010203 04", "5161", "5162", "1007", "09"}),
+        fileOf({"d2020103 04", "5161", "5162", "1007", "09"}),
+        fileOf({"d2010203 04", "5161", "5163", "1007", "09"}),
+        fileOf({"d3010205 030404", "5161", "5162", "1007", "09", "5164"}),
+        fileOf({"d10103", "5161", "5162", "1007", "09"}),
+        fileOf({"d2010103 04", "5161", "5162", "1007", "09"}),
+        // A longer one that begins alike; one in UTF-16; counts that follow; one with a quote.
+        fileOf({"d2010203 04", "5161", "526262", "1007", "09"}),
+        fileOf({"d2010203 04", "610061", "5162", "1007", "09"}),
+        fileOf({"d2010203 04", "5f100161", "5162", "1007", "09"}),
+        fileOf({"d2010203 04", "5122", "5162", "1007", "09"}),
+        // A map in a map, both with the keys; none; a list of one.
+        fileOf({"d2010203 05", "5161", "5162", "d2010204 05", "40", "09"}),
+        fileOf({"d0"}),
+        fileOf({"a101", "d2020304 05", "5161", "5162", "1007", "09"}),
+        // The last key at the end of the objects, and one that would go beyond.
+        fileOf({"d2020403 01", "09", "5161", "1007", "5162"}),
+        fileOf({"d2020403 01", "09", "5161", "1007", "51"}),
+        // A value that is none; a reference to nothing; a key that is none; no map.
+        fileOf({"d2010203 04", "5161", "5162", "1007", "0a"}),
+        fileOf({"d2010203 05", "5161", "5162", "1007", "09"}),
+        fileOf({"d2010503 04", "5161", "5162", "1007", "09"}),
+        fileOf({"d2010403 04", "5161", "5162", "1007", "09"}),
+        fileOf({"d2010203 04", "5161", "5180", "1007", "09"}),
+        Bytes(),
+    };
+    platform::KnownKeys known;
+    for (const Bytes& first : files) {
+        for (const Bytes& second : files) {
+            EXPECT_EQ(asJSON(first, &known), asJSON(first, nullptr));
+            EXPECT_EQ(asJSON(second, &known), asJSON(second, nullptr));
+        }
+    }
+    EXPECT_EQ(asJSON(files[0], &known), R"({"a":7,"b":true})");
+    EXPECT_EQ(asJSON(files[10], &known), R"({"a":{"b":true},"b":true})");
+}
+
+/// A map with one entry, a list of `count` references to one text, each of them 1000 bytes.
+Bytes fileOfWork(std::size_t keyLength, std::size_t count) {
+    constexpr std::size_t kTextLength = 1000;
+    const auto text = [](std::size_t length) {
+        Bytes object = {0x5f, 0x11};
+        appendNumber(object, length, 2);
+        append(object, Bytes(length, 'x'));
+        return object;
+    };
+    HandMadePropertyList file;
+    file.offsetWidth = 4;
+    file.objects = {map({1, 2}), text(keyLength), list(std::vector<std::uint64_t>(count, 3)),
+                    text(kTextLength)};
+    return file.bytes();
+}
+
+TEST(BinaryPropertyListReaderTest, KnownKeysAreAsMuchWork) {
+    for (std::size_t length = 1000; length < 1008; ++length) {
+        const std::size_t sizeWithout = fileOfWork(length, 0).size();
+        std::size_t most = 0;
+        while (2 * 16 + 2 * length + (most + 1) * (16 + 1000) <=
+               platform::propertyListWork(sizeWithout + most + 1)) {
+            ++most;
+        }
+        platform::KnownKeys known;
+        EXPECT_EQ(knownKeysIn(fileOfWork(length, 0), known), 0);
+        EXPECT_EQ(knownKeysIn(fileOfWork(length, most), known), 1) << length;
+        for (platform::KnownKeys* const keys :
+             {&known, static_cast<platform::KnownKeys*>(nullptr)}) {
+            KeySink sink;
+            EXPECT_FALSE(platform::readBinaryPropertyList(fileOfWork(length, most + 1), sink, keys))
+                << length;
+        }
+    }
+}
+
+TEST(BinaryPropertyListReaderTest, KeysThatTakeMoreThanTheirFileAreNotKept) {
+    // Fifteen texts in each other, the shortest first: together they have 15 markers and 105
+    // characters.
+    constexpr std::size_t kSizeOfKeys = 120;
+    const auto fileWith = [](std::size_t padding) {
+        HandMadePropertyList file;
+        std::vector<std::uint64_t> references;
+        for (std::uint64_t key = 15; key > 0; --key) {
+            references.push_back(key);
+        }
+        references.insert(references.end(), 15, 16);
+        file.objects = {map(references)};
+        for (unsigned length = 15; length > 0; --length) {
+            file.objects.push_back({static_cast<std::uint8_t>(0x50 + length - 1)});
+        }
+        file.objects.push_back(Bytes{0x09});
+        append(file.objects.back(), Bytes(padding));
+        return file.bytes();
+    };
+    const std::size_t least = fileWith(0).size();
+    ASSERT_LT(least, kSizeOfKeys);
+    for (const std::size_t size : {kSizeOfKeys - 1, kSizeOfKeys, kSizeOfKeys + 1}) {
+        platform::KnownKeys known;
+        const Bytes file = fileWith(size - least);
+        ASSERT_EQ(file.size(), size);
+        EXPECT_EQ(knownKeysIn(file, known), 0);
+        EXPECT_EQ(knownKeysIn(file, known), size < kSizeOfKeys ? 0 : 15);
+    }
 }
 
 /// A small file with an object of every kind.

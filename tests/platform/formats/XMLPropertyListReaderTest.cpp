@@ -134,6 +134,21 @@ TEST(PropertyListCodecTest, MagicTellsTheBinaryForm) {
     EXPECT_EQ(readAll("bplist00<plist><true/></plist>"), std::nullopt);
 }
 
+TEST(PropertyListCodecTest, MagicTellsTheBinaryFormAlsoWithKnownKeys) {
+    platform::PropertyListCodec propertyLists;
+    platform::KnownKeys known;
+    const Value value = ValueMap{{"key", true}};
+    const std::string XML = document("<dict><key>key</key><true/></dict>");
+    for (const Bytes& bytes :
+         {platform::writeBinaryPropertyList(value).value(), Bytes(XML.begin(), XML.end())}) {
+        platform::ValueBuilder builder;
+        ASSERT_TRUE(propertyLists.readKnowing(known, bytes, builder));
+        EXPECT_EQ(builder.take(), value);
+    }
+    platform::ValueBuilder builder;
+    EXPECT_FALSE(propertyLists.readKnowing(known, Bytes{'x'}, builder));
+}
+
 TEST(XMLPropertyListReaderTest, SizeOfXMLIsBounded) {
     const std::size_t frame = document("<string></string>").size();
     const std::size_t most = platform::kMaxXMLPropertyListSize - frame;

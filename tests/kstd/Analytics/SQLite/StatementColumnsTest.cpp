@@ -52,15 +52,19 @@ TEST_F(StatementColumnsTest, TextsAndBuffersAreCopies) {
     EXPECT_EQ(bytes, (Bytes{0, 0xab}));
 }
 
-TEST_F(StatementColumnsTest, BytesAreSeenWhereSQLiteHasThem) {
-    KSTDSQLiteStatement row = statement("select x'00ab', x'', null");
+TEST_F(StatementColumnsTest, BytesOfABlobAreSeenWhereSQLiteHasThem) {
+    KSTDSQLiteStatement row = statement("select x'00ab', x'', null, 'ab', 1, 1.5");
     ASSERT_TRUE(row.step());
-    const std::span<const std::uint8_t> bytes = row.blobBytesAtIndex(0);
-    EXPECT_EQ(Bytes(bytes.begin(), bytes.end()), (Bytes{0, 0xab}));
-    EXPECT_EQ(bytes.data(), sqlite3_column_blob(row.handle(), 0));
-    EXPECT_TRUE(row.blobBytesAtIndex(1).empty());
-    EXPECT_TRUE(row.blobBytesAtIndex(2).empty());
-    EXPECT_TRUE(row.blobBytesAtIndex(3).empty());
+    const auto bytes = row.blobBytesAtIndex(0);
+    ASSERT_TRUE(bytes);
+    EXPECT_EQ(Bytes(bytes->begin(), bytes->end()), (Bytes{0, 0xab}));
+    EXPECT_EQ(bytes->data(), sqlite3_column_blob(row.handle(), 0));
+    const auto empty = row.blobBytesAtIndex(1);
+    ASSERT_TRUE(empty);
+    EXPECT_TRUE(empty->empty());
+    for (int index = 2; index <= 6; ++index) {
+        EXPECT_FALSE(row.blobBytesAtIndex(index)) << index;
+    }
 }
 
 TEST_F(StatementColumnsTest, WithoutAPointerThereIsNone) {
