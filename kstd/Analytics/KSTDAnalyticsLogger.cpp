@@ -159,7 +159,7 @@ KSTDAnalyticsLogger::keepEvent(std::string_view name, const platform::ValueMap* 
     fields.database->addEventDict(
         eventDictWithBlacklistedFieldsStrippedFrom(eventDictForEventName(name, attributes)),
         kEventTable);
-    return fields.database->uploadDate();
+    return fields.database->uploadDateAfterAdding();
 }
 
 bool KSTDAnalyticsLogger::isWanted(std::string_view eventName) const {

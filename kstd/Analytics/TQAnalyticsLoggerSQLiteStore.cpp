@@ -39,6 +39,9 @@ TQAnalyticsLoggerSQLiteStore::storeWithPath(const std::string& path, const std::
         // The schema of the first one counts.
         store = std::make_shared<TQAnalyticsLoggerSQLiteStore>(standardised, schema, environment);
     }
+    if (!store->isOpen()) {
+        store->knownDate_.reset();
+    }
     platform::Error error;
     // Every time: a store that is open counts one opening more, which nobody gives back. It stays
     // open as long as the process lives.
@@ -65,6 +68,8 @@ bool TQAnalyticsLoggerSQLiteStore::tryToOpenDatabase() {
     if (isOpen()) {
         return true;
     }
+    // Versions of another connection say nothing about the one to come.
+    knownDate_.reset();
     environment().log.write(platform::LogLevel::warning,
                             "TQAnalyticsLogger: db is closed, attempting to open", {});
     platform::Error error;
@@ -79,6 +84,7 @@ bool TQAnalyticsLoggerSQLiteStore::tryToOpenDatabase() {
 
 void TQAnalyticsLoggerSQLiteStore::addEventDict(platform::ValueMap event,
                                                 std::string_view toTable) {
+    isDateCurrent_ = false;
     if (!tryToOpenDatabase()) {
         return;
     }
@@ -92,8 +98,27 @@ void TQAnalyticsLoggerSQLiteStore::addEventDict(platform::ValueMap event,
     platform::ValueMap row;
     row.emplace("data", std::move(data).value());
     row.emplace("timestamp", platform::timestampOf(environment().clock.now()));
+    insertEvent(std::move(row), toTable);
+}
+
+void TQAnalyticsLoggerSQLiteStore::insertEvent(platform::ValueMap row, std::string_view intoTable) {
+    const std::uint32_t before = version();
     // A failure is in the log and the event is lost: its sender is never held up by analytics.
-    insertOrReplaceInto(toTable, std::move(row));
+    insertOrReplaceInto(intoTable, std::move(row));
+    const bool isCommitted =
+        sqlite3_errcode(db()) == SQLITE_OK && sqlite3_get_autocommit(db()) != 0;
+    // Two steps, and somebody else has written meanwhile, perhaps another date.
+    isDateCurrent_ =
+        knownDate_ && knownDate_->version == before && isCommitted && version() == before + 1;
+    if (isDateCurrent_) {
+        knownDate_->version = before + 1;
+    }
+}
+
+std::uint32_t TQAnalyticsLoggerSQLiteStore::version() const {
+    std::uint32_t version = 0;
+    static_cast<void>(sqlite3_file_control(db(), nullptr, SQLITE_FCNTL_DATA_VERSION, &version));
+    return version;
 }
 
 platform::ValueList TQAnalyticsLoggerSQLiteStore::allEvents() {
@@ -150,6 +175,16 @@ void UnchangingEvents::releasePages() {
 
 std::optional<platform::Timestamp> TQAnalyticsLoggerSQLiteStore::uploadDate() {
     return tryToOpenDatabase() ? datePropertyForKey(kUploadDateKey) : std::nullopt;
+}
+
+std::optional<platform::Timestamp> TQAnalyticsLoggerSQLiteStore::uploadDateAfterAdding() {
+    if (!std::exchange(isDateCurrent_, false)) {
+        knownDate_.reset();
+        if (const auto date = uploadDate()) {
+            knownDate_ = {*date, version()};
+        }
+    }
+    return knownDate_ ? std::optional(knownDate_->date) : std::nullopt;
 }
 
 void TQAnalyticsLoggerSQLiteStore::setUploadDate(const std::optional<platform::Timestamp>& date) {

@@ -48,6 +48,9 @@ class TQAnalyticsLoggerSQLiteStore final : public KSTDSQLite {
     void visitEvents(const std::function<void(std::span<const std::uint8_t> data)>& visitor);
 
     [[nodiscard]] std::optional<platform::Timestamp> uploadDate();
+    /// The upload date right after the last adding: as it was read before, if that was the only
+    /// writing to the database since then, by whichever process; else read now.
+    [[nodiscard]] std::optional<platform::Timestamp> uploadDateAfterAdding();
     /// None removes it.
     void setUploadDate(const std::optional<platform::Timestamp>& date);
 
@@ -60,7 +63,21 @@ class TQAnalyticsLoggerSQLiteStore final : public KSTDSQLite {
     }
 
   private:
+    /// An upload date, and the version of the database for which it holds.
+    struct KnownDate {
+        platform::Timestamp date;
+        std::uint32_t version = 0;
+    };
+
     void logError(std::string_view messageId, std::string_view text) const;
+    /// Grows by one with each transaction of this connection that writes, and when one begins after
+    /// other connections have written.
+    [[nodiscard]] std::uint32_t version() const;
+    void insertEvent(platform::ValueMap row, std::string_view intoTable);
+
+    std::optional<KnownDate> knownDate_;
+    /// Whether that is the date right after the last adding.
+    bool isDateCurrent_ = false;
 
     const std::shared_ptr<const platform::ValueList> failureRecords_;
 };

@@ -1,6 +1,7 @@
 #include "kstd/Analytics/SQLite/StatementRows.h"
 #include "tests/kstd/Analytics/EventStoreFixture.h"
 
+#include <sqlite3.h>
 #include <thread>
 
 namespace kstd {
@@ -20,6 +21,132 @@ class EventStoreTest : public EventStoreFixture {
         return events;
     }
 };
+
+/// A store with an upload date, which counts how often it reads it.
+class UploadDateTest : public EventStoreFixture {
+  protected:
+    UploadDateTest() {
+        store->setUploadDate(kDate);
+        sqlite3_trace_v2(
+            store->db(), SQLITE_TRACE_STMT,
+            [](unsigned, void* test, void* /*statement*/, void* text) {
+                if (std::string_view(static_cast<const char*>(text)).starts_with("select value")) {
+                    ++static_cast<UploadDateTest*>(test)->readings;
+                }
+                return 0;
+            },
+            this);
+    }
+
+    /// Adds an event, and gives the date then.
+    std::optional<Timestamp> dateAfterAdding(std::string_view toTable = kEventTable) {
+        store->addEventDict(event(1), toTable);
+        return store->uploadDateAfterAdding();
+    }
+
+    static constexpr Timestamp kDate{1000};
+    static constexpr Timestamp kOtherDate{2000};
+    static constexpr char kSetOtherDate[] =
+        "update Properties set value = '2001-01-01T00:33:20Z' where key = 'upload_date'";
+
+    const Store store = makeStore();
+    int readings = 0;
+};
+
+TEST_F(UploadDateTest, IsReadOnceAsLongAsNothingButEventsIsWritten) {
+    for (int i = 0; i < 3; ++i) {
+        EXPECT_EQ(dateAfterAdding(), kDate);
+        EXPECT_EQ(readings, 1);
+    }
+    // By itself it is always read.
+    EXPECT_EQ(store->uploadDate(), kDate);
+    EXPECT_EQ(readings, 2);
+    // Once for each adding: the next one may have been changed since.
+    EXPECT_EQ(dateAfterAdding(), kDate);
+    EXPECT_EQ(readings, 2);
+    EXPECT_EQ(store->uploadDateAfterAdding(), kDate);
+    EXPECT_EQ(readings, 3);
+}
+
+TEST_F(UploadDateTest, IsReadAgainWhenAnotherProcessHasWritten) {
+    EXPECT_EQ(dateAfterAdding(), kDate);
+    OtherConnection other(path);
+    EXPECT_EQ(other.run(kSetOtherDate), SQLITE_OK);
+    EXPECT_EQ(dateAfterAdding(), kOtherDate);
+    EXPECT_EQ(readings, 2);
+    EXPECT_EQ(dateAfterAdding(), kOtherDate);
+    EXPECT_EQ(readings, 2);
+    EXPECT_EQ(other.run("delete from Properties where key = 'upload_date'"), SQLITE_OK);
+    for (int i = 0; i < 2; ++i) {
+        EXPECT_EQ(dateAfterAdding(), std::nullopt);
+        EXPECT_EQ(readings, 3 + i);
+    }
+    EXPECT_EQ(other.run("insert into Properties values ('upload_date', '2001-01-01T00:33:20Z')"),
+              SQLITE_OK);
+    EXPECT_EQ(dateAfterAdding(), kOtherDate);
+    EXPECT_EQ(other.run("delete from all_events"), SQLITE_OK);
+    EXPECT_EQ(dateAfterAdding(), kOtherDate);
+    EXPECT_EQ(readings, 6);
+}
+
+TEST_F(UploadDateTest, IsReadAgainWhenThisProcessHasWritten) {
+    EXPECT_EQ(dateAfterAdding(), kDate);
+    store->setUploadDate(kOtherDate);
+    EXPECT_EQ(dateAfterAdding(), kOtherDate);
+    store->setDateProperty(kDate, "upload_date");
+    EXPECT_EQ(dateAfterAdding(), kDate);
+    store->clearAllData();
+    EXPECT_EQ(dateAfterAdding(), kDate);
+    EXPECT_EQ(readings, 4);
+}
+
+TEST_F(UploadDateTest, IsReadAgainWhenTheEventWasNotAdded) {
+    EXPECT_EQ(dateAfterAdding(), kDate);
+    EXPECT_EQ(dateAfterAdding("no_table"), kDate);
+    EXPECT_EQ(readings, 2);
+    // Nor is a date from elsewhere taken for the event.
+    OtherConnection other(path);
+    EXPECT_EQ(other.run("create trigger full before insert on all_events "
+                        "begin select raise(abort, 'full'); end"),
+              SQLITE_OK);
+    EXPECT_EQ(dateAfterAdding(), kDate);
+    EXPECT_EQ(other.run(kSetOtherDate), SQLITE_OK);
+    EXPECT_EQ(dateAfterAdding(), kOtherDate);
+    store->addEventDict({{"unfit", platform::Value()}}, kEventTable);
+    EXPECT_EQ(store->uploadDateAfterAdding(), kOtherDate);
+    EXPECT_EQ(readings, 5);
+}
+
+TEST_F(UploadDateTest, IsReadAgainInATransaction) {
+    EXPECT_EQ(dateAfterAdding(), kDate);
+    OtherConnection other(path);
+    EXPECT_EQ(other.run(kSetOtherDate), SQLITE_OK);
+    store->executeSQL("begin");
+    EXPECT_EQ(dateAfterAdding(), kOtherDate);
+    EXPECT_EQ(dateAfterAdding(), kOtherDate);
+    store->end();
+    EXPECT_EQ(dateAfterAdding(), kOtherDate);
+    EXPECT_EQ(readings, 4);
+}
+
+TEST_F(UploadDateTest, IsReadAgainFromAnotherConnection) {
+    for (const bool isFoundAnew : {false, true}) {
+        EXPECT_EQ(dateAfterAdding(), kDate);
+        const std::uint64_t openings = store->openCount();
+        for (std::uint64_t i = 0; i < openings; ++i) {
+            store->close();
+        }
+        {
+            OtherConnection other(path);
+            EXPECT_EQ(other.run(kSetOtherDate), SQLITE_OK);
+        }
+        if (isFoundAnew) {
+            static_cast<void>(makeStore());
+        }
+        EXPECT_EQ(dateAfterAdding(), kOtherDate);
+        store->setUploadDate(kDate);
+    }
+}
 
 TEST_F(EventStoreTest, SchemaHasItsHash) {
     EXPECT_EQ(makeStore()->schemaVersion(),
