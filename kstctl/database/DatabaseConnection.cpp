@@ -171,11 +171,29 @@ std::string DatabaseConnection::message(int code) const {
 
 platform::Error databaseError(const std::string& path, const DatabaseConnection& connection,
                               int code) {
-    return code == SQLITE_EMPTY
-               ? failure(ExitStatus::malformed,
-                         base::concat(path, ": not a database of kstd's events"))
-               : failure(statusOfCode(code),
-                         base::concat(path, ": ", connection.message(code), " (", code, ')'));
+    switch (code) {
+    case SQLITE_NOTFOUND:
+        return failure(ExitStatus::missing, base::concat(path, ": nothing is stored in it yet"));
+    case SQLITE_EMPTY:
+        return failure(ExitStatus::malformed,
+                       base::concat(path, ": not a database of kstd's events"));
+    default:
+        return failure(statusOfCode(code),
+                       base::concat(path, ": ", connection.message(code), " (", code, ')'));
+    }
+}
+
+int checkTables(DatabaseConnection& connection) {
+    constexpr int kTableCount = 2;
+    Query tables(connection, "select count(*), count(*) filter (where type = 'table' and name in "
+                             "('all_events', 'Properties')) from sqlite_master");
+    if (!tables.step()) {
+        return tables.code();
+    }
+    if (sqlite3_column_int(tables.row(), 0) == 0) {
+        return SQLITE_NOTFOUND;
+    }
+    return sqlite3_column_int(tables.row(), 1) == kTableCount ? SQLITE_OK : SQLITE_EMPTY;
 }
 
 Query::Query(DatabaseConnection& connection, const char* SQL) {

@@ -72,12 +72,12 @@ class DatabaseConnection {
     int code_ = SQLITE_CANTOPEN;
 };
 
-/// Counts, of the tables that a database of events has, those that are there: kTableCount of them.
-inline constexpr char kTablesQuery[] = "select count(*) from sqlite_master where type = 'table' "
-                                       "and name in ('all_events', 'Properties')";
-inline constexpr int kTableCount = 2;
+/// SQLITE_OK when the database has the tables of one of events, SQLITE_NOTFOUND when it has nothing
+/// at all, as while the daemon makes it, SQLITE_EMPTY when it is another kind of database, or why
+/// that cannot be read. Within a transaction of the caller's.
+[[nodiscard]] int checkTables(DatabaseConnection& connection);
 
-/// The error for a code that is a failure; SQLITE_EMPTY stands for a database of another kind.
+/// The error for a code that is a failure, those of checkTables among them.
 [[nodiscard]] platform::Error databaseError(const std::string& path,
                                             const DatabaseConnection& connection, int code);
 

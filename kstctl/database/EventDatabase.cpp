@@ -42,26 +42,18 @@ class Reader {
     Reader(DatabaseConnection& connection, const EventQuery& query)
         : connection_(connection), query_(query) {}
 
-    /// SQLITE_OK, SQLITE_EMPTY when it is another kind of database, or why it failed.
+    /// SQLITE_OK, or what databaseError knows.
     [[nodiscard]] int read(EventDatabase& database) {
         if (const int code = connection_.execute("begin"); code != SQLITE_OK) {
             return code;
         }
-        int code = checkTables();
+        int code = checkTables(connection_);
         code = code == SQLITE_OK ? readNumbers(database) : code;
         code = code == SQLITE_OK && query_.withEvents ? readEvents(database) : code;
         return code;
     }
 
   private:
-    [[nodiscard]] int checkTables() {
-        Query tables(connection_, kTablesQuery);
-        if (!tables.step()) {
-            return tables.code();
-        }
-        return sqlite3_column_int(tables.row(), 0) == kTableCount ? SQLITE_OK : SQLITE_EMPTY;
-    }
-
     [[nodiscard]] int readNumbers(EventDatabase& database) {
         Query count(connection_, "select count(*) from all_events");
         if (!count.step()) {
@@ -177,17 +169,13 @@ namespace {
 constexpr char kStore[] = "insert or replace into Properties (key, value) values "
                           "('upload_date', ?)";
 
-/// SQLITE_OK, SQLITE_EMPTY when it is another kind of database, or why it failed.
+/// SQLITE_OK, or what databaseError knows.
 int store(DatabaseConnection& connection, const std::string& date) {
     if (const int code = connection.execute("begin immediate"); code != SQLITE_OK) {
         return code;
     }
-    Query tables(connection, kTablesQuery);
-    if (!tables.step()) {
-        return tables.code();
-    }
-    if (sqlite3_column_int(tables.row(), 0) != kTableCount) {
-        return SQLITE_EMPTY;
+    if (const int code = checkTables(connection); code != SQLITE_OK) {
+        return code;
     }
     Query storing(connection, kStore, date);
     static_cast<void>(storing.step());

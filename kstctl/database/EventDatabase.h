@@ -37,9 +37,10 @@ struct EventDatabase {
 /// made, changed or left behind, whether it runs or not. Another program's lock is waited for, up
 /// to `patience`.
 ///
-/// Fails with ExitStatus::missing, ::unreadable, ::malformed (not a database, a damaged one, or one
-/// of another kind) or ::failed (locked; a log beside it that only the daemon can work off; or no
-/// room for what was read).
+/// Fails with ExitStatus::missing (also while the daemon has made the file and not yet what is in
+/// it), ::unreadable, ::malformed (not a database, a damaged one, or one of another kind) or
+/// ::failed (locked; a log beside it that only the daemon can work off; or no room for what was
+/// read).
 [[nodiscard]] platform::Result<EventDatabase> readEventDatabase(const std::string& path,
                                                                 const EventQuery& query,
                                                                 std::chrono::milliseconds patience);

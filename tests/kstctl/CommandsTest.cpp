@@ -371,6 +371,10 @@ TEST_F(KstctlCommandsTest, OnlyADatabaseOfEventsIsWritten) {
     expectFailure({"upload", "--now"}, 5, database() + ": file is not a database (26)");
     EXPECT_EQ(files(), before);
     fs::remove(database());
+    OtherConnection(database()).run("pragma journal_mode = WAL");
+    before = files();
+    expectFailure({"upload", "--now"}, 3, database() + ": nothing is stored in it yet");
+    EXPECT_EQ(files(), before);
     OtherConnection(database()).run("create table other (id)");
     before = files();
     expectFailure({"upload", "--now"}, 5, database() + ": not a database of kstd's events");

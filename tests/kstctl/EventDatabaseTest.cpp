@@ -343,8 +343,6 @@ TEST_F(EventDatabaseTest, LockOnTheWholeFile) {
 
 TEST_F(EventDatabaseTest, WhatIsNoDatabaseOfEvents) {
     expectFailure(ExitStatus::missing, ": No such file or directory");
-    write("");
-    expectFailure(ExitStatus::malformed, ": not a database of kstd's events");
     write("something else, and quite long. something else, and quite long.");
     expectFailure(ExitStatus::malformed, ": file is not a database (26)");
     EXPECT_EQ(files().size(), 1U);
@@ -369,6 +367,21 @@ TEST_F(EventDatabaseTest, WhatIsNoDatabaseOfEvents) {
     fs::remove(path);
     ASSERT_EQ(::mkfifo(path.c_str(), 0600), 0);
     expectFailure(ExitStatus::malformed, " is not a regular file");
+}
+
+TEST_F(EventDatabaseTest, OneThatIsBeingMade) {
+    write("");
+    expectFailure(ExitStatus::missing, ": nothing is stored in it yet");
+    EXPECT_EQ(files().size(), 1U);
+    fs::remove(path);
+    OtherConnection daemon(path);
+    daemon.run("pragma journal_mode = WAL");
+    expectFailure(ExitStatus::missing, ": nothing is stored in it yet");
+    daemon.run("begin exclusive; create table Properties (key text primary key, value text)");
+    expectFailure(ExitStatus::missing, ": nothing is stored in it yet");
+    daemon.run("create table all_events (id integer primary key autoincrement, timestamp real, "
+               "data blob); commit");
+    EXPECT_EQ(events(), Texts());
 }
 
 TEST_F(EventDatabaseTest, DamagedDatabase) {
