@@ -560,7 +560,8 @@ class Sequence {
 };
 
 TEST(GateSequencesTest, NothingIsInButByARule) {
-    const support::TemporaryDirectory directory;
+    // Each sequence writes some hundred small files.
+    const support::TemporaryDirectory directory(support::directoryInMemory());
     const StateFile record(directory.file("gate"), StateFile::Durability::none);
     const StateFile devices(directory.file("devices"), StateFile::Durability::none);
     for (std::uint32_t seed = 1; seed <= GATE_SEQUENCES; ++seed) {
