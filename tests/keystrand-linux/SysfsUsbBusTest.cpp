@@ -115,19 +115,19 @@ class BusyDevicesTest : public SysfsUsbBusTest {
             machine.plug(port, {.descriptors = aMouse().descriptors, .serial = port});
         }
         SysfsUsbBus::System system = sysfs.system();
-        system.read = [this](int directory, const char* name, std::size_t limit,
-                             ReadDeadline until) {
+        system.read = [this](int at, const char* name, std::size_t limit, ReadDeadline until) {
             EXPECT_LE(until, began + SysfsUsbBus::kPatienceWithAll + (Clock::now() - began));
             EXPECT_LE(until, Clock::now() + SysfsUsbBus::kPatience);
-            const bool isBusy = busy.contains(numberIn(directory)) && std::string(name) == held;
-            held == name ? static_cast<void>(++readsOfHeld) : static_cast<void>(0);
-            return isBusy ? SmallFile{.error = ETIMEDOUT, .bytes = {}}
-                          : readSmallFileUntil(directory, name, limit, Clock::now() + 1h);
+            const bool isHeld = name == held;
+            readsOfHeld += isHeld ? 1 : 0;
+            return isHeld && busy.contains(numberIn(at))
+                       ? SmallFile{.error = ETIMEDOUT, .bytes = {}}
+                       : readSmallFileUntil(at, name, limit, Clock::now() + 1h);
         };
         slow.emplace(*loop, directory.path().string(), log, std::move(system));
     }
-    static std::string numberIn(int directory) {
-        return std::string(trimmed(readSmallFile(directory, "devnum", kAttributeLimit).bytes));
+    static std::string numberIn(int device) {
+        return std::string(trimmed(readSmallFile(device, "devnum", kAttributeLimit).bytes));
     }
     BusView lookSlowly() {
         std::string problem;
