@@ -340,7 +340,8 @@ class Reader {
             base::ByteReader reader(object);
             std::uint8_t marker = 0;
             Span text;
-            static_cast<void>(reader.readU8(marker) && readElements(marker, reader, 1, text));
+            static_cast<void>(reader.readU8(marker));
+            static_cast<void>(readElements(marker, reader, 1, text));
             const std::size_t size = object.size() - reader.left();
             if (size > left) {
                 return;

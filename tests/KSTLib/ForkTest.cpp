@@ -90,6 +90,10 @@ extern "C" {
 
 int __real_pthread_atfork(void (*prepare)(), void (*parent)(), void (*child)());
 
+// The thread sanitizer calls it while it starts, when nothing that it looks after can run yet.
+#ifdef __clang__
+__attribute__((disable_sanitizer_instrumentation))
+#endif
 int __wrap_pthread_atfork(void (*prepare)(), void (*parent)(), void (*child)()) {
     if (handlersRefused > 0) {
         --handlersRefused;

@@ -570,6 +570,38 @@ TEST(BinaryPropertyListReaderTest, KnownKeysAreAsMuchWork) {
     }
 }
 
+TEST(BinaryPropertyListReaderTest, WorkMayEndAtAKnownKey) {
+    constexpr std::size_t kTextLength = 1000;
+    constexpr std::size_t kKeyLength = 3000;
+    const auto text = [](std::size_t length, std::uint8_t character) {
+        Bytes object = {0x5f, 0x11};
+        appendNumber(object, length, 2);
+        append(object, Bytes(length, character));
+        return object;
+    };
+    // Behind the first value there is less left than the second key takes.
+    const auto fileWith = [&](std::size_t count) {
+        HandMadePropertyList file;
+        file.offsetWidth = 4;
+        file.objects = {map({1, 2, 3, 5}),      text(1, 'x'),
+                        text(kKeyLength, 'y'),  list(std::vector<std::uint64_t>(count, 4)),
+                        text(kTextLength, 'x'), Bytes{0x09}};
+        return file.bytes();
+    };
+    const std::size_t sizeWithout = fileWith(0).size();
+    std::size_t most = 0;
+    while (4 * 16 + 2 + (most + 1) * (16 + kTextLength) <=
+           platform::propertyListWork(sizeWithout + most + 1)) {
+        ++most;
+    }
+    platform::KnownKeys known;
+    EXPECT_EQ(knownKeysIn(fileWith(0), known), 0);
+    EXPECT_EQ(knownKeysIn(fileWith(most - 6), known), 2);
+    KeySink sink;
+    EXPECT_FALSE(platform::readBinaryPropertyList(fileWith(most), sink, &known));
+    EXPECT_EQ(sink.repeated, 1);
+}
+
 TEST(BinaryPropertyListReaderTest, KeysThatTakeMoreThanTheirFileAreNotKept) {
     // Fifteen texts in each other, the shortest first: together they have 15 markers and 105
     // characters.
