@@ -240,10 +240,12 @@ class Reader {
         if (!mayKnowKeys()) {
             return nullptr;
         }
-        const auto found =
-            std::find_if(known_->sets.begin(), known_->sets.end(),
-                         [&](const KnownKeys::Set& keys) { return hasKeys(entries, keys); });
-        return found != known_->sets.end() ? &*found : nullptr;
+        for (KnownKeys::Set& keys : known_->sets) {
+            if (hasKeys(entries, keys)) {
+                return &keys;
+            }
+        }
+        return nullptr;
     }
 
     [[nodiscard]] bool hasKeys(const Entries& entries, const KnownKeys::Set& keys) const {
