@@ -7,6 +7,7 @@
 
 #include <csignal>
 #include <cstdio>
+#include <exception>
 #include <optional>
 #include <string>
 #include <utility>
@@ -67,7 +68,7 @@ int serve(const std::string& root, JournalGateLog::Target target, JournalGateLog
 
 } // namespace
 
-int main(int argc, char** argv) {
+int main(int argc, char** argv) try {
     std::signal(SIGPIPE, SIG_IGN);
     int exitStatus = 0;
     const auto options = parseOptions(argc, argv, exitStatus);
@@ -86,4 +87,7 @@ int main(int argc, char** argv) {
                    : 1;
     }
     return serve(options->root, target, log);
+} catch (const std::exception& problem) {
+    std::fprintf(stderr, "keystrand: %s\n", problem.what());
+    return 1;
 }

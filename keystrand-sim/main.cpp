@@ -9,6 +9,7 @@
 
 #include <csignal>
 #include <cstdio>
+#include <exception>
 #include <limits>
 #include <optional>
 #include <string>
@@ -119,7 +120,7 @@ int simulate(const Simulator::Settings& settings) {
 
 } // namespace
 
-int main(int argc, char** argv) {
+int main(int argc, char** argv) try {
     std::signal(SIGPIPE, SIG_IGN);
     int exitStatus = 0;
     const auto options = parseOptions(argc, argv, exitStatus);
@@ -130,4 +131,7 @@ int main(int argc, char** argv) {
         return sendControlCommand(options->settings.root, *options->controlWords);
     }
     return simulate(options->settings);
+} catch (const std::exception& problem) {
+    std::fprintf(stderr, "keystrand-sim: %s\n", problem.what());
+    return 1;
 }

@@ -9,6 +9,7 @@
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
+#include <exception>
 #include <optional>
 #include <string>
 #include <utility>
@@ -63,7 +64,7 @@ std::optional<platform::HTTPOptions> parseOptions(int argc, const char* const* a
 
 } // namespace
 
-int main(int argc, char** argv) {
+int main(int argc, char** argv) try {
     // Nothing that the environment says about proxies, certificates, names of hosts or the settings
     // of libraries is obeyed.
     ::clearenv();
@@ -87,4 +88,7 @@ int main(int argc, char** argv) {
         return EXIT_FAILURE;
     }
     return EXIT_SUCCESS;
+} catch (const std::exception& problem) {
+    std::fprintf(stderr, "kstd-https: %s\n", problem.what());
+    return EXIT_FAILURE;
 }
