@@ -117,6 +117,14 @@ TEST_F(UploadDateTest, IsReadAgainWhenTheEventWasNotAdded) {
     EXPECT_EQ(readings, 5);
 }
 
+TEST_F(UploadDateTest, IsReadAgainBehindAnEventThatNobodyAskedAbout) {
+    EXPECT_EQ(dateAfterAdding(), kDate);
+    store->addEventDict(event(1), kEventTable);
+    EXPECT_EQ(OtherConnection(path).run(kSetOtherDate), SQLITE_OK);
+    store->addEventDict({{"unfit", platform::Value()}}, kEventTable);
+    EXPECT_EQ(store->uploadDateAfterAdding(), kOtherDate);
+}
+
 TEST_F(UploadDateTest, IsReadAgainInATransaction) {
     EXPECT_EQ(dateAfterAdding(), kDate);
     OtherConnection other(path);
