@@ -59,6 +59,22 @@ class GateSocketTest : public testing::Test {
         return answers.size() == 1 ? wire::decodeGateAnswer(answers[0]) : std::nullopt;
     }
 
+    Keystrand::Parts partsWith(KernelState& model, const StateFile& gateRecord) {
+        return {.kernel = model,
+                .events = poster,
+                .clock = clocks,
+                .lockState = sessions,
+                .bus = bus,
+                .record = gateRecord,
+                .devices = devices,
+                .log = log,
+                .switches = [] { return PolicySwitches(); },
+                .sleepAgain = [] {},
+                .rearm =
+                    [] {
+                    }};
+    }
+
     support::TemporaryDirectory directory;
     std::string path = directory.file("gate.sock");
     StateFile record{directory.file("gate"), StateFile::Durability::none};
@@ -69,20 +85,7 @@ class GateSocketTest : public testing::Test {
     Poster poster;
     Log log;
     KernelState kernel;
-    Keystrand keystrand{Keystrand::Parts{.kernel = kernel,
-                                         .events = poster,
-                                         .clock = clocks,
-                                         .lockState = sessions,
-                                         .bus = bus,
-                                         .record = record,
-                                         .devices = devices,
-                                         .log = log,
-                                         .switches = [] { return PolicySwitches(); },
-                                         .sleepAgain = [] {},
-                                         .rearm =
-                                             [] {
-                                             }},
-                        Keystrand::Settings{}};
+    Keystrand keystrand{partsWith(kernel, record), Keystrand::Settings{}};
 };
 
 TEST_F(GateSocketTest, ListsDevices) {
@@ -142,20 +145,7 @@ class LostRecordSocketTest : public GateSocketTest {
 
     StateFile lostRecord{directory.file("lost"), StateFile::Durability::none};
     KernelState nextKernel;
-    Keystrand next{Keystrand::Parts{.kernel = nextKernel,
-                                    .events = poster,
-                                    .clock = clocks,
-                                    .lockState = sessions,
-                                    .bus = bus,
-                                    .record = lostRecord,
-                                    .devices = devices,
-                                    .log = log,
-                                    .switches = [] { return PolicySwitches(); },
-                                    .sleepAgain = [] {},
-                                    .rearm =
-                                        [] {
-                                        }},
-                   Keystrand::Settings{}};
+    Keystrand next{partsWith(nextKernel, lostRecord), Keystrand::Settings{}};
 };
 
 TEST_F(LostRecordSocketTest, StatusNamesWhatStaysClosedWhenTheGateIsOpen) {

@@ -1,5 +1,7 @@
 #include "platform/ValueBuilder.h"
 
+#include "tests/support/DeafSink.h"
+
 #include <gtest/gtest.h>
 
 #include <limits>
@@ -26,20 +28,7 @@ Value rebuilt(const Value& value) {
 }
 
 /// Keeps the names of the kinds that it has no operation for.
-struct OtherKinds final : platform::ValueSink {
-    void beginMap() override {}
-    void key(std::string_view /*key*/) override {}
-    void endMap() override {}
-    void beginList() override {}
-    void endList() override {}
-    void null() override {}
-    void boolean(bool /*value*/) override {}
-    void integer(std::int64_t /*value*/) override {}
-    void largeInteger(std::uint64_t /*value*/) override {}
-    void real(double /*value*/) override {}
-    void text(std::string_view /*utf8*/) override {}
-    void bytes(std::span<const std::uint8_t> /*value*/) override {}
-    void date(Timestamp /*value*/) override {}
+struct OtherKinds final : support::DeafSink {
     void other(std::string_view kind) override { names.emplace_back(kind); }
 
     std::vector<std::string> names;

@@ -1,4 +1,5 @@
 #include "platform/formats/PropertyListCodec.h"
+#include "tests/support/DeafSink.h"
 
 #include <gtest/gtest.h>
 
@@ -85,21 +86,8 @@ TEST(XMLPropertyListReaderTest, KeysComeInTheOrderOfTheirBytes) {
     const std::string xml =
         document("<dict><key>\u00e9</key><true/><key>z</key><true/><key>B</key><true/>"
                  "<key>a</key><true/></dict>");
-    struct Keys final : platform::ValueSink {
-        void beginMap() override {}
+    struct Keys final : support::DeafSink {
         void key(std::string_view key) override { keys.emplace_back(key); }
-        void endMap() override {}
-        void beginList() override {}
-        void endList() override {}
-        void null() override {}
-        void boolean(bool /*value*/) override {}
-        void integer(std::int64_t /*value*/) override {}
-        void largeInteger(std::uint64_t /*value*/) override {}
-        void real(double /*value*/) override {}
-        void text(std::string_view /*utf8*/) override {}
-        void bytes(std::span<const std::uint8_t> /*value*/) override {}
-        void date(Timestamp /*value*/) override {}
-        void other(std::string_view /*kind*/) override {}
 
         std::vector<std::string> keys;
     } sink;
