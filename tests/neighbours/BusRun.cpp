@@ -7,16 +7,13 @@
 #include "kstd-notify/SystemdAlarmTimer.h"
 #include "platform/linux/Paths.h"
 #include "platform/linux/alarms/AlarmStore.h"
+#include "tests/neighbours/Batches.h"
 #include "tests/neighbours/Bus.h"
-#include "tests/neighbours/Daemon.h"
-#include "tests/neighbours/Runs.h"
 #include "tests/support/TemporaryDirectory.h"
 #include "wire/AlarmAnswer.h"
 #include "wire/EventDatagram.h"
 
 #include <array>
-#include <chrono>
-#include <cstdio>
 #include <cstring>
 #include <filesystem>
 #include <sstream>
@@ -166,19 +163,14 @@ class HelperStage {
 };
 
 /// A batch, on a bus of its own; how many exchanges it was.
-std::uint64_t armOften(Random ideas, std::uint64_t times, std::size_t silences,
-                       const std::string& name) {
+std::uint64_t armOften(Random ideas, std::uint64_t times, std::size_t silences) {
     HelperStage stage(ideas, silences);
-    try {
-        stage.bus->behave(false);
-        for (std::uint64_t i = 0; i < times; ++i) {
-            stage.arm();
-        }
-        stage.bus->behave(true);
+    stage.bus->behave(false);
+    for (std::uint64_t i = 0; i < times; ++i) {
         stage.arm();
-    } catch (const Fault& fault) {
-        throw Fault(base::concat(name, ": ", fault.what()));
     }
+    stage.bus->behave(true);
+    stage.arm();
     return stage.bus->exchanges();
 }
 
@@ -186,36 +178,19 @@ std::uint64_t armOften(Random ideas, std::uint64_t times, std::size_t silences,
 
 void runBus(const RunOptions& options) {
     constexpr std::uint64_t kBatch = 200;
+    Batches batches(options, "bus");
     // What the heap of each thread keeps at hand counts as allocated, and each bus has a thread.
-    [[maybe_unused]] constexpr std::size_t kMostGrowth = 1'000;
-    const auto begin = std::chrono::steady_clock::now();
+    Growth growth(mostGrowth(1'000));
     std::uint64_t exchanges = 0;
     std::uint64_t runs = 0;
-    Footprint first;
-    Footprint now;
-    std::uint64_t batch = options.firstBatch;
-    for (; exchanges < options.count; ++batch) {
-        exchanges += armOften(Random(options.seed * 1'000'003 + batch), kBatch,
-                              batch == options.firstBatch ? options.silences : 0,
-                              base::concat("batch ", batch));
-        runs += kBatch + 1;
-        now = Footprint::ofThis();
-        first = first.descriptors == 0 ? now : first;
-        require(now.descriptors == first.descriptors,
-                base::concat(now.descriptors, " descriptors in the place of ", first.descriptors));
-#ifndef KSTD_SANITIZED
-        require(now.kilobytes <= first.kilobytes + kMostGrowth,
-                base::concat(now.kilobytes, " KiB in the place of ", first.kilobytes));
-#endif
-    }
-    std::printf("bus: %llu exchanges, batches %llu to %llu, %.1f s; %llu runs of the helper, "
-                "descriptors %zu -> %zu, heap %zu -> %zu KiB\n",
-                static_cast<unsigned long long>(exchanges),
-                static_cast<unsigned long long>(options.firstBatch),
-                static_cast<unsigned long long>(batch - 1),
-                std::chrono::duration<double>(std::chrono::steady_clock::now() - begin).count(),
-                static_cast<unsigned long long>(runs), first.descriptors, now.descriptors,
-                first.kilobytes, now.kilobytes);
+    batches.guard([&] {
+        do {
+            exchanges += armOften(batches.ideas(), kBatch, batches.silences());
+            runs += kBatch + 1;
+            growth.look(Footprint::ofThis());
+        } while (batches.end(exchanges));
+    });
+    batches.print(base::concat(runs, " runs of the helper, ", growth.text()));
 }
 
 } // namespace neighbours

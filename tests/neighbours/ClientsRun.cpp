@@ -3,9 +3,8 @@
 #include "base/Concat.h"
 #include "base/UnixAddress.h"
 #include "keystrand-sim/ControlClient.h"
-#include "tests/neighbours/Daemon.h"
+#include "tests/neighbours/Batches.h"
 #include "tests/neighbours/KernelSide.h"
-#include "tests/neighbours/Runs.h"
 #include "tests/support/TemporaryDirectory.h"
 #include "wire/CommandTable.h"
 #include "wire/RestrictedMode.h"
@@ -13,7 +12,6 @@
 #include <algorithm>
 #include <array>
 #include <chrono>
-#include <cstdio>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
@@ -284,18 +282,6 @@ class HostileClient {
     std::array<Bytes, 8> handles_ = {Bytes(kHandleSize)};
 };
 
-void checkGrowth(const Footprint& first, const Footprint& now) {
-#ifdef KSTD_SANITIZED
-    constexpr std::size_t kMostGrowth = 400'000;
-#else
-    constexpr std::size_t kMostGrowth = 4'000;
-#endif
-    require(now.descriptors == first.descriptors,
-            base::concat(now.descriptors, " descriptors in the place of ", first.descriptors));
-    require(now.kilobytes <= first.kilobytes + kMostGrowth,
-            base::concat(now.kilobytes, " KiB in the place of ", first.kilobytes));
-}
-
 /// Once the kernel side has seen that the clients are gone, and does not keep their requests.
 Footprint footprintAfter(const Daemon& kernel, keystrand::sim::ControlClient& control,
                          std::size_t descriptors) {
@@ -313,7 +299,7 @@ Footprint footprintAfter(const Daemon& kernel, keystrand::sim::ControlClient& co
 
 void runClients(const RunOptions& options) {
     constexpr std::uint64_t kBatch = 1'000;
-    const auto begin = std::chrono::steady_clock::now();
+    Batches batches(options, "clients");
     const support::TemporaryDirectory root;
     const std::vector<Bytes> some = payloads();
     Daemon kernel({KEYSTRAND_SIM, "--root", root.path().string(), "--quiet"}, -1, "ready");
@@ -328,12 +314,10 @@ void runClients(const RunOptions& options) {
     std::uint64_t exchanges = 0;
     // Nobody is connected but for the control socket.
     const std::size_t descriptors = footprintAfter(kernel, *control, 0).descriptors;
-    Footprint first;
-    Footprint now;
-    std::uint64_t batch = options.firstBatch;
-    for (; exchanges < options.count; ++batch) {
-        try {
-            Random random(options.seed * 1'000'003 + batch);
+    Growth growth(mostGrowth(4'000));
+    batches.guard([&] {
+        do {
+            Random random = batches.ideas();
             {
                 std::array<HostileClient, 3> clients = {HostileClient(path, random, some),
                                                         HostileClient(path, random, some),
@@ -345,22 +329,11 @@ void runClients(const RunOptions& options) {
             }
             kernel.listen();
             require(kernel.runs(), "the kernel side ended with " + kernel.ending());
-            now = footprintAfter(kernel, *control, descriptors);
-            first = first.descriptors == 0 ? now : first;
-            checkGrowth(first, now);
-        } catch (const Fault& fault) {
-            throw Fault(base::concat("batch ", batch, ": ", fault.what()));
-        }
-        exchanges += kBatch;
-    }
-    std::printf("clients: %llu exchanges, batches %llu to %llu, %.1f s; %llu lines, descriptors "
-                "%zu -> %zu, memory %zu -> %zu KiB\n",
-                static_cast<unsigned long long>(exchanges),
-                static_cast<unsigned long long>(options.firstBatch),
-                static_cast<unsigned long long>(batch - 1),
-                std::chrono::duration<double>(std::chrono::steady_clock::now() - begin).count(),
-                static_cast<unsigned long long>(kernel.lines()), first.descriptors, now.descriptors,
-                first.kilobytes, now.kilobytes);
+            growth.look(footprintAfter(kernel, *control, descriptors));
+            exchanges += kBatch;
+        } while (batches.end(exchanges));
+    });
+    batches.print(base::concat(kernel.lines(), " lines, ", growth.text()));
 }
 
 } // namespace neighbours

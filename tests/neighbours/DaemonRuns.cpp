@@ -2,7 +2,7 @@
 
 #include "base/Concat.h"
 #include "platform/ManagedSettings.h"
-#include "tests/neighbours/Runs.h"
+#include "tests/neighbours/Batches.h"
 #include "tests/neighbours/Stage.h"
 #include "wire/EventDatagram.h"
 #include "wire/RestrictedMode.h"
@@ -26,90 +26,12 @@ using Clock = std::chrono::steady_clock;
 constexpr std::uint64_t kMostLinesPerEvent = 40;
 
 /// What a long-lived daemon may have more at the end than at first: SQLite's pages, up to 2000 KiB,
-/// and what the heap loses in gaps. A sanitizer keeps freed memory on purpose.
-#ifdef KSTD_SANITIZED
-constexpr std::size_t kMostGrowth = 400'000;
-#else
-constexpr std::size_t kMostGrowth = 3'000;
-#endif
+/// and what the heap loses in gaps.
+constexpr std::size_t kMostGrowth = mostGrowth(3'000);
 
 constexpr const char* kProperties[] = {kTimerRestartedProperty, kAnalyticsCollectedProperty,
                                        kSaveAnalyticsProperty,
                                        kTimerRestartedAnalyticsCollectedProperty};
-
-/// The footprints of one daemon, early and late.
-class Growth {
-  public:
-    explicit Growth(std::size_t most = kMostGrowth) : most_(most) {}
-
-    void look(const Daemon& daemon) {
-        now_ = Footprint::of(daemon.process());
-        if (first_.descriptors == 0) {
-            first_ = now_;
-        }
-        require(
-            now_.descriptors == first_.descriptors,
-            base::concat(now_.descriptors, " descriptors in the place of ", first_.descriptors));
-        require(now_.kilobytes <= first_.kilobytes + most_,
-                base::concat(now_.kilobytes, " KiB in the place of ", first_.kilobytes));
-    }
-
-    [[nodiscard]] std::string text() const {
-        return base::concat("descriptors ", first_.descriptors, " -> ", now_.descriptors,
-                            ", memory ", first_.kilobytes, " -> ", now_.kilobytes, " KiB");
-    }
-
-  private:
-    std::size_t most_;
-    Footprint first_;
-    Footprint now_;
-};
-
-/// A run in batches: each has ideas of its own, and is followed by a look at the daemon.
-class Batches {
-  public:
-    explicit Batches(const RunOptions& options, const char* name)
-        : options_(options), name_(name), batch_(options.firstBatch) {}
-
-    [[nodiscard]] Random ideas() const { return Random(options_.seed * 1'000'003 + batch_); }
-    [[nodiscard]] std::uint64_t number() const { return batch_; }
-
-    /// Whether another one is to be made.
-    [[nodiscard]] bool end(std::uint64_t exchanges) {
-        ++batch_;
-        exchanges_ = exchanges;
-        return exchanges_ < options_.count;
-    }
-
-    void print(const std::string& rest) const {
-        const auto seconds = std::chrono::duration<double>(Clock::now() - begin_).count();
-        std::printf("%s: %llu exchanges, batches %llu to %llu, %.1f s; %s\n", name_,
-                    static_cast<unsigned long long>(exchanges_),
-                    static_cast<unsigned long long>(options_.firstBatch),
-                    static_cast<unsigned long long>(batch_ - 1), seconds, rest.c_str());
-    }
-
-    /// Runs `work`, and says where it was when something was wrong.
-    template <typename Work>
-    void guard(const std::unique_ptr<Stage>& stage, Work work) {
-        try {
-            work();
-        } catch (const Fault& fault) {
-            std::string text = base::concat("batch ", batch_, ": ", fault.what(), '\n');
-            if (stage) {
-                text += stage->report();
-            }
-            throw Fault(text);
-        }
-    }
-
-  private:
-    const RunOptions& options_;
-    const char* name_;
-    std::uint64_t batch_;
-    std::uint64_t exchanges_ = 0;
-    Clock::time_point begin_ = Clock::now();
-};
 
 void checkLines(const Stage& stage, std::uint64_t linesBefore, std::uint64_t events) {
     const std::uint64_t lines = stage.lines() - linesBefore;
@@ -193,9 +115,10 @@ void runEvents(const RunOptions& options) {
     constexpr std::uint64_t kBatch = 2'000;
     Batches batches(options, "events");
     auto stage = std::make_unique<Stage>(options.daemon, std::vector<std::string>());
-    Growth growth;
+    Growth growth(kMostGrowth);
     std::uint64_t exchanges = 0;
-    batches.guard(stage, [&] {
+    batches.setReport([&] { return stage ? stage->report() : std::string(); });
+    batches.guard([&] {
         stage->launch();
         do {
             Random random = batches.ideas();
@@ -211,7 +134,7 @@ void runEvents(const RunOptions& options) {
             require(stage->storedEvents() == stage->figures(),
                     base::concat(stage->figures(), " figures acknowledged, ", stage->storedEvents(),
                                  " kept"));
-            growth.look(stage->daemon());
+            growth.look(Footprint::of(stage->daemon().process()));
         } while (batches.end(exchanges));
         stage->end();
     });
@@ -225,13 +148,13 @@ void runKernelSide(const RunOptions& options) {
     constexpr std::uint64_t kBatchesOfADaemon = 40;
     Batches batches(options, "kernel");
     auto stage = std::make_unique<Stage>(options.daemon, std::vector<std::string>());
-    Growth growth;
+    Growth growth(kMostGrowth);
     std::uint64_t events = 0;
-    batches.guard(stage, [&] {
+    batches.setReport([&] { return stage ? stage->report() : std::string(); });
+    batches.guard([&] {
         do {
             Random random = batches.ideas();
-            stage->kernel->beHostile(&random,
-                                     batches.number() == options.firstBatch ? options.silences : 0);
+            stage->kernel->beHostile(&random, batches.silences());
             const std::uint64_t lines = stage->lines();
             if (!stage->hasDaemon()) {
                 stage->launch();
@@ -258,10 +181,10 @@ void runKernelSide(const RunOptions& options) {
             require(stage->storedEvents() >= stage->figures(),
                     base::concat(stage->figures(), " figures acknowledged, ", stage->storedEvents(),
                                  " kept"));
-            growth.look(stage->daemon());
+            growth.look(Footprint::of(stage->daemon().process()));
             if ((batches.number() + 1) % kBatchesOfADaemon == 0) {
                 stage->end();
-                growth = Growth();
+                growth = Growth(kMostGrowth);
             }
         } while (batches.end(stage->kernel->exchanges()));
         if (stage->hasDaemon()) {
@@ -309,7 +232,8 @@ void runHTTPSProcess(const RunOptions& options) {
     auto stage = makeUploadingStage(options, "splunk_bagURL");
     Growth growth(kMostGrowthWithBags);
     std::uint64_t events = 0;
-    batches.guard(stage, [&] {
+    batches.setReport([&] { return stage ? stage->report() : std::string(); });
+    batches.guard([&] {
         stage->launch();
         Random first = batches.ideas();
         stage->exchangeProperly(first);
@@ -317,8 +241,7 @@ void runHTTPSProcess(const RunOptions& options) {
         do {
             Random random = batches.ideas();
             const std::uint64_t lines = stage->lines();
-            stage->https->beHostile(&random,
-                                    batches.number() == options.firstBatch ? options.silences : 0);
+            stage->https->beHostile(&random, batches.silences());
             stage->makeUploadDue();
             for (std::uint64_t i = 0; i < kBatch; ++i) {
                 const std::uint64_t accepted = stage->https->accepted();
@@ -359,7 +282,7 @@ void runHTTPSProcess(const RunOptions& options) {
             require(stage->storedEvents() <= 1, "a server that accepts was not given everything");
             kept = {stage->storedEvents(), stage->storedEvents()};
             checkLines(*stage, lines, kBatch + 20);
-            growth.look(stage->daemon());
+            growth.look(Footprint::of(stage->daemon().process()));
         } while (batches.end(stage->https->exchanges()));
         stage->end();
     });
@@ -437,7 +360,8 @@ void runSoak(const RunOptions& options) {
     auto stage = makeUploadingStage(options, "splunk_uploadURL");
     std::uint64_t published = 0;
     std::optional<SoakLife> firstLife;
-    batches.guard(stage, [&] {
+    batches.setReport([&] { return stage ? stage->report() : std::string(); });
+    batches.guard([&] {
         Random random = batches.ideas();
         // The first event sets the date of the first upload.
         stage->launch();

@@ -3,9 +3,7 @@
 #include "base/Concat.h"
 #include "base/FileDescriptor.h"
 #include "base/UnixAddress.h"
-#include "tests/neighbours/Daemon.h"
-#include "tests/neighbours/Random.h"
-#include "tests/neighbours/Runs.h"
+#include "tests/neighbours/Batches.h"
 #include "tests/neighbours/UsbFiles.h"
 #include "tests/support/TemporaryDirectory.h"
 #include "wire/GateMessages.h"
@@ -511,30 +509,19 @@ class GateStage {
     bool isSettled_ = false;
 };
 
-void checkGrowth(const Footprint& first, const Footprint& now) {
-#ifdef KSTD_SANITIZED
-    constexpr std::size_t kMostGrowth = 400'000;
-#else
-    constexpr std::size_t kMostGrowth = 4'000;
-#endif
-    require(now.kilobytes <= first.kilobytes + kMostGrowth,
-            base::concat(now.kilobytes, " KiB in the place of ", first.kilobytes));
-}
-
 } // namespace
 
 void runGate(const RunOptions& options) {
     constexpr std::uint64_t kBatch = 1'000;
-    const auto begin = std::chrono::steady_clock::now();
+    Batches batches(options, "gate");
+    Growth growth(mostGrowth(4'000));
     GateStage stage;
     stage.behave();
-    Footprint first;
-    Footprint now;
     std::uint64_t exchanges = 0;
-    std::uint64_t batch = options.firstBatch;
-    for (; exchanges < options.count; ++batch) {
-        try {
-            Random random(options.seed * 1'000'003 + batch);
+    batches.setReport([&] { return stage.report(); });
+    batches.guard([&] {
+        do {
+            Random random = batches.ideas();
             stage.plugDisk();
             for (std::uint64_t i = 0; i < kBatch; ++i) {
                 if (random.oneIn(4)) {
@@ -547,24 +534,13 @@ void runGate(const RunOptions& options) {
                 }
             }
             stage.behave();
-            now = stage.footprint();
-            first = first.descriptors == 0 ? now : first;
-            checkGrowth(first, now);
-            require(stage.lines() <= 40 * (exchanges + kBatch), "more lines than anybody reads");
-        } catch (const Fault& fault) {
-            throw Fault(base::concat("batch ", batch, ": ", fault.what(), stage.report()));
-        }
-        exchanges += kBatch;
-    }
+            growth.look(stage.footprint());
+            exchanges += kBatch;
+            require(stage.lines() <= 40 * exchanges, "more lines than anybody reads");
+        } while (batches.end(exchanges));
+    });
     stage.end();
-    std::printf("gate: %llu exchanges, batches %llu to %llu, %.1f s; %llu lines, descriptors "
-                "%zu -> %zu, memory %zu -> %zu KiB\n",
-                static_cast<unsigned long long>(exchanges),
-                static_cast<unsigned long long>(options.firstBatch),
-                static_cast<unsigned long long>(batch - 1),
-                std::chrono::duration<double>(std::chrono::steady_clock::now() - begin).count(),
-                static_cast<unsigned long long>(stage.lines()), first.descriptors, now.descriptors,
-                first.kilobytes, now.kilobytes);
+    batches.print(base::concat(stage.lines(), " lines, ", growth.text()));
     if (::geteuid() != 0) {
         std::puts("gate: not root, so no other user has tried");
     }

@@ -5,9 +5,8 @@
 #include "fuzz/ClientCalls.h"
 #include "platform/linux/LinuxKernelChannel.h"
 #include "platform/linux/LinuxServiceRegistry.h"
-#include "tests/neighbours/Daemon.h"
+#include "tests/neighbours/Batches.h"
 #include "tests/neighbours/KernelSide.h"
-#include "tests/neighbours/Runs.h"
 #include "tests/support/TemporaryDirectory.h"
 
 #include <atomic>
@@ -156,48 +155,28 @@ Result callOften(std::uint64_t seed, std::size_t silences) {
 } // namespace
 
 void runLibrary(const RunOptions& options) {
-    [[maybe_unused]] constexpr std::size_t kMostGrowth = 100;
     /// A call checks what it sends and what it gets, and each check can fail once.
     constexpr std::uint64_t kMostLinesPerExchange = 40;
     // The LibCall functions print their failures.
     const base::FileDescriptor said(::dup(STDOUT_FILENO));
     require(std::freopen("/dev/null", "w", stdout) != nullptr, "no /dev/null");
-    const auto begin = std::chrono::steady_clock::now();
+    Batches batches(options, "library");
+    Growth growth(mostGrowth(100));
     Result all;
-    Footprint first;
-    Footprint now;
-    std::uint64_t batch = options.firstBatch;
-    for (; all.exchanges < options.count; ++batch) {
-        Result result;
-        try {
-            result = callOften(options.seed * 1'000'003 + batch,
-                               batch == options.firstBatch ? options.silences : 0);
-        } catch (const Fault& fault) {
-            throw Fault(base::concat("batch ", batch, ": ", fault.what()));
-        }
-        all = {all.exchanges + result.exchanges, all.calls + result.calls,
-               all.lines + result.lines};
-        require(all.lines <= (all.exchanges + all.calls) * kMostLinesPerExchange,
-                base::concat(all.lines, " lines for ", all.calls, " calls"));
-        now = Footprint::ofThis();
-        first = first.descriptors == 0 ? now : first;
-        require(now.descriptors == first.descriptors,
-                base::concat(now.descriptors, " descriptors in the place of ", first.descriptors));
-#ifndef KSTD_SANITIZED
-        require(now.kilobytes <= first.kilobytes + kMostGrowth,
-                base::concat(now.kilobytes, " KiB in the place of ", first.kilobytes));
-#endif
-    }
-    ::dprintf(said.get(),
-              "library: %llu exchanges, batches %llu to %llu, %.1f s; %llu calls, %llu lines, "
-              "descriptors %zu -> %zu, heap %zu -> %zu KiB\n",
-              static_cast<unsigned long long>(all.exchanges),
-              static_cast<unsigned long long>(options.firstBatch),
-              static_cast<unsigned long long>(batch - 1),
-              std::chrono::duration<double>(std::chrono::steady_clock::now() - begin).count(),
-              static_cast<unsigned long long>(all.calls),
-              static_cast<unsigned long long>(all.lines), first.descriptors, now.descriptors,
-              first.kilobytes, now.kilobytes);
+    batches.guard([&] {
+        do {
+            const Result result = callOften(batches.seed(), batches.silences());
+            all = {all.exchanges + result.exchanges, all.calls + result.calls,
+                   all.lines + result.lines};
+            require(all.lines <= (all.exchanges + all.calls) * kMostLinesPerExchange,
+                    base::concat(all.lines, " lines for ", all.calls, " calls"));
+            growth.look(Footprint::ofThis());
+        } while (batches.end(all.exchanges));
+    });
+    ::dprintf(
+        said.get(), "%s",
+        batches.text(base::concat(all.calls, " calls, ", all.lines, " lines, ", growth.text()))
+            .c_str());
 }
 
 } // namespace neighbours
