@@ -10,6 +10,7 @@
 
 #include <csignal>
 #include <cstdio>
+#include <exception>
 #include <string>
 #include <string_view>
 
@@ -54,7 +55,7 @@ int listen(const std::string& root) {
 
 } // namespace
 
-int main(int argc, char** argv) {
+int main(int argc, char** argv) try {
     constexpr int kWrongUsage = 2;
     const std::string_view option = argc > 1 ? argv[1] : "";
     if (argc == 2 && (option == "--help" || option == "-h")) {
@@ -69,4 +70,7 @@ int main(int argc, char** argv) {
     }
     static_cast<void>(std::fputs(kHelp, stderr));
     return kWrongUsage;
+} catch (const std::exception& problem) {
+    std::fprintf(stderr, "keystrand-sessions: %s\n", problem.what());
+    return 1;
 }
